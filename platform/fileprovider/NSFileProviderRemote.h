@@ -1,0 +1,127 @@
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "platform/fileprovider/NSFileProviderItem.h"
+#include "platform/foundation/NSData.h"
+#include "platform/foundation/NSError.h"
+#include "platform/foundation/NSURL.h"
+
+// The protocols between the framework's daemon, the extension and the framework's clients, as they cross a
+// connection. Every completion is called exactly once, on any thread, unless the call fails in transport:
+// then the error handler of the proxy is called instead.
+
+namespace droxa {
+
+using NSFileProviderItemCompletion =
+    std::function<void(const std::shared_ptr<const NSFileProviderItem> &item, const NSError &error)>;
+using NSFileProviderURLCompletion = std::function<void(const NSURL &url)>;
+using NSFileProviderIdentifierCompletion = std::function<void(const std::optional<std::string> &identifier)>;
+using NSFileProviderPageCompletion =
+    std::function<void(const NSFileProviderItems &items, const NSData &nextPage, const NSError &error)>;
+using NSFileProviderChangesCompletion =
+    std::function<void(const NSFileProviderItems &updated, const std::vector<std::string> &deleted,
+                       const NSData &anchor, bool moreComing, const NSError &error)>;
+using NSFileProviderAnchorCompletion = std::function<void(const NSData &anchor)>;
+using NSFileProviderErrorCompletion = std::function<void(const NSError &error)>;
+
+// An enumerator of another process. Releasing the last reference to a received one releases the real one.
+// A received one has no proxy and no error handler of its own: a failure of the transport is given to the
+// completion itself, without items and with the transport's error (NSCocoaErrorDomain); currentSyncAnchor
+// then gives nil.
+class NSFileProviderRemoteEnumerator {
+ public:
+  virtual ~NSFileProviderRemoteEnumerator() = default;
+  virtual void enumerateItems(const NSData &page, NSFileProviderPageCompletion completion) = 0;
+  virtual void enumerateChanges(const NSData &anchor, NSFileProviderChangesCompletion completion) = 0;
+  virtual void currentSyncAnchor(NSFileProviderAnchorCompletion completion) = 0;  // nil: no change tracking
+  virtual void invalidate() = 0;
+};
+
+using NSFileProviderEnumeratorCompletion = std::function<void(
+    const std::shared_ptr<NSFileProviderRemoteEnumerator> &enumerator, const NSError &error)>;
+
+// What the extension's process exports to the host.
+class NSFileProviderExtensionProtocol {
+ public:
+  virtual ~NSFileProviderExtensionProtocol() = default;
+  virtual void itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion) = 0;
+  virtual void URLForItemIdentifier(const std::string &identifier,
+                                    NSFileProviderURLCompletion completion) = 0;
+  virtual void identifierForItemAtURL(const NSURL &url, NSFileProviderIdentifierCompletion completion) = 0;
+  virtual void enumeratorForContainer(const std::string &identifier,
+                                      NSFileProviderEnumeratorCompletion completion) = 0;
+};
+
+// What the host exports to the extension's process.
+class NSFileProviderHostProtocol {
+ public:
+  virtual ~NSFileProviderHostProtocol() = default;
+  virtual void signalEnumerator(const std::string &containerIdentifier,
+                                NSFileProviderErrorCompletion completion) = 0;
+};
+
+// One change of a watched container, as the host saw it against what it knew before.
+struct FPDChange {
+  enum class Kind : std::uint8_t { added, changed, renamed, removed, relisted };
+  Kind kind = Kind::changed;
+  std::string identifier;
+  std::optional<NSFileProviderItemFields> item;  // as it is now; nullopt for a removed one and for relisted
+  std::string oldName;                           // renamed: before; removed: the last known one, may be empty
+};
+
+class FPDWatchObserver {
+ public:
+  virtual ~FPDWatchObserver() = default;
+  // The next batch comes after the reply; when the transport fails it is not called, and no more batches
+  // come.
+  virtual void receiveChanges(const std::vector<FPDChange> &changes, std::function<void()> reply) = 0;
+};
+
+// A watch lives until it is released or stopped; the end of a client's connection releases it.
+class FPDWatch {
+ public:
+  virtual ~FPDWatch() = default;
+  virtual void stop() = 0;
+};
+
+struct FPDStatus {
+  std::uint32_t processIdentifier = 0;
+  std::int64_t startedNanoseconds = 0;           // since 1970
+  std::uint32_t extensionProcessIdentifier = 0;  // 0: not running
+  std::int64_t extensionStartedNanoseconds = 0;
+  std::uint64_t extensionLaunches = 0;  // since the host started
+  std::uint64_t cachedItems = 0;
+  std::uint64_t followedContainers = 0;  // with an enumerator kept open for their changes
+  std::uint64_t watchers = 0;
+  std::uint64_t signals = 0;     // received since the host started
+  std::string lastExtensionEnd;  // why the extension last ended, "" if it never did
+};
+
+using FPDStatusCompletion = std::function<void(const FPDStatus &status)>;
+using FPDWatchCompletion = std::function<void(const std::shared_ptr<FPDWatch> &watch, const NSError &error)>;
+
+// What the host exports to its clients (the droxa command).
+class FPDControlProtocol {
+ public:
+  virtual ~FPDControlProtocol() = default;
+  virtual void getStatus(FPDStatusCompletion completion) = 0;
+  virtual void itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion) = 0;
+  // `path` is of the drive ("Documents/a.txt", "/" is the root) or an absolute path inside the replica.
+  // NSFileProviderErrorNoSuchItem when there is nothing.
+  virtual void itemAtPath(const std::string &path, NSFileProviderItemCompletion completion) = 0;
+  virtual void URLForItemIdentifier(const std::string &identifier,
+                                    NSFileProviderURLCompletion completion) = 0;
+  virtual void identifierForItemAtURL(const NSURL &url, NSFileProviderIdentifierCompletion completion) = 0;
+  virtual void enumeratorForContainer(const std::string &identifier,
+                                      NSFileProviderEnumeratorCompletion completion) = 0;
+  virtual void watchContainer(const std::string &identifier, std::shared_ptr<FPDWatchObserver> observer,
+                              FPDWatchCompletion completion) = 0;
+};
+
+}  // namespace droxa

@@ -1,0 +1,45 @@
+@0xe208404b88662568;
+
+using Cxx = import "/capnp/c++.capnp";
+using Enumerator = import "/platform/fileprovider/xpc/NSFileProviderRemoteEnumerator.capnp";
+using Values = import "/platform/xpc/Values.capnp";
+$Cxx.namespace("droxa::schema");
+
+interface FPDControlProtocol {
+  getStatus @0 () -> (status :FPDStatus);
+  itemForIdentifier @1 (identifier :Data) -> (item :Values.Item, error :Values.Error);
+  itemAtPath @2 (path :Data) -> (item :Values.Item, error :Values.Error);
+  urlForItemIdentifier @3 (identifier :Data) -> (url :Values.Url);
+  identifierForItemAtURL @4 (url :Values.Url) -> (identifier :Data);
+  enumeratorForContainer @5 (identifier :Data)
+      -> (enumerator :Enumerator.NSFileProviderRemoteEnumerator, error :Values.Error);
+  watchContainer @6 (identifier :Data, observer :FPDWatchObserver) -> (watch :FPDWatch, error :Values.Error);
+}
+
+interface FPDWatch {
+  stop @0 ();
+}
+
+interface FPDWatchObserver {
+  receiveChanges @0 (changes :List(FPDChange)) -> ();
+}
+
+struct FPDChange {
+  kind @0 :UInt8;
+  identifier @1 :Data;
+  item @2 :Values.Item;
+  oldName @3 :Data;
+}
+
+struct FPDStatus {
+  processIdentifier @0 :UInt32;
+  startedNanoseconds @1 :Int64;
+  extensionProcessIdentifier @2 :UInt32;
+  extensionStartedNanoseconds @3 :Int64;
+  extensionLaunches @4 :UInt64;
+  cachedItems @5 :UInt64;
+  followedContainers @6 :UInt64;
+  watchers @7 :UInt64;
+  signals @8 :UInt64;
+  lastExtensionEnd @9 :Data;
+}

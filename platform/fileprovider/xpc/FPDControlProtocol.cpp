@@ -1,0 +1,202 @@
+#include <utility>
+
+#include "platform/fileprovider/NSFileProviderRemote.h"
+#include "platform/fileprovider/xpc/FPDControlProtocol.capnp.h"
+#include "platform/fileprovider/xpc/FPDWatchAdapter.h"
+#include "platform/fileprovider/xpc/FileProviderInterfaces.h"
+#include "platform/fileprovider/xpc/RemoteEnumeratorAdapter.h"
+#include "platform/xpc/capnp/Exported.h"
+#include "platform/xpc/capnp/Interface.h"
+#include "platform/xpc/capnp/Proxy.h"
+#include "platform/xpc/capnp/Values.h"
+
+namespace droxa {
+namespace {
+
+using Schema = schema::FPDControlProtocol;
+
+void writeStatus(schema::FPDStatus::Builder builder, const FPDStatus &status) {
+  builder.setProcessIdentifier(status.processIdentifier);
+  builder.setStartedNanoseconds(status.startedNanoseconds);
+  builder.setExtensionProcessIdentifier(status.extensionProcessIdentifier);
+  builder.setExtensionStartedNanoseconds(status.extensionStartedNanoseconds);
+  builder.setExtensionLaunches(status.extensionLaunches);
+  builder.setCachedItems(status.cachedItems);
+  builder.setFollowedContainers(status.followedContainers);
+  builder.setWatchers(status.watchers);
+  builder.setSignals(status.signals);
+  builder.setLastExtensionEnd(xpcBytes(status.lastExtensionEnd));
+}
+
+FPDStatus readStatus(schema::FPDStatus::Reader reader) {
+  FPDStatus status;
+  status.processIdentifier = reader.getProcessIdentifier();
+  status.startedNanoseconds = reader.getStartedNanoseconds();
+  status.extensionProcessIdentifier = reader.getExtensionProcessIdentifier();
+  status.extensionStartedNanoseconds = reader.getExtensionStartedNanoseconds();
+  status.extensionLaunches = reader.getExtensionLaunches();
+  status.cachedItems = reader.getCachedItems();
+  status.followedContainers = reader.getFollowedContainers();
+  status.watchers = reader.getWatchers();
+  status.signals = reader.getSignals();
+  status.lastExtensionEnd = xpcString(reader.getLastExtensionEnd());
+  return status;
+}
+
+class ControlServer final : public Schema::Server {
+ public:
+  ControlServer(Session &session, std::shared_ptr<FPDControlProtocol> object)
+      : exported_(session, std::move(object)) {}
+
+  kj::Promise<void> getStatus(GetStatusContext context) override {
+    return exported_.serve(context, [](auto &object, auto reply) {
+      object.getStatus(reply([](auto results, Session &, const FPDStatus &status) {
+        writeStatus(results.initStatus(), status);
+      }));
+    });
+  }
+
+  kj::Promise<void> itemForIdentifier(ItemForIdentifierContext context) override {
+    return exported_.serve(
+        context, [identifier = xpcString(context.getParams().getIdentifier())](auto &object, auto reply) {
+          object.itemForIdentifier(identifier,
+                                   reply([](auto results, Session &, const auto &item, const NSError &error) {
+                                     setItem(results, item);
+                                     setError(results, error);
+                                   }));
+        });
+  }
+
+  kj::Promise<void> itemAtPath(ItemAtPathContext context) override {
+    return exported_.serve(
+        context, [path = xpcString(context.getParams().getPath())](auto &object, auto reply) {
+          object.itemAtPath(path, reply([](auto results, Session &, const auto &item, const NSError &error) {
+                              setItem(results, item);
+                              setError(results, error);
+                            }));
+        });
+  }
+
+  kj::Promise<void> urlForItemIdentifier(UrlForItemIdentifierContext context) override {
+    return exported_.serve(
+        context, [identifier = xpcString(context.getParams().getIdentifier())](auto &object, auto reply) {
+          object.URLForItemIdentifier(
+              identifier, reply([](auto results, Session &, const NSURL &url) { setURL(results, url); }));
+        });
+  }
+
+  kj::Promise<void> identifierForItemAtURL(IdentifierForItemAtURLContext context) override {
+    return exported_.serve(context, [url = getURL(context.getParams())](auto &object, auto reply) {
+      object.identifierForItemAtURL(url, reply([](auto results, Session &, const auto &identifier) {
+                                      setIdentifier(results, identifier);
+                                    }));
+    });
+  }
+
+  kj::Promise<void> enumeratorForContainer(EnumeratorForContainerContext context) override {
+    return exported_.serve(context, [identifier = xpcString(context.getParams().getIdentifier())](
+                                        auto &object, auto reply) {
+      object.enumeratorForContainer(
+          identifier, reply([](auto results, Session &session, const auto &enumerator, const NSError &error) {
+            setEnumerator(results, session, enumerator);
+            setError(results, error);
+          }));
+    });
+  }
+
+  kj::Promise<void> watchContainer(WatchContainerContext context) override {
+    const auto params = context.getParams();
+    KJ_REQUIRE(params.hasObserver(), "a watch without an observer");
+    return exported_.serve(
+        context, [identifier = xpcString(params.getIdentifier()),
+                  observer = receivedWatchObserver(*exported_.session(), params.getObserver())](auto &object,
+                                                                                                auto reply) {
+          object.watchContainer(
+              identifier, observer,
+              reply([](auto results, Session &session, const auto &watch, const NSError &error) {
+                if (watch) results.setWatch(exportWatch(session, watch));
+                setError(results, error);
+              }));
+        });
+  }
+
+ private:
+  Exported<FPDControlProtocol> exported_;
+};
+
+class ControlProxy final : public XPCProxy<Schema, FPDControlProtocol, ControlProxy> {
+ public:
+  using XPCProxy::XPCProxy;
+
+  void getStatus(FPDStatusCompletion completion) override {
+    call(
+        &Client::getStatusRequest, [](auto, Session &) {}, std::move(completion),
+        [](auto results, const RemoteObject &) { return std::tuple(readStatus(results.getStatus())); });
+  }
+
+  void itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion) override {
+    call(
+        &Client::itemForIdentifierRequest,
+        [identifier](auto params, Session &) { params.setIdentifier(xpcBytes(identifier)); },
+        std::move(completion),
+        [](auto results, const RemoteObject &) { return std::tuple(getItem(results), getError(results)); });
+  }
+
+  void itemAtPath(const std::string &path, NSFileProviderItemCompletion completion) override {
+    call(
+        &Client::itemAtPathRequest, [path](auto params, Session &) { params.setPath(xpcBytes(path)); },
+        std::move(completion),
+        [](auto results, const RemoteObject &) { return std::tuple(getItem(results), getError(results)); });
+  }
+
+  void URLForItemIdentifier(const std::string &identifier, NSFileProviderURLCompletion completion) override {
+    call(
+        &Client::urlForItemIdentifierRequest,
+        [identifier](auto params, Session &) { params.setIdentifier(xpcBytes(identifier)); },
+        std::move(completion),
+        [](auto results, const RemoteObject &) { return std::tuple(getURL(results)); });
+  }
+
+  void identifierForItemAtURL(const NSURL &url, NSFileProviderIdentifierCompletion completion) override {
+    call(
+        &Client::identifierForItemAtURLRequest, [url](auto params, Session &) { setURL(params, url); },
+        std::move(completion),
+        [](auto results, const RemoteObject &) { return std::tuple(getIdentifier(results)); });
+  }
+
+  void enumeratorForContainer(const std::string &identifier,
+                              NSFileProviderEnumeratorCompletion completion) override {
+    call(
+        &Client::enumeratorForContainerRequest,
+        [identifier](auto params, Session &) { params.setIdentifier(xpcBytes(identifier)); },
+        std::move(completion),
+        [](auto results, const RemoteObject &via) {
+          return std::tuple(getEnumerator(results, via), getError(results));
+        });
+  }
+
+  void watchContainer(const std::string &identifier, std::shared_ptr<FPDWatchObserver> observer,
+                      FPDWatchCompletion completion) override {
+    call(
+        &Client::watchContainerRequest,
+        [identifier, observer = std::move(observer)](auto params, Session &session) {
+          params.setIdentifier(xpcBytes(identifier));
+          if (observer) params.setObserver(exportWatchObserver(session, observer));
+        },
+        std::move(completion),
+        [](auto results, const RemoteObject &via) {
+          return std::tuple(results.hasWatch() ? receivedWatch(via, results.getWatch()) : nullptr,
+                            getError(results));
+        });
+  }
+};
+
+}  // namespace
+
+const NSXPCInterface &FPDControlInterface() {
+  static const auto interface =
+      makeXPCInterface<FPDControlProtocol, ControlServer, ControlProxy>("FPDControlProtocol");
+  return interface;
+}
+
+}  // namespace droxa

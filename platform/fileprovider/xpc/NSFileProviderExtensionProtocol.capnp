@@ -1,0 +1,14 @@
+@0x9b3cf3e1adf5b418;
+
+using Cxx = import "/capnp/c++.capnp";
+using Enumerator = import "/platform/fileprovider/xpc/NSFileProviderRemoteEnumerator.capnp";
+using Values = import "/platform/xpc/Values.capnp";
+$Cxx.namespace("droxa::schema");
+
+interface NSFileProviderExtensionProtocol {
+  itemForIdentifier @0 (identifier :Data) -> (item :Values.Item, error :Values.Error);
+  urlForItemIdentifier @1 (identifier :Data) -> (url :Values.Url);
+  identifierForItemAtURL @2 (url :Values.Url) -> (identifier :Data);
+  enumeratorForContainer @3 (identifier :Data)
+      -> (enumerator :Enumerator.NSFileProviderRemoteEnumerator, error :Values.Error);
+}

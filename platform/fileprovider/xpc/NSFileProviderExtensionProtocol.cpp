@@ -1,0 +1,112 @@
+#include <utility>
+
+#include "platform/fileprovider/NSFileProviderRemote.h"
+#include "platform/fileprovider/xpc/FileProviderInterfaces.h"
+#include "platform/fileprovider/xpc/NSFileProviderExtensionProtocol.capnp.h"
+#include "platform/fileprovider/xpc/RemoteEnumeratorAdapter.h"
+#include "platform/xpc/capnp/Exported.h"
+#include "platform/xpc/capnp/Interface.h"
+#include "platform/xpc/capnp/Proxy.h"
+#include "platform/xpc/capnp/Values.h"
+
+namespace droxa {
+namespace {
+
+using Schema = schema::NSFileProviderExtensionProtocol;
+
+class ExtensionServer final : public Schema::Server {
+ public:
+  ExtensionServer(Session &session, std::shared_ptr<NSFileProviderExtensionProtocol> object)
+      : exported_(session, std::move(object)) {}
+
+  kj::Promise<void> itemForIdentifier(ItemForIdentifierContext context) override {
+    return exported_.serve(
+        context, [identifier = xpcString(context.getParams().getIdentifier())](auto &object, auto reply) {
+          object.itemForIdentifier(identifier,
+                                   reply([](auto results, Session &, const auto &item, const NSError &error) {
+                                     setItem(results, item);
+                                     setError(results, error);
+                                   }));
+        });
+  }
+
+  kj::Promise<void> urlForItemIdentifier(UrlForItemIdentifierContext context) override {
+    return exported_.serve(
+        context, [identifier = xpcString(context.getParams().getIdentifier())](auto &object, auto reply) {
+          object.URLForItemIdentifier(
+              identifier, reply([](auto results, Session &, const NSURL &url) { setURL(results, url); }));
+        });
+  }
+
+  kj::Promise<void> identifierForItemAtURL(IdentifierForItemAtURLContext context) override {
+    return exported_.serve(context, [url = getURL(context.getParams())](auto &object, auto reply) {
+      object.identifierForItemAtURL(url, reply([](auto results, Session &, const auto &identifier) {
+                                      setIdentifier(results, identifier);
+                                    }));
+    });
+  }
+
+  kj::Promise<void> enumeratorForContainer(EnumeratorForContainerContext context) override {
+    return exported_.serve(context, [identifier = xpcString(context.getParams().getIdentifier())](
+                                        auto &object, auto reply) {
+      object.enumeratorForContainer(
+          identifier, reply([](auto results, Session &session, const auto &enumerator, const NSError &error) {
+            setEnumerator(results, session, enumerator);
+            setError(results, error);
+          }));
+    });
+  }
+
+ private:
+  Exported<NSFileProviderExtensionProtocol> exported_;
+};
+
+class ExtensionProxy final : public XPCProxy<Schema, NSFileProviderExtensionProtocol, ExtensionProxy> {
+ public:
+  using XPCProxy::XPCProxy;
+
+  void itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion) override {
+    call(
+        &Client::itemForIdentifierRequest,
+        [identifier](auto params, Session &) { params.setIdentifier(xpcBytes(identifier)); },
+        std::move(completion),
+        [](auto results, const RemoteObject &) { return std::tuple(getItem(results), getError(results)); });
+  }
+
+  void URLForItemIdentifier(const std::string &identifier, NSFileProviderURLCompletion completion) override {
+    call(
+        &Client::urlForItemIdentifierRequest,
+        [identifier](auto params, Session &) { params.setIdentifier(xpcBytes(identifier)); },
+        std::move(completion),
+        [](auto results, const RemoteObject &) { return std::tuple(getURL(results)); });
+  }
+
+  void identifierForItemAtURL(const NSURL &url, NSFileProviderIdentifierCompletion completion) override {
+    call(
+        &Client::identifierForItemAtURLRequest, [url](auto params, Session &) { setURL(params, url); },
+        std::move(completion),
+        [](auto results, const RemoteObject &) { return std::tuple(getIdentifier(results)); });
+  }
+
+  void enumeratorForContainer(const std::string &identifier,
+                              NSFileProviderEnumeratorCompletion completion) override {
+    call(
+        &Client::enumeratorForContainerRequest,
+        [identifier](auto params, Session &) { params.setIdentifier(xpcBytes(identifier)); },
+        std::move(completion),
+        [](auto results, const RemoteObject &via) {
+          return std::tuple(getEnumerator(results, via), getError(results));
+        });
+  }
+};
+
+}  // namespace
+
+const NSXPCInterface &NSFileProviderExtensionInterface() {
+  static const auto interface =
+      makeXPCInterface<NSFileProviderExtensionProtocol, ExtensionServer, ExtensionProxy>(
+          "NSFileProviderExtensionProtocol");
+  return interface;
+}
+
+}  // namespace droxa

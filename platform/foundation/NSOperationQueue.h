@@ -1,0 +1,44 @@
+#pragma once
+
+#include <functional>
+#include <memory>
+
+namespace droxa {
+
+// A unit of work that an NSOperationQueue starts once and that may be cancelled at any time.
+// Thread contract: isCancelled(), cancel() on any thread; main() on the queue's threads.
+class NSOperation {
+ public:
+  NSOperation();
+  virtual ~NSOperation();
+  virtual void main() = 0;
+  virtual void cancel();  // marks it; one that hasn't started never runs
+  bool isCancelled() const;
+  bool isFinished() const;
+  void waitUntilFinished() const;
+
+ private:
+  friend class NSOperationQueue;
+  struct State;
+  std::unique_ptr<State> state_;
+};
+
+// Runs operations concurrently on the process's thread pool, each exactly once or, when cancelled before it
+// starts, never.
+// Thread contract: every member may be called on any thread.
+class NSOperationQueue {
+ public:
+  NSOperationQueue();
+  ~NSOperationQueue();  // doesn't wait: operations already started finish on their own
+  void addOperation(std::shared_ptr<NSOperation> operation);
+  void addOperationWithBlock(std::function<void()> block);
+  void cancelAllOperations();
+  void waitUntilAllOperationsAreFinished();
+  std::size_t operationCount() const;
+
+ private:
+  struct State;
+  std::shared_ptr<State> state_;
+};
+
+}  // namespace droxa
