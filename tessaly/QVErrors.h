@@ -1,0 +1,21 @@
+#pragma once
+
+#include "platform/foundation/NSError.h"
+
+namespace droxa {
+
+inline constexpr char QVTessalyErrorDomain[] = "QVTessalyErrorDomain";
+
+inline constexpr std::int64_t QVErrorLoggedOut = 2;
+inline constexpr std::int64_t QVErrorNoSuchItem = 14;
+inline constexpr std::int64_t QVErrorInvalidArgument = 22;
+inline constexpr std::int64_t QVErrorDatabase = 30;
+inline constexpr std::int64_t QVErrorUnreadable = 31;          // the file system refused to show the item
+inline constexpr std::int64_t QVErrorChangeTokenExpired = 32;  // of the working-set feed
+inline constexpr std::int64_t QVErrorShuttingDown = 33;
+
+NSError qvc_errorLoggedOut();
+NSError qvc_error(std::int64_t code, std::string description);
+NSError qvc_errorNoSuchItem(const std::string &asked);
+
+}  // namespace droxa

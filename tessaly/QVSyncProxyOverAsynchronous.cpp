@@ -1,0 +1,144 @@
+#include "tessaly/QVSyncProxyOverAsynchronous.h"
+
+#include <condition_variable>
+#include <optional>
+#include <tuple>
+#include <type_traits>
+#include <utility>
+
+#include "platform/foundation/ThreadSafety.h"
+
+namespace droxa {
+
+namespace {
+
+// Where the answer of one call is put by one thread and waited for by another.
+template <class... Args>
+class Slot {
+ public:
+  void put(std::optional<std::tuple<std::decay_t<Args>...>> values, NSError failure) {
+    const Lock lock(mutex_);
+    values_ = std::move(values);
+    failure_ = std::move(failure);
+    answered_ = true;
+    condition_.notify_all();
+  }
+  // The values of the reply; nullopt, with the error handler's error, when that was called instead.
+  std::optional<std::tuple<std::decay_t<Args>...>> wait(NSError *failure) {
+    const Lock lock(mutex_);
+    while (!answered_) condition_.wait(mutex_);
+    *failure = failure_;
+    return std::move(values_);
+  }
+
+ private:
+  Mutex mutex_;
+  std::condition_variable_any condition_;
+  bool answered_ GUARDED_BY(mutex_) = false;
+  std::optional<std::tuple<std::decay_t<Args>...>> values_ GUARDED_BY(mutex_);
+  NSError failure_ GUARDED_BY(mutex_);
+};
+
+class BlockingProxy final : public QVSyncProxy, public QVProtocol {
+ public:
+  explicit BlockingProxy(QVProxyMaker maker) : maker_(std::move(maker)) {}
+
+  QVProtocol *operator->() override { return this; }
+
+  void enumerateItemsInFolder(const std::optional<QVFileObjectID> &folder, std::int64_t sortOrder,
+                              std::uint64_t offset, std::uint64_t limit,
+                              QVItemsCompletion completion) override {
+    wait(completion, [&](QVProtocol &daemon, QVItemsCompletion answer) {
+      daemon.enumerateItemsInFolder(folder, sortOrder, offset, limit, std::move(answer));
+    });
+  }
+  void enumerateAllFoldersWithSortOrder(std::int64_t sortOrder, std::uint64_t offset, std::uint64_t limit,
+                                        QVItemsCompletion completion) override {
+    wait(completion, [&](QVProtocol &daemon, QVItemsCompletion answer) {
+      daemon.enumerateAllFoldersWithSortOrder(sortOrder, offset, limit, std::move(answer));
+    });
+  }
+  void currentNotifRankWithReply(QVRankReply reply) override {
+    wait(reply,
+         [](QVProtocol &daemon, QVRankReply answer) { daemon.currentNotifRankWithReply(std::move(answer)); });
+  }
+  void enumerateWorkingSetChangesFromChangeToken(const NSData &token, std::uint64_t limit,
+                                                 QVWorkingSetCompletion completion) override {
+    wait(completion, [&](QVProtocol &daemon, QVWorkingSetCompletion answer) {
+      daemon.enumerateWorkingSetChangesFromChangeToken(token, limit, std::move(answer));
+    });
+  }
+  void getItemUpdateSenderWithReceiver(std::shared_ptr<QVItemNotificationReceiving> receiver,
+                                       QVSenderReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVSenderReply answer) {
+      daemon.getItemUpdateSenderWithReceiver(std::move(receiver), std::move(answer));
+    });
+  }
+  void getURLForItemIdentifier(const std::string &identifier, QVURLReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVURLReply answer) {
+      daemon.getURLForItemIdentifier(identifier, std::move(answer));
+    });
+  }
+  void getURLForFileObjectID(const QVFileObjectID &fileObjectID, QVURLReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVURLReply answer) {
+      daemon.getURLForFileObjectID(fileObjectID, std::move(answer));
+    });
+  }
+  void getQueryItemForURL(const NSURL &url, bool fakeFSEvent, QVItemReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVItemReply answer) {
+      daemon.getQueryItemForURL(url, fakeFSEvent, std::move(answer));
+    });
+  }
+  void getContainerItem(const std::string &containerID, bool forceScan, QVItemReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVItemReply answer) {
+      daemon.getContainerItem(containerID, forceScan, std::move(answer));
+    });
+  }
+  void getContainers(QVContainersReply reply) override {
+    wait(reply,
+         [](QVProtocol &daemon, QVContainersReply answer) { daemon.getContainers(std::move(answer)); });
+  }
+  void subscribeToNotifications(std::shared_ptr<QVDaemonNotificationReceiving> receiver,
+                                QVErrorReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVErrorReply answer) {
+      daemon.subscribeToNotifications(std::move(receiver), std::move(answer));
+    });
+  }
+  void getAccount(QVAccountReply reply) override {
+    wait(reply, [](QVProtocol &daemon, QVAccountReply answer) { daemon.getAccount(std::move(answer)); });
+  }
+  void signIn(const std::string &name, QVAccountReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVAccountReply answer) { daemon.signIn(name, std::move(answer)); });
+  }
+  void signOut(QVErrorReply reply) override {
+    wait(reply, [](QVProtocol &daemon, QVErrorReply answer) { daemon.signOut(std::move(answer)); });
+  }
+  void getStatus(QVStatusReply reply) override {
+    wait(reply, [](QVProtocol &daemon, QVStatusReply answer) { daemon.getStatus(std::move(answer)); });
+  }
+
+ private:
+  template <class... Args, class Call>
+  void wait(const std::function<void(Args...)> &reply, const Call &call) {
+    // Shared, because a late second answer of a faulty daemon must still find it.
+    const auto slot = std::make_shared<Slot<Args...>>();
+    const std::shared_ptr<QVProtocol> daemon =
+        maker_([slot](const NSError &error) { slot->put(std::nullopt, error); });
+    call(*daemon, [slot](Args... args) { slot->put(std::make_tuple(args...), NSError()); });
+    NSError failure;
+    if (auto values = slot->wait(&failure))
+      std::apply(reply, *values);
+    else
+      setObjResult({}, failure);
+  }
+
+  const QVProxyMaker maker_;
+};
+
+}  // namespace
+
+std::unique_ptr<QVSyncProxy> QVSyncProxyOverAsynchronous(QVProxyMaker maker) {
+  return std::make_unique<BlockingProxy>(std::move(maker));
+}
+
+}  // namespace droxa

@@ -1,0 +1,64 @@
+#include "tessaly/QVUnreachableDaemon.h"
+
+#include <utility>
+
+namespace droxa {
+
+namespace {
+
+class UnreachableDaemon final : public QVProtocol {
+ public:
+  explicit UnreachableDaemon(std::function<void()> failed) : failed_(std::move(failed)) {}
+
+  void enumerateItemsInFolder(const std::optional<QVFileObjectID> & /*folder*/, std::int64_t /*sortOrder*/,
+                              std::uint64_t /*offset*/, std::uint64_t /*limit*/,
+                              QVItemsCompletion /*completion*/) override {
+    failed_();
+  }
+  void enumerateAllFoldersWithSortOrder(std::int64_t /*sortOrder*/, std::uint64_t /*offset*/,
+                                        std::uint64_t /*limit*/, QVItemsCompletion /*completion*/) override {
+    failed_();
+  }
+  void currentNotifRankWithReply(QVRankReply /*reply*/) override { failed_(); }
+  void enumerateWorkingSetChangesFromChangeToken(const NSData & /*token*/, std::uint64_t /*limit*/,
+                                                 QVWorkingSetCompletion /*completion*/) override {
+    failed_();
+  }
+  void getItemUpdateSenderWithReceiver(std::shared_ptr<QVItemNotificationReceiving> /*receiver*/,
+                                       QVSenderReply /*reply*/) override {
+    failed_();
+  }
+  void getURLForItemIdentifier(const std::string & /*identifier*/, QVURLReply /*reply*/) override {
+    failed_();
+  }
+  void getURLForFileObjectID(const QVFileObjectID & /*fileObjectID*/, QVURLReply /*reply*/) override {
+    failed_();
+  }
+  void getQueryItemForURL(const NSURL & /*url*/, bool /*fakeFSEvent*/, QVItemReply /*reply*/) override {
+    failed_();
+  }
+  void getContainerItem(const std::string & /*containerID*/, bool /*forceScan*/,
+                        QVItemReply /*reply*/) override {
+    failed_();
+  }
+  void getContainers(QVContainersReply /*reply*/) override { failed_(); }
+  void subscribeToNotifications(std::shared_ptr<QVDaemonNotificationReceiving> /*receiver*/,
+                                QVErrorReply /*reply*/) override {
+    failed_();
+  }
+  void getAccount(QVAccountReply /*reply*/) override { failed_(); }
+  void signIn(const std::string & /*name*/, QVAccountReply /*reply*/) override { failed_(); }
+  void signOut(QVErrorReply /*reply*/) override { failed_(); }
+  void getStatus(QVStatusReply /*reply*/) override { failed_(); }
+
+ private:
+  const std::function<void()> failed_;
+};
+
+}  // namespace
+
+std::shared_ptr<QVProtocol> QVUnreachableDaemon(std::function<void()> failed) {
+  return std::make_shared<UnreachableDaemon>(std::move(failed));
+}
+
+}  // namespace droxa

@@ -1,0 +1,38 @@
+#pragma once
+
+#include "platform/xpc/capnp/Proxy.h"
+#include "tessaly/QVProtocol.h"
+#include "tessaly/xpc/QVProtocol.capnp.h"
+
+namespace droxa {
+
+// Stands in for the daemon's object in another process.
+// Thread contract: any thread, never the loop.
+class QVProtocolProxy final : public XPCProxy<schema::QVProtocol, QVProtocol, QVProtocolProxy> {
+ public:
+  using XPCProxy::XPCProxy;
+
+  void enumerateItemsInFolder(const std::optional<QVFileObjectID> &folder, std::int64_t sortOrder,
+                              std::uint64_t offset, std::uint64_t limit,
+                              QVItemsCompletion completion) override;
+  void enumerateAllFoldersWithSortOrder(std::int64_t sortOrder, std::uint64_t offset, std::uint64_t limit,
+                                        QVItemsCompletion completion) override;
+  void currentNotifRankWithReply(QVRankReply reply) override;
+  void enumerateWorkingSetChangesFromChangeToken(const NSData &token, std::uint64_t limit,
+                                                 QVWorkingSetCompletion completion) override;
+  void getItemUpdateSenderWithReceiver(std::shared_ptr<QVItemNotificationReceiving> receiver,
+                                       QVSenderReply reply) override;
+  void getURLForItemIdentifier(const std::string &identifier, QVURLReply reply) override;
+  void getURLForFileObjectID(const QVFileObjectID &fileObjectID, QVURLReply reply) override;
+  void getQueryItemForURL(const NSURL &url, bool fakeFSEvent, QVItemReply reply) override;
+  void getContainerItem(const std::string &containerID, bool forceScan, QVItemReply reply) override;
+  void getContainers(QVContainersReply reply) override;
+  void subscribeToNotifications(std::shared_ptr<QVDaemonNotificationReceiving> receiver,
+                                QVErrorReply reply) override;
+  void getAccount(QVAccountReply reply) override;
+  void signIn(const std::string &name, QVAccountReply reply) override;
+  void signOut(QVErrorReply reply) override;
+  void getStatus(QVStatusReply reply) override;
+};
+
+}  // namespace droxa

@@ -1,0 +1,40 @@
+#pragma once
+
+#include <memory>
+
+#include "platform/xpc/capnp/Exported.h"
+#include "tessaly/QVProtocol.h"
+#include "tessaly/xpc/QVProtocol.capnp.h"
+
+namespace droxa {
+
+// The daemon's object as its clients call it.
+// Thread contract: the loop; the object is called on the pool, several calls at a time.
+class QVProtocolServer final : public schema::QVProtocol::Server {
+ public:
+  QVProtocolServer(Session &session, std::shared_ptr<QVProtocol> object)
+      : exported_(session, std::move(object)) {}
+
+  kj::Promise<void> enumerateItemsInFolder(EnumerateItemsInFolderContext context) override;
+  kj::Promise<void> enumerateAllFoldersWithSortOrder(
+      EnumerateAllFoldersWithSortOrderContext context) override;
+  kj::Promise<void> currentNotifRankWithReply(CurrentNotifRankWithReplyContext context) override;
+  kj::Promise<void> enumerateWorkingSetChangesFromChangeToken(
+      EnumerateWorkingSetChangesFromChangeTokenContext context) override;
+  kj::Promise<void> getItemUpdateSenderWithReceiver(GetItemUpdateSenderWithReceiverContext context) override;
+  kj::Promise<void> getURLForItemIdentifier(GetURLForItemIdentifierContext context) override;
+  kj::Promise<void> getURLForFileObjectID(GetURLForFileObjectIDContext context) override;
+  kj::Promise<void> getQueryItemForURL(GetQueryItemForURLContext context) override;
+  kj::Promise<void> getContainerItem(GetContainerItemContext context) override;
+  kj::Promise<void> getContainers(GetContainersContext context) override;
+  kj::Promise<void> subscribeToNotifications(SubscribeToNotificationsContext context) override;
+  kj::Promise<void> getAccount(GetAccountContext context) override;
+  kj::Promise<void> signIn(SignInContext context) override;
+  kj::Promise<void> signOut(SignOutContext context) override;
+  kj::Promise<void> getStatus(GetStatusContext context) override;
+
+ private:
+  Exported<QVProtocol> exported_;
+};
+
+}  // namespace droxa
