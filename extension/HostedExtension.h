@@ -1,0 +1,31 @@
+#pragma once
+
+#include <memory>
+#include <string>
+
+#include "platform/fileprovider/NSFileProviderExtension.h"
+#include "platform/fileprovider/NSFileProviderRemote.h"
+
+namespace droxa {
+
+// The principal object as the host sees it: each request is one of the principal's synchronous operations.
+// Thread contract: any thread, several requests at a time. A request blocks its caller, which is the
+// connection's pool, while the principal waits for the daemon; its completion is called exactly once, before
+// the request returns.
+class HostedExtension final : public NSFileProviderExtensionProtocol {
+ public:
+  explicit HostedExtension(std::shared_ptr<NSFileProviderExtension> principal);
+
+  // Without an item there always is an error.
+  void itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion) override;
+  void URLForItemIdentifier(const std::string &identifier, NSFileProviderURLCompletion completion) override;
+  void identifierForItemAtURL(const NSURL &url, NSFileProviderIdentifierCompletion completion) override;
+  // Without an enumerator there always is an error.
+  void enumeratorForContainer(const std::string &identifier,
+                              NSFileProviderEnumeratorCompletion completion) override;
+
+ private:
+  const std::shared_ptr<NSFileProviderExtension> principal_;
+};
+
+}  // namespace droxa

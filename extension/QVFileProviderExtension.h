@@ -1,0 +1,101 @@
+#pragma once
+
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "platform/dispatch/dispatch.h"
+#include "platform/fileprovider/NSFileProviderExtension.h"
+#include "platform/foundation/NSFileHandle.h"
+#include "platform/foundation/NSOperationQueue.h"
+#include "platform/foundation/ThreadSafety.h"
+
+namespace droxa {
+
+class QVQueryItem;
+
+// The extension's principal class: one instance in a process, made by the framework. It answers identity
+// questions (which URL, identifier, properties or enumerator belong together) and carries what the document
+// operations share: queues, the downloads under way, and the persona under which it serves. It owns no
+// documents and keeps nothing on disk, so that the process may be ended at any time.
+//
+// Failures are told by a nil result; those with an `error` (which may be null) also store an error there that
+// the framework understands (NSFileProviderErrorDomain where there is a translation). Thread contract: every
+// operation may be called on any thread, several at a time; those that ask the daemon block until it replies.
+// Account changes arrive on the thread that posts them.
+class QVFileProviderExtension final : public NSFileProviderExtension {
+ private:
+  struct Passkey {};
+
+ public:
+  // Class set-up: installs the persona hooks where the provider is managed, and ends the process with status
+  // 1 where the replacement of this extension is enabled. The first init() runs it, once in a process.
+  static void initialize();
+
+  static std::shared_ptr<QVFileProviderExtension> init();
+  explicit QVFileProviderExtension(Passkey);
+  ~QVFileProviderExtension() override;
+  QVFileProviderExtension(const QVFileProviderExtension &) = delete;
+  QVFileProviderExtension &operator=(const QVFileProviderExtension &) = delete;
+
+  // Whether somebody is signed in; otherwise `error` is set. Needs no daemon.
+  bool _isLoggedInOrError(NSError *error) const;
+
+  // An error of a coordinated file operation as the framework wants it: a collision names the item that is in
+  // the way; every other error is given back as it is.
+  NSError fileProviderErrorFromFSError(const NSError &error) const;
+
+  // Identifier to URL. Failures are only logged: there is no URL then. `resolvingQVAliases` gives the target
+  // of an alias instead of the alias; `attachPhysical` marks the URL for operations on the physical file.
+  NSURL URLForItemWithPersistentIdentifier(const std::string &identifier) override;
+  NSURL _URLForItemWithPersistentIdentifier(const std::string &identifier, bool resolvingQVAliases) const;
+  NSURL _URLForItemWithPersistentIdentifier(const std::string &identifier, bool resolvingQVAliases,
+                                            bool attachPhysical) const;
+
+  // URL to identifier.
+  std::optional<std::string> persistentIdentifierForItemAtURL(const NSURL &url) override;
+
+  // Identifier to item.
+  std::shared_ptr<const NSFileProviderItem> itemForIdentifier(const std::string &identifier,
+                                                              NSError *error) override;
+
+  // URL to item. With `forceScan`, which a just-made item needs, the daemon looks at the file first.
+  std::shared_ptr<const QVQueryItem> _propertiesForNewItemAtURL(const NSURL &url, NSError *error) const;
+  std::shared_ptr<const QVQueryItem> _propertiesForItemAtURL(const NSURL &url, NSError *error) const;
+  std::shared_ptr<const QVQueryItem> _propertiesForItemAtURL(const NSURL &url, bool forceScan,
+                                                             NSError *error) const;
+
+  // Identifier to the enumerator of the container.
+  std::shared_ptr<NSFileProviderEnumerator> enumeratorForContainerItemIdentifier(
+      const std::string &identifier, NSError *error) override;
+
+  // What was remembered when the instance was made; nil where the provider isn't managed.
+  const std::optional<std::string> &personaID() const { return _personaID; }
+  const std::shared_ptr<NSFileHandle> &witness() const { return _witness; }
+
+ private:
+  void _accountDidChange();
+  std::shared_ptr<NSFileProviderEnumerator> fileEnumeratorForContainer(const std::string &identifier,
+                                                                       NSError *error);
+
+  RecursiveMutex _lock;                    // the instance's own monitor
+  mutable Mutex _itemsForcedDownloadLock;  // never held together with the monitor
+
+  // The one download under way for a path.
+  std::map<std::string, std::shared_ptr<NSOperation>> _downloadOperationByPath GUARDED_BY(_lock);
+
+  // Constant after construction.
+  const std::unique_ptr<NSOperationQueue> _operationQueue;
+  const dispatch_queue_t _queue;
+
+  // The items whose download a move has forced.
+  std::vector<std::string> _itemsForcedDownload GUARDED_BY(_itemsForcedDownloadLock);
+
+  // Constant after construction.
+  const std::optional<std::string> _personaID;
+  const std::shared_ptr<NSFileHandle> _witness;  // holds the home directory open
+};
+
+}  // namespace droxa

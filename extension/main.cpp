@@ -1,0 +1,5 @@
+#include "extension/NSExtensionMain.h"
+
+int main(int argc, char *argv[]) {
+  return droxa::NSExtensionMain(argc, argv);
+}
