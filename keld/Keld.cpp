@@ -1,0 +1,228 @@
+#include "keld/Keld.h"
+
+#include <future>
+#include <sys/stat.h>
+#include <system_error>
+#include <unistd.h>
+#include <uuid/uuid.h>
+
+#include "keld/KeldSession.h"
+#include "keld/Schema.h"
+#include "platform/foundation/NSDate.h"
+#include "tessaly/QVErrors.h"
+#include "tessaly/QVLog.h"
+#include "tessaly/QVNotifications.h"
+
+namespace droxa::keld {
+
+Keld::Keld(const DroxaHome &home, KeldOptions options)
+    : home_(home),
+      options_(std::move(options)),
+      replicaPath_(NSURL::fileURLWithPath(home.replica()).path()),
+      databasePath_(home.state() + "/keld.sqlite"),
+      startedNanoseconds_(NSDate::now().nanosecondsSince1970()) {}
+
+Keld::~Keld() {
+  stop();
+}
+
+std::shared_ptr<Keld> Keld::start(const DroxaHome &home, KeldOptions options, std::string *problem) {
+  if (!home.create(problem)) return nullptr;
+  std::shared_ptr<Keld> daemon(new Keld(home, std::move(options)));
+  daemon->lock_ = HomeLock::take(home.run() + "/keld.lock", problem);
+  if (!daemon->lock_) return nullptr;
+  *problem = MakeBuiltInContainers(daemon->replicaPath_);
+  if (!problem->empty()) return nullptr;
+  try {
+    daemon->open();
+  } catch (const std::exception &error) {
+    *problem = error.what();
+    if (problem->find(daemon->databasePath_) == std::string::npos)
+      *problem = daemon->databasePath_ + ": " + *problem;
+    return nullptr;
+  }
+  return daemon;
+}
+
+void Keld::open() {
+  OpenedDatabase opened = DatabaseOpen(databasePath_);
+  const bool wasDamaged = !opened.damagedCopy.empty();
+  keeper_ = std::make_unique<Keeper>(std::move(opened.database), databasePath_, replicaPath_, options_.keeper,
+                                     containers_, *this);
+  readers_ = std::make_unique<ReaderPool>(databasePath_);
+  account_ = std::make_unique<AccountKeeper>(
+      home_.configuration(), [this](const std::string &name) { return identifierForAccount(name); });
+  keeper_->start();
+  const NSError error = account_->load();
+  if (error) os_log_error(qvc_default_log(), "[ERROR] can't read the account: %@", error);
+  offerLocalAccount(!wasDamaged && !error);
+}
+
+// A home that is used for the first time works at once. Who signed out there stays signed out: the database
+// knows that the account was offered, and one that replaces a damaged one doesn't offer it again.
+void Keld::offerLocalAccount(bool mayOffer) {
+  bool wasOffered = false;
+  (void)read([&](ItemQueries &queries, const ItemPresenter &) {
+    wasOffered = queries.metaNumber("accountOffered") != 0;
+  });
+  if (wasOffered) return;
+  if (mayOffer && !account_->isSignedIn()) {
+    const NSError error = account_->signIn(AccountKeeper::localUserName());
+    if (error) os_log_error(qvc_default_log(), "[ERROR] can't sign the local account in: %@", error);
+  }
+  performAndWait([](ItemEdits &edits) { edits.setMeta("accountOffered", 1); });
+}
+
+// Whoever signs in or out next must find it remembered, so it is committed first.
+void Keld::performAndWait(const std::function<void(ItemEdits &edits)> &edit) {
+  auto written = std::make_shared<std::promise<void>>();
+  keeper_->perform([edit](Reconciler &, ItemQueries &, ItemEdits &edits) { edit(edits); },
+                   [written] { written->set_value(); });
+  written->get_future().wait();
+}
+
+std::string Keld::identifierForAccount(const std::string &name) {
+  const std::string key = "account:" + name;
+  std::string known;
+  (void)read([&](ItemQueries &queries, const ItemPresenter &) { known = queries.metaText(key); });
+  if (!known.empty()) return known;
+  uuid_t uuid;
+  uuid_generate(uuid);
+  char text[37];
+  uuid_unparse_lower(uuid, text);
+  const std::string made = text;
+  performAndWait([&](ItemEdits &edits) { edits.setMetaText(key, made); });
+  return made;
+}
+
+void Keld::stop() {
+  if (stopped_.exchange(true)) return;
+  if (keeper_) keeper_->stop();
+}
+
+std::shared_ptr<QVProtocol> Keld::newSession() {
+  return std::make_shared<KeldSession>(shared_from_this());
+}
+
+NSError Keld::read(const Read &work) {
+  if (stopped_) return qvc_error(QVErrorShuttingDown, "the daemon is shutting down");
+  try {
+    readers_->read([&](ItemQueries &queries) { work(queries, ItemPresenter(containers_.current())); });
+    return NSError();
+  } catch (const SqlError &error) {
+    os_log_error(qvc_default_log(), "[ERROR] the item database can't be read: %s", error.what());
+    return qvc_error(QVErrorDatabase, databasePath_ + ": " + error.what());
+  }
+}
+
+NSError Keld::checkSignedIn() const {
+  return account_->isSignedIn() ? NSError() : qvc_errorLoggedOut();
+}
+
+std::optional<std::string> Keld::pathBelowReplica(const NSURL &url) const {
+  if (!url.isFileURL()) return std::nullopt;
+  const std::string &path = url.path();
+  if (path.size() <= replicaPath_.size() + 1 || path.compare(0, replicaPath_.size(), replicaPath_) != 0 ||
+      path[replicaPath_.size()] != '/')
+    return std::nullopt;
+  return path.substr(replicaPath_.size() + 1);
+}
+
+QVDaemonStatus Keld::status() {
+  QVDaemonStatus status;
+  status.processIdentifier = static_cast<std::uint32_t>(::getpid());
+  status.startedNanoseconds = startedNanoseconds_;
+  const Counters counters = keeper_->counters();
+  status.rank = counters.rank;
+  status.documents = counters.documents;
+  status.folders = counters.folders;
+  status.aliases = counters.aliases;
+  status.firstScanDone = keeper_->firstScanDone();
+  if (!status.firstScanDone) {
+    (void)read([&](ItemQueries &queries, const ItemPresenter &) {
+      status.pendingScans = queries.countFoldersAfter(keeper_->scannedThrough());
+    });
+  }
+  status.senders = senders_.count();
+  status.watcher = keeper_->watcherDescription();
+  for (const char *suffix : {"", "-wal"}) {
+    struct stat file;
+    if (::stat((databasePath_ + suffix).c_str(), &file) == 0)
+      status.databaseBytes += static_cast<std::uint64_t>(file.st_size);
+  }
+  return status;
+}
+
+// --- What the keeper tells.
+
+void Keld::itemsChanged(const std::vector<ItemChange> &changes, const Containers &before,
+                        const Containers &after, ItemQueries &queries) {
+  senders_.publish(changes, before, after, queries);
+}
+
+void Keld::containerListChanged() {
+  notifications_->post(QVContainerListDidChangeNotification);
+}
+
+bool Keld::wantsChanges() {
+  return senders_.count() != 0;
+}
+
+void Keld::keeperFailed(const std::string &why) {
+  stopped_ = true;
+  if (options_.failed) options_.failed(why);
+}
+
+// --- What senders ask.
+
+void Keld::findWatchTarget(const NSURL &url,
+                           std::function<void(std::optional<UpdateWatch>, const NSError &)> reply) {
+  const auto path = pathBelowReplica(url);
+  if (!path) return reply(std::nullopt, qvc_errorNoSuchItem(url.path()));
+  const auto find = [self = shared_from_this(), path = *path](NSError *error) {
+    std::optional<UpdateWatch> watch;
+    *error = self->read([&](ItemQueries &queries, const ItemPresenter &presenter) {
+      const auto record = queries.byPathBelowReplica(path);
+      if (record) watch = UpdateWatch{record->id, record->id == presenter.containers().root(), 0};
+    });
+    return watch;
+  };
+  NSError error;
+  const auto known = find(&error);
+  if (known || error) return reply(known, error);
+  // It may be so new that the keeper hasn't seen it.
+  keeper_->lookAt(*path, [find, reply = std::move(reply)] {
+    NSError problem;
+    const auto found = find(&problem);
+    reply(found, problem);
+  });
+}
+
+bool Keld::exists(ItemNumber id) {
+  bool found = false;
+  (void)read([&](ItemQueries &queries, const ItemPresenter &) {
+    const auto record = queries.byID(id);
+    found = record && record->parent != kLimboFolder;
+  });
+  return found;
+}
+
+QVQueryItems Keld::itemsForPush(const std::vector<PendingPush> &pushes) {
+  QVQueryItems items;
+  (void)read([&](ItemQueries &queries, const ItemPresenter &presenter) {
+    for (const PendingPush &push : pushes) {
+      if (push.isDead) {
+        items.push_back(ItemPresenter::deadItem(push.id, push.kind));
+        continue;
+      }
+      const auto record = queries.byID(push.id);
+      if (!record || record->parent == kLimboFolder) continue;
+      // What went into private storage is gone, for everybody but its owner.
+      const bool isHidden = record->zone() == Zone::privateStorage;
+      items.push_back(isHidden ? ItemPresenter::deadItem(push.id, push.kind) : presenter.item(*record));
+    }
+  });
+  return items;
+}
+
+}  // namespace droxa::keld

@@ -1,0 +1,64 @@
+#pragma once
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "keld/Keld.h"
+#include "keld/UpdateSender.h"
+#include "platform/foundation/ThreadSafety.h"
+#include "tessaly/QVProtocol.h"
+
+namespace droxa::keld {
+
+// One client's daemon: answers from the item database, and owns the client's senders and subscriptions.
+// Thread contract: any thread. Questions of what is known are answered before the call returns; those that
+// the keeper has to look at first, later on the pool.
+class KeldSession final : public QVProtocol, public std::enable_shared_from_this<KeldSession> {
+ public:
+  explicit KeldSession(std::shared_ptr<Keld> daemon) : daemon_(std::move(daemon)) {}
+  ~KeldSession() override { end(); }
+
+  // Ends the client's senders and subscriptions: its connection has ended.
+  void end();
+
+  void enumerateItemsInFolder(const std::optional<QVFileObjectID> &folder, std::int64_t sortOrder,
+                              std::uint64_t offset, std::uint64_t limit,
+                              QVItemsCompletion completion) override;
+  void enumerateAllFoldersWithSortOrder(std::int64_t sortOrder, std::uint64_t offset, std::uint64_t limit,
+                                        QVItemsCompletion completion) override;
+  void currentNotifRankWithReply(QVRankReply reply) override;
+  void enumerateWorkingSetChangesFromChangeToken(const NSData &token, std::uint64_t limit,
+                                                 QVWorkingSetCompletion completion) override;
+  void getItemUpdateSenderWithReceiver(std::shared_ptr<QVItemNotificationReceiving> receiver,
+                                       QVSenderReply reply) override;
+  void getURLForItemIdentifier(const std::string &identifier, QVURLReply reply) override;
+  void getURLForFileObjectID(const QVFileObjectID &fileObjectID, QVURLReply reply) override;
+  void getQueryItemForURL(const NSURL &url, bool fakeFSEvent, QVItemReply reply) override;
+  void getContainerItem(const std::string &containerID, bool forceScan, QVItemReply reply) override;
+  void getContainers(QVContainersReply reply) override;
+  void subscribeToNotifications(std::shared_ptr<QVDaemonNotificationReceiving> receiver,
+                                QVErrorReply reply) override;
+  void getAccount(QVAccountReply reply) override;
+  void signIn(const std::string &name, QVAccountReply reply) override;
+  void signOut(QVErrorReply reply) override;
+  void getStatus(QVStatusReply reply) override;
+
+ private:
+  struct Found {
+    std::shared_ptr<const QVQueryItem> item;
+    NSError error;
+  };
+  Found findAtPath(const std::string &pathBelowReplica);
+  void listPage(ListingRequest request, std::uint64_t offset, std::uint64_t limit,
+                const QVItemsCompletion &completion);
+  NSError checkListing(std::uint64_t limit) const;
+
+  const std::shared_ptr<Keld> daemon_;
+  Mutex mutex_;
+  bool ended_ GUARDED_BY(mutex_) = false;
+  std::vector<std::weak_ptr<UpdateSender>> senders_ GUARDED_BY(mutex_);
+  std::vector<std::uint64_t> subscriptions_ GUARDED_BY(mutex_);
+};
+
+}  // namespace droxa::keld

@@ -1,0 +1,109 @@
+// keld, the sync daemon of one home.
+
+#include <CLI/CLI.hpp>
+#include <iostream>
+#include <malloc.h>
+#include <optional>
+#include <poll.h>
+#include <signal.h>
+#include <sys/eventfd.h>
+#include <sys/signalfd.h>
+#include <sysexits.h>
+#include <systemd/sd-daemon.h>
+#include <unistd.h>
+
+#include "keld/Keld.h"
+#include "keld/KeldListener.h"
+#include "platform/foundation/Paths.h"
+#include "tessaly/QVLog.h"
+
+namespace droxa::keld {
+namespace {
+
+struct Arguments {
+  std::optional<std::string> home;
+  WatcherKind watcher = WatcherKind::best;
+  bool foreground = true;
+};
+
+int fail(const std::string &problem, int status) {
+  std::cerr << "keld: " << problem << "\n";
+  return status;
+}
+
+// Waits for a signal to end, or for the daemon's own end.
+bool waitForEnd(int signals, int failure) {
+  pollfd waits[2] = {{signals, POLLIN, 0}, {failure, POLLIN, 0}};
+  while (::poll(waits, 2, -1) < 0) {
+  }
+  return waits[1].revents == 0;
+}
+
+int serve(const Arguments &arguments, int signals) {
+  const DroxaHome home = DroxaHome::resolve(arguments.home);
+  DroxaSetProcessHome(home);
+  const int failure = ::eventfd(0, EFD_CLOEXEC);
+  KeldOptions options;
+  options.keeper.watcher = arguments.watcher;
+  options.failed = [failure](const std::string &) {
+    const std::uint64_t one = 1;
+    (void)!::write(failure, &one, sizeof one);
+  };
+  std::string problem;
+  const auto daemon = Keld::start(home, options, &problem);
+  if (!daemon) return fail(problem, EX_UNAVAILABLE);
+  NSError error;
+  const auto listener = KeldListener::listen(daemon, home.daemonSocket(), &error);
+  if (!listener)
+    return fail("can't listen at " + home.daemonSocket() + ": " + error.description(), EX_UNAVAILABLE);
+  ::sd_notify(0, "READY=1");
+  os_log(qvc_default_log(), "[NOTICE] keld serves %s (watching by %s)", home.root(),
+         daemon->keeper().watcherDescription());
+  const bool wasAsked = waitForEnd(signals, failure);
+  ::sd_notify(0, "STOPPING=1");
+  listener->invalidate();
+  daemon->stop();
+  ::unlink(home.daemonSocket().c_str());
+  return wasAsked ? EX_OK : EX_SOFTWARE;
+}
+
+int run(int argc, char **argv) {
+  CLI::App app("keld keeps the item database of a drive in line with its documents, and serves it.", "keld");
+  Arguments arguments;
+  std::string home, watcher = "best";
+  const std::map<std::string, WatcherKind> kinds{{"best", WatcherKind::best},
+                                                 {"fanotify", WatcherKind::fanotify},
+                                                 {"inotify", WatcherKind::inotify},
+                                                 {"scan", WatcherKind::scan}};
+  auto *homeOption =
+      app.add_option("--home", home, "The home's folder (default: $DROXA_HOME, else the user's)");
+  app.add_option("--watcher", arguments.watcher,
+                 "How changes are noticed: best, fanotify (needs privileges), inotify, scan")
+      ->envname("DROXA_WATCHER")
+      ->transform(CLI::CheckedTransformer(kinds, CLI::ignore_case))
+      ->option_text("KIND");
+  app.add_flag("--foreground,!--no-foreground", arguments.foreground,
+               "Stay in the foreground, which it always does");
+  try {
+    app.parse(argc, argv);
+  } catch (const CLI::ParseError &error) {
+    return app.exit(error) == 0 ? EX_OK : 2;
+  }
+  if (homeOption->count() > 0) arguments.home = home;
+
+  // Blocked before the first thread is made, so that they are taken from the descriptor alone.
+  sigset_t ending;
+  sigemptyset(&ending);
+  for (const int signal : {SIGTERM, SIGINT, SIGHUP}) sigaddset(&ending, signal);
+  ::pthread_sigmask(SIG_BLOCK, &ending, nullptr);
+  ::signal(SIGPIPE, SIG_IGN);
+  ::mallopt(M_ARENA_MAX, 4);  // many short-lived threads would each keep memory of their own
+  return serve(arguments, ::signalfd(-1, &ending, SFD_CLOEXEC));
+}
+
+}  // namespace
+}  // namespace droxa::keld
+
+int main(int argc, char **argv) {
+  return droxa::keld::run(argc, argv);
+}
