@@ -1,0 +1,131 @@
+#include "fileproviderd/ExtensionCalls.h"
+
+#include <atomic>
+
+#include "platform/fileprovider/NSFileProviderError.h"
+
+namespace droxa {
+
+namespace {
+
+constexpr int kAttempts = 2;
+
+// The last error of a call that the extension never answered, in words that name the reason.
+NSError cutOff(const NSError &error, ExtensionConnecting &connecting) {
+  NSUserInfo information;
+  information[NSUnderlyingErrorKey] = error;
+  information[NSLocalizedDescriptionKey] =
+      "the extension ended before it answered: " + connecting.describeEnd();
+  return NSError(NSFileProviderErrorDomain, NSFileProviderErrorServerUnreachable, information);
+}
+
+// One call: answered by the reply or, when the transport fails for good, with that error.
+template <class... Values>
+class Call : public std::enable_shared_from_this<Call<Values...>> {
+ public:
+  using Reply = std::function<void(const Values &...)>;
+  using Ask = std::function<void(NSFileProviderExtensionProtocol &extension, Reply reply)>;
+
+  Call(std::shared_ptr<ExtensionConnecting> connecting, Ask ask, Reply reply,
+       std::function<void(const NSError &)> fail)
+      : connecting_(std::move(connecting)),
+        ask_(std::move(ask)),
+        reply_(std::move(reply)),
+        fail_(std::move(fail)) {}
+
+  void attempt(int number) {
+    auto self = this->shared_from_this();
+    auto answered = std::make_shared<std::atomic_flag>();
+    NSError error;
+    auto extension = connecting_->extension(
+        [self, answered, number](const NSError &failure) {
+          if (!answered->test_and_set()) self->failed(failure, number);
+        },
+        &error);
+    if (!extension) {
+      fail_(error);
+      return;
+    }
+    ask_(*extension, [self, answered](const Values &...values) {
+      if (answered->test_and_set()) return;
+      self->connecting_->noteAnswer();
+      self->reply_(values...);
+    });
+  }
+
+ private:
+  void failed(const NSError &error, int number) {
+    if (!isConnectionGone(error)) {
+      fail_(error);
+    } else if (number < kAttempts) {
+      attempt(number + 1);
+    } else {
+      fail_(cutOff(error, *connecting_));
+    }
+  }
+
+  const std::shared_ptr<ExtensionConnecting> connecting_;
+  const Ask ask_;
+  const Reply reply_;
+  const std::function<void(const NSError &)> fail_;
+};
+
+}  // namespace
+
+bool isConnectionGone(const NSError &error) {
+  return error.is(NSCocoaErrorDomain, NSXPCConnectionInterrupted) ||
+         error.is(NSCocoaErrorDomain, NSXPCConnectionInvalid);
+}
+
+ExtensionCalls::ExtensionCalls(std::shared_ptr<ExtensionConnecting> connecting)
+    : connecting_(std::move(connecting)) {}
+
+void ExtensionCalls::itemForIdentifier(const std::string &identifier,
+                                       NSFileProviderItemCompletion completion) {
+  using ItemCall = Call<std::shared_ptr<const NSFileProviderItem>, NSError>;
+  std::make_shared<ItemCall>(
+      connecting_,
+      [identifier](NSFileProviderExtensionProtocol &extension, ItemCall::Reply reply) {
+        extension.itemForIdentifier(identifier, std::move(reply));
+      },
+      completion, [completion](const NSError &error) { completion(nullptr, error); })
+      ->attempt(1);
+}
+
+void ExtensionCalls::URLForItemIdentifier(const std::string &identifier, URLResult completion) {
+  using URLCall = Call<NSURL>;
+  std::make_shared<URLCall>(
+      connecting_,
+      [identifier](NSFileProviderExtensionProtocol &extension, URLCall::Reply reply) {
+        extension.URLForItemIdentifier(identifier, std::move(reply));
+      },
+      [completion](const NSURL &url) { completion(url, NSError()); },
+      [completion](const NSError &error) { completion(NSURL(), error); })
+      ->attempt(1);
+}
+
+void ExtensionCalls::identifierForItemAtURL(const NSURL &url, IdentifierResult completion) {
+  using IdentifierCall = Call<std::optional<std::string>>;
+  std::make_shared<IdentifierCall>(
+      connecting_,
+      [url](NSFileProviderExtensionProtocol &extension, IdentifierCall::Reply reply) {
+        extension.identifierForItemAtURL(url, std::move(reply));
+      },
+      [completion](const std::optional<std::string> &identifier) { completion(identifier, NSError()); },
+      [completion](const NSError &error) { completion(std::nullopt, error); })
+      ->attempt(1);
+}
+
+void ExtensionCalls::enumeratorForContainer(const std::string &identifier,
+                                            NSFileProviderEnumeratorCompletion completion) {
+  using EnumeratorCall = Call<std::shared_ptr<NSFileProviderRemoteEnumerator>, NSError>;
+  std::make_shared<EnumeratorCall>(
+      connecting_,
+      [identifier](NSFileProviderExtensionProtocol &extension, EnumeratorCall::Reply reply) {
+        extension.enumeratorForContainer(identifier, std::move(reply));
+      },
+      completion, [completion](const NSError &error) { completion(nullptr, error); })
+      ->attempt(1);
+}
+
+}  // namespace droxa

@@ -1,0 +1,34 @@
+#pragma once
+
+#include <functional>
+#include <memory>
+#include <string>
+
+#include "fileproviderd/ExtensionConnecting.h"
+
+namespace droxa {
+
+// Whether `error` says that the peer has gone, so that asking a new one may help.
+bool isConnectionGone(const NSError &error);
+
+// The calls that the host makes of the extension. All of them only read: one that the extension's end cut off
+// is made once more, of the extension that is started for it. Thread contract: any thread; completions run
+// exactly once, on any thread, also before the call returns.
+class ExtensionCalls {
+ public:
+  using URLResult = std::function<void(const NSURL &url, const NSError &error)>;
+  using IdentifierResult =
+      std::function<void(const std::optional<std::string> &identifier, const NSError &error)>;
+
+  explicit ExtensionCalls(std::shared_ptr<ExtensionConnecting> connecting);
+
+  void itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion);
+  void URLForItemIdentifier(const std::string &identifier, URLResult completion);  // nil without error: none
+  void identifierForItemAtURL(const NSURL &url, IdentifierResult completion);      // the same
+  void enumeratorForContainer(const std::string &identifier, NSFileProviderEnumeratorCompletion completion);
+
+ private:
+  const std::shared_ptr<ExtensionConnecting> connecting_;
+};
+
+}  // namespace droxa

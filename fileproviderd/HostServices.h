@@ -1,0 +1,55 @@
+#pragma once
+
+#include <atomic>
+#include <functional>
+#include <memory>
+#include <string>
+
+#include "fileproviderd/FollowedContainers.h"
+#include "fileproviderd/PathResolver.h"
+
+namespace droxa {
+
+// What the extension's process reaches in the host.
+// Thread contract: any thread.
+class HostSignalReceiver final : public NSFileProviderHostProtocol {
+ public:
+  explicit HostSignalReceiver(std::shared_ptr<FollowedContainers> followed)
+      : followed_(std::move(followed)) {}
+  void signalEnumerator(const std::string &containerIdentifier,
+                        NSFileProviderErrorCompletion completion) override;
+  std::uint64_t signals() const { return signals_.load(); }
+
+ private:
+  const std::shared_ptr<FollowedContainers> followed_;
+  std::atomic<std::uint64_t> signals_{0};
+};
+
+// What the clients of the host reach in it.
+// Thread contract: any thread; completions on any thread.
+class ControlService final : public FPDControlProtocol {
+ public:
+  // Fills in what only the process itself knows: identifiers, times, launches.
+  using StatusSource = std::function<FPDStatus()>;
+
+  ControlService(std::shared_ptr<ExtensionCalls> calls, std::shared_ptr<FollowedContainers> followed,
+                 std::string replica, StatusSource status);
+
+  void getStatus(FPDStatusCompletion completion) override;
+  void itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion) override;
+  void itemAtPath(const std::string &path, NSFileProviderItemCompletion completion) override;
+  void URLForItemIdentifier(const std::string &identifier, NSFileProviderURLCompletion completion) override;
+  void identifierForItemAtURL(const NSURL &url, NSFileProviderIdentifierCompletion completion) override;
+  void enumeratorForContainer(const std::string &identifier,
+                              NSFileProviderEnumeratorCompletion completion) override;
+  void watchContainer(const std::string &identifier, std::shared_ptr<FPDWatchObserver> observer,
+                      FPDWatchCompletion completion) override;
+
+ private:
+  const std::shared_ptr<ExtensionCalls> calls_;
+  const std::shared_ptr<FollowedContainers> followed_;
+  const std::shared_ptr<PathResolver> paths_;
+  const StatusSource status_;
+};
+
+}  // namespace droxa
