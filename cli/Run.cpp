@@ -1,0 +1,214 @@
+#include "cli/Run.h"
+
+#include <filesystem>
+#include <pwd.h>
+#include <sysexits.h>
+#include <unistd.h>
+
+#include "cli/ControlClient.h"
+#include "cli/DaemonClient.h"
+#include "cli/ExitStatus.h"
+#include "cli/HomeSetup.h"
+#include "cli/SampleDrive.h"
+#include "cli/Supervisor.h"
+#include "cli/Text.h"
+#include "platform/foundation/ProcessLock.h"
+
+namespace droxa {
+
+namespace {
+
+namespace fs = std::filesystem;
+using namespace std::chrono_literals;
+
+constexpr auto kStartPatience = 30s;
+constexpr auto kForever = std::chrono::hours(24 * 365);
+
+std::string programBeside(const char *name) {
+  std::error_code code;
+  const fs::path self = fs::read_symlink("/proc/self/exe", code);
+  return (self.parent_path() / name).native();
+}
+
+std::string userName() {
+  const passwd *entry = getpwuid(getuid());
+  return entry && entry->pw_name && entry->pw_name[0] != '\0' ? entry->pw_name : "me";
+}
+
+// A word for a shell.
+std::string quoted(const std::string &word) {
+  static constexpr char kPlain[] = "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789/._-+:@%,";
+  if (!word.empty() && word.find_first_not_of(kPlain) == std::string::npos) return word;
+  std::string text = "'";
+  for (const char character : word)
+    text += character == '\'' ? std::string("'\\''") : std::string(1, character);
+  return text + "'";
+}
+
+// One run of `droxa run`.
+class Run {
+ public:
+  Run(std::ostream &out, std::ostream &err, DroxaHome home)
+      : out_(out),
+        err_(err),
+        home_(std::move(home)),
+        supervisor_(err),
+        daemon_(QVDaemonConnection::defaultConnection(), 2s) {}
+
+  int serve(const HomeSetup &setup) {
+    std::string problem;
+    const Outcome outcome = startAll(setup.isNew, &problem);
+    if (outcome == Outcome::stopped) return kExitSuccess;
+    if (outcome == Outcome::failed) {
+      supervisor_.stop();
+      err_ << "droxa: " << problem << std::endl;
+      return EX_UNAVAILABLE;
+    }
+    printStarted(setup);
+    while (!supervisor_.keepRunning(kForever)) {
+    }
+    out_ << "ending…" << std::endl;
+    supervisor_.stop();
+    return kExitSuccess;
+  }
+
+  void printNextSteps() {
+    const std::string droxa = quoted(programBeside("droxa")) + " --home " + quoted(home_.root());
+    out_ << "files:  " << documentsFolder(home_.replica(), kDefaultContainer) << "\n"
+         << "next:   " << droxa << " ls -l\n"
+         << "        " << droxa << " watch /\n"
+         << "        " << droxa << " status\n";
+    out_.flush();
+  }
+
+ private:
+  enum class Outcome { ready, stopped, failed };
+
+  Outcome startAll(bool isNew, std::string *problem) {
+    if (!add("keld", problem)) return Outcome::failed;
+    Outcome outcome = await([this] { return !daemon_.status().error; }, problem);
+    if (outcome != Outcome::ready) return outcome;
+    if (isNew && !signInSomebody(problem)) return Outcome::failed;
+    if (!add("fileproviderd", problem)) return Outcome::failed;
+    outcome = await([this] { return hostAnswers(); }, problem);
+    return outcome;
+  }
+
+  bool add(const std::string &name, std::string *problem) {
+    const std::string program = programBeside(name.c_str());
+    if (access(program.c_str(), X_OK) != 0) {
+      *problem = "there is no program " + program;
+      return false;
+    }
+    return supervisor_.add(
+        ChildProcess(name, {program, "--home", home_.root()}, home_.logs() + "/" + name + ".log"), problem);
+  }
+
+  // Until `isReady` holds, with the children looked after meanwhile.
+  template <class Condition>
+  Outcome await(Condition isReady, std::string *problem) {
+    const auto until = ChildProcess::Clock::now() + kStartPatience;
+    while (ChildProcess::Clock::now() < until) {
+      if (isReady()) return Outcome::ready;
+      if (supervisor_.keepRunning(50ms)) return Outcome::stopped;
+    }
+    const ChildProcess &child = supervisor_.children().back();
+    *problem = child.name() + " did not get ready within 30 s";
+    if (!child.lastEnd().empty()) *problem += " (" + child.lastEnd() + ")";
+    *problem += "; its log: " + child.logFile();
+    return Outcome::failed;
+  }
+
+  bool signInSomebody(std::string *problem) {
+    const auto account = daemon_.account();
+    if (!account.error && account.value) return true;
+    const auto signedIn = daemon_.signIn(userName());
+    if (!signedIn.error) return true;
+    *problem = "can't sign in: " + signedIn.error.localizedDescription();
+    return false;
+  }
+
+  // A look at the root starts the extension, so that all three run. Somebody who signed out stays so.
+  bool hostAnswers() {
+    ControlClient host(std::make_shared<ControlConnectionOverXPC>(home_.hostSocket(), 10s), 10s);
+    const NSError error = host.item(NSFileProviderRootContainerItemIdentifier).error;
+    const auto status = host.status();
+    hostStatus_ = status.value;
+    return !status.error && exitStatusForError(error) != EX_UNAVAILABLE &&
+           exitStatusForError(error) != EX_TEMPFAIL;
+  }
+
+  void printStarted(const HomeSetup &setup) {
+    out_ << "drive:  " << home_.root() << " (" << setup.summary << ")\n"
+         << "runs:   ";
+    for (const ChildProcess &child : supervisor_.children())
+      out_ << child.name() << " (" << child.identifier() << "), ";
+    out_ << "the extension (" << hostStatus_.extensionProcessIdentifier << "); Ctrl-C ends them\n";
+    printNextSteps();
+  }
+
+  std::ostream &out_;
+  std::ostream &err_;
+  const DroxaHome home_;
+  Supervisor supervisor_;
+  DaemonClient daemon_;
+  FPDStatus hostStatus_;
+};
+
+}  // namespace
+
+DroxaHome homeForFolder(const std::string &folder) {
+  std::error_code code;
+  const fs::path real = fs::weakly_canonical(folder, code);
+  const std::string path = code ? folder : real.native();
+  std::uint64_t hash = 14695981039346656037U;  // FNV-1a: the same for every run and build
+  for (const char character : path) hash = (hash ^ static_cast<unsigned char>(character)) * 1099511628211U;
+  std::string text;
+  for (int digit = 0; digit < 8; ++digit, hash >>= 4U) text += "0123456789abcdef"[hash & 15U];
+  return DroxaHome(DroxaHome::resolve(std::nullopt).root() + "-drives/" + fs::path(path).filename().native() +
+                   "-" + text);
+}
+
+int runRun(std::ostream &out, std::ostream &err, const RunOptions &options) {
+  std::error_code code;
+  std::optional<std::string> folder;
+  if (options.folder) {
+    if (!fs::is_directory(*options.folder, code)) {
+      err << "droxa: " << escapedText(*options.folder) << ": "
+          << (code ? code.message() : "is not a folder; name the folder whose documents the drive is to have")
+          << std::endl;
+      return EX_NOINPUT;
+    }
+    folder = fs::canonical(*options.folder, code).native();
+  }
+  const bool isNamed = options.home || std::getenv("DROXA_HOME");
+  const DroxaHome home = folder && !isNamed ? homeForFolder(*folder) : DroxaHome::resolve(options.home);
+  std::string problem;
+  if (!home.create(&problem)) {
+    err << "droxa: " << problem << std::endl;
+    return EX_CANTCREAT;
+  }
+  DroxaSetProcessHome(home);
+  blockSupervisorSignals();
+
+  int holder = 0;
+  const auto lock = ProcessLock::acquire(home.run() + "/droxa-run.pid", &holder, &problem);
+  Run run(out, err, home);
+  if (!lock && holder != 0) {
+    out << "drive:  " << home.root() << " runs already, under process " << holder << "\n";
+    run.printNextSteps();
+    return kExitSuccess;
+  }
+  if (!lock) {
+    err << "droxa: " << problem << std::endl;
+    return EX_CANTCREAT;
+  }
+  const auto setup = setUpHome(home, folder, err, &problem);
+  if (!setup) {
+    err << "droxa: " << problem << std::endl;
+    return EX_CANTCREAT;
+  }
+  return run.serve(*setup);
+}
+
+}  // namespace droxa
