@@ -1,0 +1,84 @@
+#pragma once
+
+#include <atomic>
+#include <functional>
+#include <map>
+#include <memory>
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include "cli/Commands.h"
+#include "platform/fileprovider/NSFileProviderError.h"
+#include "tessaly/QVDaemonConnection.h"
+
+namespace droxa::testing {
+
+// A host with items at paths and listings in pages, all set by the test.
+class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_from_this<ScriptedHost> {
+ public:
+  using Pages = std::vector<std::vector<NSFileProviderItemFields>>;
+
+  void getStatus(FPDStatusCompletion completion) override { completion(status); }
+  void itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion) override;
+  void itemAtPath(const std::string &path, NSFileProviderItemCompletion completion) override;
+  void URLForItemIdentifier(const std::string &identifier, NSFileProviderURLCompletion completion) override;
+  void identifierForItemAtURL(const NSURL &, NSFileProviderIdentifierCompletion completion) override {
+    completion(std::nullopt);
+  }
+  void enumeratorForContainer(const std::string &identifier,
+                              NSFileProviderEnumeratorCompletion completion) override;
+  void watchContainer(const std::string &identifier, std::shared_ptr<FPDWatchObserver> observer,
+                      FPDWatchCompletion completion) override;
+
+  std::map<std::string, NSFileProviderItemFields> items;  // by identifier
+  std::map<std::string, std::string> paths;               // to identifiers
+  std::map<std::string, std::string> urls;                // by identifier
+  std::map<std::string, Pages> listings;                  // by container
+  std::map<std::string, NSError> pageErrors;              // by container: instead of the page after the last
+  FPDStatus status;
+  std::function<void(const std::string &container, std::size_t page)> onPage;  // before it is answered
+  std::shared_ptr<FPDWatchObserver> observer;
+  bool firstPageWasByDate = false;
+};
+
+class ScriptedHostConnecting final : public ControlConnecting {
+ public:
+  explicit ScriptedHostConnecting(std::shared_ptr<ScriptedHost> host) : host_(std::move(host)) {}
+  std::shared_ptr<FPDControlProtocol> control(NSXPCErrorHandler, NSError *error) override;
+  void setEndHandler(std::function<void()> handler) override { endHandler = std::move(handler); }
+
+  NSError failure;
+  std::function<void()> endHandler;
+
+ private:
+  const std::shared_ptr<ScriptedHost> host_;
+};
+
+// A daemon that isn't there.
+class AbsentDaemon final : public QVDaemonConnection {
+ public:
+  std::shared_ptr<QVProtocol> remoteObjectProxyWithErrorHandler(NSXPCErrorHandler handler) override;
+  std::unique_ptr<QVSyncProxy> newSyncProxy() override { return nullptr; }
+  void setInterruptionHandler(std::function<void()>) override {}
+};
+
+// What a command needs, with its output kept.
+struct CommandFixture {
+  CommandFixture();
+  CommandContext context();
+  int run(const std::function<int(CommandContext &)> &command);  // empties what was printed before
+
+  std::shared_ptr<ScriptedHost> host = std::make_shared<ScriptedHost>();
+  std::shared_ptr<ScriptedHostConnecting> connecting = std::make_shared<ScriptedHostConnecting>(host);
+  std::shared_ptr<QVDaemonConnection> daemon = std::make_shared<AbsentDaemon>();
+  std::ostringstream out;
+  std::ostringstream err;
+  std::function<bool()> stop = [] { return true; };
+};
+
+NSFileProviderItemFields item(const std::string &identifier, const std::string &name,
+                              NSFileProviderItemKind kind = NSFileProviderItemKind::document);
+NSFileProviderItemFields folder(const std::string &identifier, const std::string &name);
+
+}  // namespace droxa::testing

@@ -1,0 +1,62 @@
+// The daemon protocol's suite, asked of the real daemon in this process.
+
+#include <sys/time.h>
+
+#include "tests/keld/KeldFixture.h"
+#include "tests/support/DaemonConformance.h"
+
+namespace droxa {
+
+namespace {
+
+class KeldWorld final : public DaemonWorld {
+ public:
+  explicit KeldWorld(keld::WatcherKind watcher) : fixture_(keld::WatchedBy(watcher), false) {
+    std::filesystem::create_directories(fixture_.documents(kConformanceContainer));
+    fixture_.start();
+  }
+
+  std::shared_ptr<QVProtocol> daemon() override { return fixture_.session(); }
+  NSURL documents(const std::string &containerID) override {
+    return NSURL::fileURLWithPath(fixture_.documents(containerID));
+  }
+  void makeFile(const NSURL &url, std::size_t size) override {
+    fixture_.write(url.path(), std::string(size, 'x'));
+  }
+  void changeFile(const NSURL &url, std::size_t size, std::int64_t seconds) override {
+    makeFile(url, size);
+    const timeval times[2] = {{seconds, 0}, {seconds, 0}};
+    ASSERT_EQ(::utimes(url.path().c_str(), times), 0);
+  }
+  void makeFolder(const NSURL &url) override { fixture_.folder(url.path()); }
+  void makeAlias(const NSURL &url, const NSURL &target) override { makeSymbolicLink(url, target.path()); }
+  void makeSymbolicLink(const NSURL &url, const std::string &target) override {
+    std::filesystem::create_symlink(target, url.path());
+  }
+  void rename(const NSURL &from, const NSURL &to) override { fixture_.rename(from.path(), to.path()); }
+  void remove(const NSURL &url) override { fixture_.remove(url.path()); }
+  void settle() override { fixture_.settle(); }
+
+ private:
+  keld::KeldFixture fixture_;
+};
+
+std::unique_ptr<DaemonWorld> byFanotify() {
+  return std::make_unique<KeldWorld>(keld::WatcherKind::best);
+}
+std::unique_ptr<DaemonWorld> byInotify() {
+  return std::make_unique<KeldWorld>(keld::WatcherKind::inotify);
+}
+std::unique_ptr<DaemonWorld> byScanning() {
+  return std::make_unique<KeldWorld>(keld::WatcherKind::scan);
+}
+
+}  // namespace
+
+INSTANTIATE_TEST_SUITE_P(Keld, DaemonConformance,
+                         testing::Values(DaemonWorldMaker{"BestWatcher", byFanotify},
+                                         DaemonWorldMaker{"Inotify", byInotify},
+                                         DaemonWorldMaker{"Scanning", byScanning}),
+                         ConformanceName);
+
+}  // namespace droxa

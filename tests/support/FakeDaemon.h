@@ -1,0 +1,111 @@
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "platform/foundation/Paths.h"
+#include "platform/foundation/ThreadSafety.h"
+#include "tessaly/QVErrors.h"
+#include "tessaly/QVProtocol.h"
+#include "tests/support/CallLog.h"
+#include "tests/support/FakeDrive.h"
+#include "tests/support/FakeItemNotificationSender.h"
+#include "tests/support/FakeReplies.h"
+
+namespace droxa {
+
+// The daemon in process, over a drive in memory. It writes every call into its log
+// ("enumerateItemsInFolder(i12, sort 0, offset 0, limit 200)"), answers as its replies() say, and pushes what
+// the mutators do to its senders. Somebody is signed in from the start. Paths are those of FakeDrive. Thread
+// contract: any thread.
+class FakeDaemon final : public QVProtocol, public std::enable_shared_from_this<FakeDaemon> {
+ public:
+  static std::shared_ptr<FakeDaemon> make(std::string replica = DroxaProcessHome().replica());
+  ~FakeDaemon() override;
+
+  // What was asked, in order.
+  std::vector<std::string> calls() const { return log_->calls(); }
+  CallLog &log() { return *log_; }
+  // How it is answered.
+  FakeReplies &replies() { return *replies_; }
+
+  // Changes of the drive; a path that doesn't fit fails the test.
+  QVFileObjectID addDocument(const std::string &path, std::uint64_t size = 0);
+  QVFileObjectID addFolder(const std::string &path);
+  QVFileObjectID addAlias(const std::string &path);
+  QVFileObjectID addSymbolicLink(const std::string &path);
+  QVFileObjectID add(const std::string &path, const FakeDrive::Attributes &attributes);
+  void setContents(const std::string &path, std::uint64_t size,
+                   std::int64_t modifiedNanoseconds = 1'700'000'001'000'000'000);
+  void rename(const std::string &from, const std::string &to);
+  void remove(const std::string &path);
+  // These two also notify the subscribers.
+  void addContainer(const std::string &containerID);
+  void removeContainer(const std::string &containerID);
+  void setReadable(const std::string &path, bool readable);
+  // Who is signed in, without a notification.
+  void setAccount(std::optional<QVAccountDescription> account);
+
+  std::shared_ptr<const QVQueryItem> item(const std::string &path) const;
+  QVFileObjectID identifier(const std::string &path) const;
+  NSURL url(const std::string &path) const;  // "": the root
+  std::uint64_t numberAtPath(const std::string &path) const;
+  std::uint64_t rank() const;
+
+  // The senders given out, in order; the last of them; those not invalidated.
+  std::vector<std::shared_ptr<FakeItemNotificationSender>> senders() const;
+  std::shared_ptr<FakeItemNotificationSender> lastSender() const;
+  std::size_t liveSenders() const;
+
+  // Tells every subscriber, as the daemon does of account and container changes.
+  void notify(const std::string &name);
+  std::size_t subscribers() const;
+  std::size_t notificationsReplied() const;  // how many of them the subscribers have answered
+  void forgetSubscribers();                  // as a daemon that was started anew
+
+  void enumerateItemsInFolder(const std::optional<QVFileObjectID> &folder, std::int64_t sortOrder,
+                              std::uint64_t offset, std::uint64_t limit,
+                              QVItemsCompletion completion) override;
+  void enumerateAllFoldersWithSortOrder(std::int64_t sortOrder, std::uint64_t offset, std::uint64_t limit,
+                                        QVItemsCompletion completion) override;
+  void currentNotifRankWithReply(QVRankReply reply) override;
+  void enumerateWorkingSetChangesFromChangeToken(const NSData &token, std::uint64_t limit,
+                                                 QVWorkingSetCompletion completion) override;
+  void getItemUpdateSenderWithReceiver(std::shared_ptr<QVItemNotificationReceiving> receiver,
+                                       QVSenderReply reply) override;
+  void getURLForItemIdentifier(const std::string &identifier, QVURLReply reply) override;
+  void getURLForFileObjectID(const QVFileObjectID &fileObjectID, QVURLReply reply) override;
+  void getQueryItemForURL(const NSURL &url, bool fakeFSEvent, QVItemReply reply) override;
+  void getContainerItem(const std::string &containerID, bool forceScan, QVItemReply reply) override;
+  void getContainers(QVContainersReply reply) override;
+  void subscribeToNotifications(std::shared_ptr<QVDaemonNotificationReceiving> receiver,
+                                QVErrorReply reply) override;
+  void getAccount(QVAccountReply reply) override;
+  void signIn(const std::string &name, QVAccountReply reply) override;
+  void signOut(QVErrorReply reply) override;
+  void getStatus(QVStatusReply reply) override;
+
+ private:
+  explicit FakeDaemon(std::string replica);
+  NSError begin(const char *operation, const std::string &arguments);
+  NSError loggedOut() const REQUIRES(mutex_);
+  template <class Change>
+  void change(const std::string &what, const Change &change);
+  void tellSenders(const std::vector<FakeDriveChange> &changes);
+
+  const std::shared_ptr<CallLog> log_ = std::make_shared<CallLog>();
+  const std::shared_ptr<FakeReplies> replies_ = std::make_shared<FakeReplies>();
+  const std::shared_ptr<std::atomic<std::size_t>> notificationsReplied_ =
+      std::make_shared<std::atomic<std::size_t>>(0);
+  mutable Mutex mutex_;
+  FakeDrive drive_ GUARDED_BY(mutex_);
+  std::optional<QVAccountDescription> account_ GUARDED_BY(mutex_);
+  std::vector<std::shared_ptr<FakeItemNotificationSender>> senders_ GUARDED_BY(mutex_);
+  std::vector<std::shared_ptr<QVDaemonNotificationReceiving>> subscribers_ GUARDED_BY(mutex_);
+};
+
+}  // namespace droxa

@@ -1,0 +1,215 @@
+#include "tests/support/FakeDaemonConnection.h"
+
+#include <utility>
+
+#include "tessaly/QVAccount.h"
+#include "tessaly/QVContainer.h"
+#include "tessaly/QVSyncProxyOverAsynchronous.h"
+
+namespace droxa {
+
+// The calls under way, each with the error handler of its proxy.
+struct FakeDaemonConnection::State {
+  Mutex mutex;
+  std::map<std::uint64_t, NSXPCErrorHandler> underWay GUARDED_BY(mutex);
+  std::uint64_t nextCall GUARDED_BY(mutex) = 1;
+  std::size_t proxies GUARDED_BY(mutex) = 0;
+  std::size_t syncProxies GUARDED_BY(mutex) = 0;
+  NSError unreachable GUARDED_BY(mutex);
+  std::function<void()> interruptionHandler GUARDED_BY(mutex);
+
+  std::uint64_t begin(NSXPCErrorHandler handler) {
+    const Lock lock(mutex);
+    underWay[nextCall] = std::move(handler);
+    return nextCall++;
+  }
+  // Whether the call is still to be ended; whoever comes first ends it.
+  bool end(std::uint64_t call) {
+    const Lock lock(mutex);
+    return underWay.erase(call) == 1;
+  }
+  NSError unreachableError() {
+    const Lock lock(mutex);
+    return unreachable;
+  }
+};
+
+// One proxy of the daemon: each call is ended by its reply or by the error handler.
+class FakeDaemonProxy final : public QVProtocol {
+ public:
+  FakeDaemonProxy(std::shared_ptr<FakeDaemon> daemon, std::shared_ptr<FakeDaemonConnection::State> state,
+                  NSXPCErrorHandler handler)
+      : daemon_(std::move(daemon)), state_(std::move(state)), handler_(std::move(handler)) {}
+
+  void enumerateItemsInFolder(const std::optional<QVFileObjectID> &folder, std::int64_t sortOrder,
+                              std::uint64_t offset, std::uint64_t limit,
+                              QVItemsCompletion completion) override {
+    if (failed("enumerateItemsInFolder")) return;
+    daemon_->enumerateItemsInFolder(folder, sortOrder, offset, limit, tracked(std::move(completion)));
+  }
+  void enumerateAllFoldersWithSortOrder(std::int64_t sortOrder, std::uint64_t offset, std::uint64_t limit,
+                                        QVItemsCompletion completion) override {
+    if (failed("enumerateAllFoldersWithSortOrder")) return;
+    daemon_->enumerateAllFoldersWithSortOrder(sortOrder, offset, limit, tracked(std::move(completion)));
+  }
+  void currentNotifRankWithReply(QVRankReply reply) override {
+    if (failed("currentNotifRankWithReply")) return;
+    daemon_->currentNotifRankWithReply(tracked(std::move(reply)));
+  }
+  void enumerateWorkingSetChangesFromChangeToken(const NSData &token, std::uint64_t limit,
+                                                 QVWorkingSetCompletion completion) override {
+    if (failed("enumerateWorkingSetChangesFromChangeToken")) return;
+    daemon_->enumerateWorkingSetChangesFromChangeToken(token, limit, tracked(std::move(completion)));
+  }
+  void getItemUpdateSenderWithReceiver(std::shared_ptr<QVItemNotificationReceiving> receiver,
+                                       QVSenderReply reply) override {
+    if (failed("getItemUpdateSenderWithReceiver")) return;
+    daemon_->getItemUpdateSenderWithReceiver(std::move(receiver), tracked(std::move(reply)));
+  }
+  void getURLForItemIdentifier(const std::string &identifier, QVURLReply reply) override {
+    if (failed("getURLForItemIdentifier")) return;
+    daemon_->getURLForItemIdentifier(identifier, tracked(std::move(reply)));
+  }
+  void getURLForFileObjectID(const QVFileObjectID &fileObjectID, QVURLReply reply) override {
+    if (failed("getURLForFileObjectID")) return;
+    daemon_->getURLForFileObjectID(fileObjectID, tracked(std::move(reply)));
+  }
+  void getQueryItemForURL(const NSURL &url, bool fakeFSEvent, QVItemReply reply) override {
+    if (failed("getQueryItemForURL")) return;
+    daemon_->getQueryItemForURL(url, fakeFSEvent, tracked(std::move(reply)));
+  }
+  void getContainerItem(const std::string &containerID, bool forceScan, QVItemReply reply) override {
+    if (failed("getContainerItem")) return;
+    daemon_->getContainerItem(containerID, forceScan, tracked(std::move(reply)));
+  }
+  void getContainers(QVContainersReply reply) override {
+    if (failed("getContainers")) return;
+    daemon_->getContainers(tracked(std::move(reply)));
+  }
+  void subscribeToNotifications(std::shared_ptr<QVDaemonNotificationReceiving> receiver,
+                                QVErrorReply reply) override {
+    if (failed("subscribeToNotifications")) return;
+    daemon_->subscribeToNotifications(std::move(receiver), tracked(std::move(reply)));
+  }
+  void getAccount(QVAccountReply reply) override {
+    if (failed("getAccount")) return;
+    daemon_->getAccount(tracked(std::move(reply)));
+  }
+  void signIn(const std::string &name, QVAccountReply reply) override {
+    if (failed("signIn")) return;
+    daemon_->signIn(name, tracked(std::move(reply)));
+  }
+  void signOut(QVErrorReply reply) override {
+    if (failed("signOut")) return;
+    daemon_->signOut(tracked(std::move(reply)));
+  }
+  void getStatus(QVStatusReply reply) override {
+    if (failed("getStatus")) return;
+    daemon_->getStatus(tracked(std::move(reply)));
+  }
+
+ private:
+  bool failed(const char *operation) {
+    NSError failure = daemon_->replies().takeTransportFailure(operation);
+    if (!failure) failure = state_->unreachableError();
+    if (!failure) return false;
+    daemon_->log().add(std::string(operation) + " failed in transport");
+    daemon_->replies().give(operation, [handler = handler_, failure] { handler(failure); });
+    return true;
+  }
+  template <class... Args>
+  std::function<void(Args...)> tracked(std::function<void(Args...)> reply) {
+    return [state = state_, call = state_->begin(handler_), reply = std::move(reply)](Args... args) {
+      if (state->end(call)) reply(args...);
+    };
+  }
+
+  const std::shared_ptr<FakeDaemon> daemon_;
+  const std::shared_ptr<FakeDaemonConnection::State> state_;
+  const NSXPCErrorHandler handler_;
+};
+
+FakeDaemonConnection::FakeDaemonConnection(std::shared_ptr<FakeDaemon> daemon)
+    : daemon_(std::move(daemon)), state_(std::make_shared<State>()) {}
+
+FakeDaemonConnection::~FakeDaemonConnection() = default;
+
+std::shared_ptr<QVProtocol> FakeDaemonConnection::remoteObjectProxyWithErrorHandler(
+    NSXPCErrorHandler handler) {
+  {
+    const Lock lock(state_->mutex);
+    ++state_->proxies;
+  }
+  return std::make_shared<FakeDaemonProxy>(daemon_, state_, std::move(handler));
+}
+
+std::unique_ptr<QVSyncProxy> FakeDaemonConnection::newSyncProxy() {
+  {
+    const Lock lock(state_->mutex);
+    ++state_->syncProxies;
+  }
+  return QVSyncProxyOverAsynchronous([daemon = daemon_, state = state_](NSXPCErrorHandler handler) {
+    return std::make_shared<FakeDaemonProxy>(daemon, state, std::move(handler));
+  });
+}
+
+std::size_t FakeDaemonConnection::proxiesMade() const {
+  const Lock lock(state_->mutex);
+  return state_->proxies;
+}
+
+std::size_t FakeDaemonConnection::syncProxiesMade() const {
+  const Lock lock(state_->mutex);
+  return state_->syncProxies;
+}
+
+std::size_t FakeDaemonConnection::callsUnderWay() const {
+  const Lock lock(state_->mutex);
+  return state_->underWay.size();
+}
+
+void FakeDaemonConnection::breakOff(const NSError &error) {
+  std::map<std::uint64_t, NSXPCErrorHandler> calls;
+  {
+    const Lock lock(state_->mutex);
+    calls.swap(state_->underWay);
+  }
+  for (const auto &call : calls) call.second(error);
+}
+
+void FakeDaemonConnection::loseDaemon(const NSError &error) {
+  std::function<void()> handler;
+  {
+    const Lock lock(state_->mutex);
+    handler = state_->interruptionHandler;
+  }
+  daemon_->forgetSubscribers();
+  breakOff(error);
+  for (const auto &sender : daemon_->senders())
+    if (!sender->isInvalidated()) sender->callErrorHandlers(error);
+  if (handler) handler();
+}
+
+void FakeDaemonConnection::setInterruptionHandler(std::function<void()> handler) {
+  const Lock lock(state_->mutex);
+  state_->interruptionHandler = std::move(handler);
+}
+
+void FakeDaemonConnection::setUnreachable(NSError error) {
+  const Lock lock(state_->mutex);
+  state_->unreachable = std::move(error);
+}
+
+FakeDaemonScope::FakeDaemonScope()
+    : daemon(FakeDaemon::make()), connection(std::make_shared<FakeDaemonConnection>(daemon)) {
+  QVDaemonConnection::setDefaultConnection(connection);
+  QVContainerCache::forget();
+}
+
+FakeDaemonScope::~FakeDaemonScope() {
+  QVDaemonConnection::setDefaultConnection(nullptr);
+  QVContainerCache::forget();
+  QVAccount::forgetCachedAccount();
+}
+
+}  // namespace droxa
