@@ -52,6 +52,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   NotificationHub &notifications() { return *notifications_; }
   AccountKeeper &account() { return *account_; }
   UpdateSenders &senders() { return senders_; }
+  QVContentsProtocol &contents() { return *contents_; }
   std::shared_ptr<const Containers> containers() const { return containers_.current(); }
   const std::string &replicaPath() const { return replicaPath_; }
   // The part of the URL's path below the replica; nullopt for one outside of it, or the replica itself.
@@ -91,6 +92,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   std::unique_ptr<ReaderPool> readers_;
   std::unique_ptr<AccountKeeper> account_;
   std::unique_ptr<Keeper> keeper_;
+  std::unique_ptr<QVContentsProtocol> contents_;
   std::atomic<bool> stopped_{false};
 };
 

@@ -13,6 +13,11 @@ inline constexpr std::int64_t QVErrorDatabase = 30;
 inline constexpr std::int64_t QVErrorUnreadable = 31;          // the file system refused to show the item
 inline constexpr std::int64_t QVErrorChangeTokenExpired = 32;  // of the working-set feed
 inline constexpr std::int64_t QVErrorShuttingDown = 33;
+inline constexpr std::int64_t QVErrorCancelled = 34;         // a transfer that nobody wants any more
+inline constexpr std::int64_t QVErrorChecksumMismatch = 35;  // what came isn't what the cloud promised
+inline constexpr std::int64_t QVErrorUnsentChanges = 36;     // the cloud doesn't have the contents yet
+inline constexpr std::int64_t QVErrorDocumentInUse = 37;
+inline constexpr std::int64_t QVErrorPinned = 38;
 
 NSError qvc_errorLoggedOut();
 NSError qvc_error(std::int64_t code, std::string description);

@@ -12,6 +12,7 @@
 #include "platform/foundation/NSError.h"
 #include "platform/foundation/NSURL.h"
 #include "platform/xpc/NSXPCProxyCreating.h"
+#include "tessaly/QVContents.h"
 #include "tessaly/QVFileObjectID.h"
 #include "tessaly/QVQueryItem.h"
 
@@ -115,9 +116,8 @@ using QVAccountReply =
 using QVStatusReply = std::function<void(const QVDaemonStatus &status, const NSError &error)>;
 
 // What the daemon offers. Errors are QVTessalyErrorDomain (tessaly/QVErrors.h) unless said otherwise.
-class QVProtocol {
+class QVProtocol : public QVContentsProtocol {
  public:
-  virtual ~QVProtocol() = default;
 
   // The root is the documents folder of the default container. Besides its entries it lists a folder for
   // every other container but the trash, which stands for that container's documents folder: "Documents",
