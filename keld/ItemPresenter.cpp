@@ -48,6 +48,8 @@ std::shared_ptr<const QVQueryItem> ItemPresenter::item(const ItemRecord &record)
   fields.changeRank = record.rank;
   fields.isTrashed = record.zone() == Zone::trashed;
   fields.isExcludedFromSync = (record.flags & kExcludedFlag) != 0;
+  fields.isDownloaded = (record.flags & kDatalessFlag) == 0;
+  fields.isUploaded = (record.flags & kUploadedFlag) != 0;
   return std::make_shared<const QVQueryItem>(fileObjectID, std::move(fields));
 }
 

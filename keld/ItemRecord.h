@@ -28,6 +28,10 @@ enum class Zone : std::uint8_t {
 inline constexpr std::uint32_t kZoneMask = 3;
 inline constexpr std::uint32_t kExcludedFlag = 4;    // kept local, by its name or its parent's
 inline constexpr std::uint32_t kUnreadableFlag = 8;  // a folder that the file system refused to show
+inline constexpr std::uint32_t kDatalessFlag = 16;   // a document whose contents are in the cloud alone
+inline constexpr std::uint32_t kUploadedFlag = 32;   // the cloud has it as it is
+inline constexpr std::uint32_t kSyncFlags = kDatalessFlag | kUploadedFlag;
+inline constexpr std::uint32_t kOwnFlags = kUnreadableFlag | kSyncFlags;  // not inherited from where it is
 
 // What the file system says of a file.
 struct FileFacts {

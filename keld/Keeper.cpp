@@ -20,6 +20,20 @@ constexpr std::size_t kMostHintsAtOnce = 10000;
 constexpr std::size_t kMostHintsKept = 200000;
 constexpr std::size_t kMostChangesAtOnce = 20000;
 
+void lookAtPath(const std::string &path, Reconciler &reconciler, ItemQueries &queries) {
+  ItemNumber folder = kReplicaFolder;
+  for (std::size_t at = 0; at < path.size();) {
+    const std::size_t slash = std::min(path.find('/', at), path.size());
+    const std::string name = path.substr(at, slash - at);
+    reconciler.look(folder, name);
+    reconciler.settle();
+    const auto record = queries.byName(folder, name);
+    if (!record || !record->isFolder()) break;
+    folder = record->id;
+    at = slash + 1;
+  }
+}
+
 }  // namespace
 
 Keeper::Keeper(std::unique_ptr<SqlDatabase> database, std::string databasePath,
@@ -123,19 +137,13 @@ void Keeper::whenScanned(ItemNumber folder, std::function<void()> done) {
 }
 
 void Keeper::lookAt(std::string path, std::function<void()> done) {
+  lookAtAll({std::move(path)}, std::move(done));
+}
+
+void Keeper::lookAtAll(std::vector<std::string> paths, std::function<void()> done) {
   perform(
-      [path = std::move(path)](Reconciler &reconciler, ItemQueries &queries, ItemEdits &) {
-        ItemNumber folder = kReplicaFolder;
-        for (std::size_t at = 0; at < path.size();) {
-          const std::size_t slash = std::min(path.find('/', at), path.size());
-          const std::string name = path.substr(at, slash - at);
-          reconciler.look(folder, name);
-          reconciler.settle();
-          const auto record = queries.byName(folder, name);
-          if (!record || !record->isFolder()) break;
-          folder = record->id;
-          at = slash + 1;
-        }
+      [paths = std::move(paths)](Reconciler &reconciler, ItemQueries &queries, ItemEdits &) {
+        for (const std::string &path : paths) lookAtPath(path, reconciler, queries);
       },
       std::move(done));
 }

@@ -65,6 +65,7 @@ class Keeper final : public ReplicaWatcherSink {
   void whenScanned(ItemNumber folder, std::function<void()> done);
   // Looks at what is at this path now, and at the folders on the way to it.
   void lookAt(std::string pathBelowReplica, std::function<void()> done);
+  void lookAtAll(std::vector<std::string> pathsBelowReplica, std::function<void()> done);
 
   void replicaChanged(ReplicaHint hint) override;
   void replicaChangesLost(const std::string &why) override;

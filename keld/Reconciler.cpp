@@ -211,9 +211,9 @@ void Reconciler::move(ItemRecord record, const Observation &observation, std::ui
   limboOrigins_.erase(record.id);
   edits_.rename(record, observation.folder, observation.name);
   const bool wasPrivate = record.zone() == Zone::privateStorage;
-  const bool flagsChanged = (record.flags ^ flags) & ~kUnreadableFlag;
+  const bool flagsChanged = (record.flags ^ flags) & ~kOwnFlags;
   record.facts = *observation.facts;
-  edits_.setFlags(record, flags | (record.flags & kUnreadableFlag));
+  edits_.setFlags(record, flags | (record.flags & kOwnFlags));
   if (!wasPrivate && record.zone() == Zone::privateStorage) edits_.leaveTombstone(record);
   changes_.push_back({record.id, record.facts.kind, origin.parent, record.parent, false});
   touched_.push_back(origin.parent);
@@ -231,6 +231,11 @@ void Reconciler::refresh(ItemRecord record, const FileFacts &facts) {
                            record.facts.mode == facts.mode;
   if (becameAccessible && !isIdentical) foldersToScan_.push_back(record.id);
   if (isIdentical) return;
+  // Whatever was written here, the cloud doesn't have it yet.
+  const bool isWritten = !record.isFolder() && (record.facts.size != facts.size ||
+                                                record.facts.modified != facts.modified ||
+                                                record.facts.inode != facts.inode);
+  if (isWritten) record.flags &= ~kUploadedFlag;
   record.facts = facts;
   if (looksTheSame || isUnlistedStructure(record)) return edits_.updateSilently(record);
   edits_.update(record);
@@ -253,7 +258,7 @@ void Reconciler::reflagChildren(const ItemRecord &folder) {
         const auto flags = placement_.flags(parent.id, child.name, child.facts.kind);
         const bool wasPrivate = child.zone() == Zone::privateStorage;
         if (!flags) continue;
-        edits_.setFlags(child, *flags | (child.flags & kUnreadableFlag));
+        edits_.setFlags(child, *flags | (child.flags & kOwnFlags));
         if (!wasPrivate && child.zone() == Zone::privateStorage) edits_.leaveTombstone(child);
         changes_.push_back({child.id, child.facts.kind, parent.id, parent.id, false});
         if (child.isFolder()) folders.push_back(std::move(child));
@@ -267,6 +272,13 @@ void Reconciler::touch(ItemNumber id) {
   auto record = queries_.byID(id);
   if (!record) return;
   edits_.update(*record);
+  changes_.push_back({record->id, record->facts.kind, record->parent, record->parent, false});
+}
+
+void Reconciler::setSyncFlags(ItemNumber id, std::uint32_t flags) {
+  auto record = queries_.byID(id);
+  if (!record || record->parent == kLimboFolder || (record->flags & kSyncFlags) == flags) return;
+  edits_.setFlags(*record, (record->flags & ~kSyncFlags) | flags);
   changes_.push_back({record->id, record->facts.kind, record->parent, record->parent, false});
 }
 

@@ -59,6 +59,8 @@ class Reconciler {
 
   // Gives the item the next rank and tells its watchers: what it shows has changed although its file hasn't.
   void touch(ItemNumber id);
+  // Shows what the sync has found out of the item: kSyncFlags.
+  void setSyncFlags(ItemNumber id, std::uint32_t flags);
 
  private:
   struct Observation {

@@ -1,0 +1,65 @@
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+#include <vector>
+
+#include "keld/ContainerList.h"
+#include "keld/contents/ContentsStorage.h"
+#include "keld/sync/ItemStates.h"
+#include "keld/sync/ReplicaFiles.h"
+#include "keld/sync/SyncStore.h"
+
+namespace droxa::keld {
+
+// When deletions are taken for an accident: both must be exceeded.
+struct DeletionGuard {
+  double share = 0.3;           // of the documents and folders that the drive has in the cloud
+  std::uint64_t atLeast = 25;   // deletions
+};
+
+// Reads the item table's feed of changes and finds out which of them the cloud doesn't know: those it puts
+// into the queue of uploads. It also recognises the files that the cloud's own changes made. The feed's rank
+// is the only thing it remembers, so that nothing is missed over a restart. Thread contract: one thread at a
+// time.
+class LocalExaminer {
+ public:
+  LocalExaminer(SyncStore &store, ReplicaFiles &files, const ContentsStorage &storage, ItemStates &states,
+                ReplicaFiles::Read read, DeletionGuard guard);
+
+  // Examines all that is in the feed. Whether anything was queued.
+  bool examine();
+  // Examines one item now, whatever the feed says.
+  void examineItem(ItemNumber item);
+
+  // Until the queue holds no deletion, deletions aren't held: a person has said that they are meant.
+  void allowDeletions();
+
+ private:
+  struct Change {
+    std::uint64_t rank = 0;
+    ItemNumber item = 0;
+    bool isDeath = false;
+    ItemRecord record;
+  };
+  std::vector<Change> nextChanges(std::uint64_t after);
+  void examineLive(const ItemRecord &item);
+  void examineDeath(ItemNumber item);
+  bool bind(const ItemRecord &item, const std::string &parent);
+  bool bindLink(const ItemRecord &item, SyncRow row);
+  bool isClean(const ItemRecord &item, SyncRow &row, const std::string &parent);
+  bool hasSyncedContents(const ItemRecord &item, SyncRow &row);
+  void guardAgainstSpree(const std::vector<Change> &changes);
+  void queue(ItemNumber item, bool isDeletion);
+
+  SyncStore &store_;
+  ReplicaFiles &files_;
+  const ContentsStorage &storage_;
+  ItemStates &states_;
+  const ReplicaFiles::Read read_;
+  const DeletionGuard guard_;
+  bool holdsDeletions_ = false;
+  bool queuedAny_ = false;
+};
+
+}  // namespace droxa::keld

@@ -1,0 +1,139 @@
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "keld/ItemRecord.h"
+#include "keld/Sql.h"
+#include "platform/foundation/NSError.h"
+#include "platform/foundation/ThreadSafety.h"
+
+namespace droxa::keld {
+
+// What a document's contents are, as the cloud tells them.
+struct ContentVersion {
+  std::uint64_t size = 0;
+  std::int64_t modified = 0;  // nanoseconds since 1970
+  std::string digest;         // SHA-256 in hexadecimal; "" for what has no contents
+  std::uint32_t mode = 0;
+  bool operator==(const ContentVersion &) const = default;
+};
+
+// The local file whose contents were last known to be those of the cloud. A file that differs was changed
+// here.
+struct LocalFile {
+  std::uint64_t inode = 0;
+  std::uint64_t size = 0;
+  std::int64_t modified = 0;
+  std::int64_t changed = 0;  // compared only where a mistake would lose something
+  bool operator==(const LocalFile &) const = default;
+};
+
+// What is known of one record of the cloud: its state when this device last agreed with it, and the item that
+// stands for it here.
+struct SyncRow {
+  std::string record;   // its name
+  ItemNumber item = 0;  // 0: none yet, or it is gone
+  std::string tag;      // the change tag
+  std::string parent;   // the parent's record name, or that of a container's documents folder
+  std::string name;
+  NSFileProviderItemKind kind = NSFileProviderItemKind::document;
+  ContentVersion content;
+  LocalFile local;
+  bool isDataless = false;
+  // A newer version that is to replace the local contents; digest "" when there is none.
+  std::string newerTag;
+  ContentVersion newer;
+
+  bool hasNewer() const { return !newerTag.empty(); }
+};
+
+// One item whose local state isn't in the cloud (yet).
+struct QueuedUpload {
+  std::int64_t sequence = 0;
+  ItemNumber item = 0;
+  std::int64_t generation = 0;  // goes up whenever the item changes again
+  std::int64_t attempts = 0;
+  bool isDeletion = false;
+  bool isHeld = false;  // a deletion that waits for a person's word
+  NSError error;        // of the last attempt
+};
+
+// The device's side of the sync, in a database of its own: what is known of the cloud's records, the uploads
+// that wait, and how far both feeds were read. It survives kill -9 at any moment, and can be thrown away: the
+// markers on the files and the cloud have everything again.
+//
+// Thread contract: any thread; each call is one transaction, several calls are one inside transaction(). All
+// throw SqlError.
+class SyncStore {
+ public:
+  explicit SyncStore(const std::string &path);
+
+  // Runs `work` as one transaction; calls made by it on this thread belong to it.
+  void transaction(const std::function<void()> &work);
+
+  // Rows.
+  std::optional<SyncRow> byRecord(const std::string &record);
+  std::optional<SyncRow> byItem(ItemNumber item);
+  std::optional<SyncRow> byName(const std::string &parent, const std::string &name);
+  std::vector<SyncRow> childrenOf(const std::string &parent, std::uint64_t limit);
+  std::vector<SyncRow> withNewerVersion(std::uint64_t limit);
+  void put(const SyncRow &row);
+  void erase(const std::string &record);
+  std::uint64_t countRows();
+  void unbindAll();  // the item database is a new one: every item has another number
+
+  // Records that came before their parents.
+  void keepOrphan(const std::string &record, const std::string &parent);
+  std::vector<std::string> takeOrphansOf(const std::string &parent);
+  std::uint64_t countOrphans();
+
+  // The queue of uploads, in the order of the changes.
+  void enqueue(ItemNumber item, bool isDeletion, bool isHeld);
+  std::optional<QueuedUpload> queued(ItemNumber item);
+  // Those that are due, oldest first.
+  std::vector<QueuedUpload> due(std::int64_t nowMilliseconds, std::uint64_t limit);
+  std::vector<QueuedUpload> allQueued(std::uint64_t limit);
+  std::optional<std::int64_t> nextRetry();    // when the next one that failed is due
+  void uploaded(const QueuedUpload &upload);  // unless it changed again meanwhile
+  void dropQueued(ItemNumber item);
+  void uploadFailed(const QueuedUpload &upload, const NSError &error, std::int64_t retryMilliseconds);
+  void retryAllNow();
+  std::uint64_t countQueued();
+  std::uint64_t countFailed();
+  std::uint64_t countHeld();
+  void releaseHeld();
+  std::vector<QueuedUpload> held(std::uint64_t limit);
+
+  // Pins, by item.
+  void setPinned(ItemNumber item, bool isPinned);
+  bool isPinned(ItemNumber item);
+  std::vector<ItemNumber> pins();
+
+  std::uint64_t number(const char *key);
+  void setNumber(const char *key, std::uint64_t value);
+  std::string text(const char *key);
+  void setText(const char *key, std::string_view value);
+
+ private:
+  SyncRow read(const SqlStatement &row);
+  std::optional<SyncRow> one(SqlStatement &statement);
+  std::vector<SyncRow> all(SqlStatement &statement);
+  QueuedUpload readQueued(const SqlStatement &row);
+  std::vector<QueuedUpload> queuedOf(SqlStatement &statement);
+  SqlStatement &statement(const char *sql) REQUIRES(mutex_);
+  std::uint64_t count(const char *sql);
+
+  RecursiveMutex mutex_;
+  SqlDatabase database_ GUARDED_BY(mutex_);
+  std::map<const char *, std::unique_ptr<SqlStatement>> statements_ GUARDED_BY(mutex_);  // by the literal
+  int depth_ GUARDED_BY(mutex_) = 0;
+};
+
+}  // namespace droxa::keld
