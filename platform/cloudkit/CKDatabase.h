@@ -1,0 +1,34 @@
+#pragma once
+
+#include <memory>
+
+#include "platform/cloudkit/CKCloud.h"
+#include "platform/cloudkit/CKOperation.h"
+
+namespace droxa {
+
+// A cloud with the operations that run on it, concurrently, on the process's thread pool. Releasing it
+// neither waits for nor cancels its operations.
+// Thread contract: every member may be called on any thread.
+class CKDatabase {
+ public:
+  explicit CKDatabase(std::shared_ptr<CKCloud> cloud);
+
+  // Runs the operation once; one that was added before is a mistake, which is logged and ignored.
+  void addOperation(const std::shared_ptr<CKOperation> &operation);
+  void cancelAllOperations();
+  void waitUntilAllOperationsAreFinished();
+
+  // For calls that are not retried: zones, the account, subscriptions.
+  const std::shared_ptr<CKCloud> &cloud() const { return cloud_; }
+
+ private:
+  const std::shared_ptr<CKCloud> cloud_;
+  NSOperationQueue queue_;
+};
+
+// Adds the operation, waits until it has finished, and answers its error(). Not on a thread that the
+// operation's own blocks need.
+NSError CKRunOperation(CKDatabase &database, const std::shared_ptr<CKOperation> &operation);
+
+}  // namespace droxa
