@@ -22,7 +22,7 @@ AssetUploads::Finished SendContents(CKCloud &cloud, int descriptor, const LocalF
   return {NSError(), reply.asset.reference().sha256};
 }
 
-AssetUploads::AssetUploads(std::shared_ptr<CKCloud> cloud, std::function<void()> ended)
+AssetUploads::AssetUploads(std::shared_ptr<CKCloud> cloud, std::function<void(ItemNumber)> ended)
     : cloud_(std::move(cloud)), ended_(std::move(ended)) {}
 
 std::optional<AssetUploads::Finished> AssetUploads::take(ItemNumber item, const LocalFile &file,
@@ -43,14 +43,14 @@ std::optional<AssetUploads::Finished> AssetUploads::take(ItemNumber item, const 
   }
   const int duplicate = stopped_ ? -1 : ::fcntl(descriptor, F_DUPFD_CLOEXEC, 0);
   if (duplicate < 0) return std::nullopt;
+  ++running_;
   Upload upload;
   upload.file = file;
   upload.cancellation = std::make_shared<CKCancellation>();
   upload.number = ++lastNumber_;
-  dispatch_async_global([self = shared_from_this(), item, file, duplicate, number = upload.number,
-                         cancellation = upload.cancellation] {
-    self->run(item, number, file, duplicate, cancellation);
-  });
+  dispatch_async_global(
+      [self = shared_from_this(), item, file, duplicate, number = upload.number,
+       cancellation = upload.cancellation] { self->run(item, number, file, duplicate, cancellation); });
   uploads_.emplace(item, std::move(upload));
   return std::nullopt;
 }
@@ -73,13 +73,17 @@ void AssetUploads::run(ItemNumber item, std::uint64_t number, const LocalFile &f
     if (known != uploads_.end() && known->second.number == number)
       known->second.finished = std::move(finished);
   }
-  ended_();
+  ended_(item);
+  const Lock lock(mutex_);
+  --running_;
+  idle_.notify_all();
 }
 
 void AssetUploads::stop() {
-  const Lock lock(mutex_);
+  Lock lock(mutex_);
   stopped_ = true;
   for (auto &[item, upload] : uploads_) upload.cancellation->cancel();
+  while (running_ > 0) idle_.wait(mutex_);
 }
 
 std::vector<AssetUploads::Progress> AssetUploads::underWay() const {

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <condition_variable>
 #include <cstdint>
 #include <functional>
 #include <map>
@@ -29,12 +30,12 @@ class AssetUploads : public std::enable_shared_from_this<AssetUploads> {
   };
 
   // `ended` is called on the pool after each upload.
-  AssetUploads(std::shared_ptr<CKCloud> cloud, std::function<void()> ended);
+  AssetUploads(std::shared_ptr<CKCloud> cloud, std::function<void(ItemNumber item)> ended);
 
-  // The outcome of an upload of exactly that file, which is forgotten by that; otherwise starts one, or leaves
-  // the one under way. One that is of an older state of the file is stopped.
+  // The outcome of an upload of exactly that file, which is forgotten by that; otherwise starts one, or
+  // leaves the one under way. One that is of an older state of the file is stopped.
   std::optional<Finished> take(ItemNumber item, const LocalFile &file, int descriptor);
-  // No more upload is started, and those under way end soon.
+  // No more upload is started; returns when those under way have ended, which is soon.
   void stop();
   std::vector<Progress> underWay() const;
   bool isUnderWay(ItemNumber item) const;
@@ -51,10 +52,12 @@ class AssetUploads : public std::enable_shared_from_this<AssetUploads> {
            const std::shared_ptr<CKCancellation> &cancellation);
 
   const std::shared_ptr<CKCloud> cloud_;
-  const std::function<void()> ended_;
+  const std::function<void(ItemNumber)> ended_;
   mutable Mutex mutex_;
   std::map<ItemNumber, Upload> uploads_ GUARDED_BY(mutex_);
   std::uint64_t lastNumber_ GUARDED_BY(mutex_) = 0;
+  std::size_t running_ GUARDED_BY(mutex_) = 0;
+  std::condition_variable_any idle_;
   bool stopped_ GUARDED_BY(mutex_) = false;
 };
 

@@ -97,8 +97,8 @@ std::optional<DocumentRecord> ReadRecord(const CKRecord &record) {
     document.content.size = asset->reference().size;
     document.content.digest = asset->reference().sha256;
   }
-  const bool isLink = document.kind == NSFileProviderItemKind::symbolicLink ||
-                      document.kind == NSFileProviderItemKind::alias;
+  const bool isLink =
+      document.kind == NSFileProviderItemKind::symbolicLink || document.kind == NSFileProviderItemKind::alias;
   if (isLink && (document.target.empty() || document.target.size() > kLongestTarget ||
                  document.target.find('\0') != std::string::npos))
     return std::nullopt;

@@ -28,7 +28,8 @@ class ItemStates {
   // Hands over what was collected; `done` is called on the pool when it is committed.
   void flush(std::function<void()> done = [] {});
   // Has the keeper look at these paths below the replica now instead of when the watcher tells.
-  void lookAt(std::vector<std::string> paths, std::function<void()> done = [] {});
+  void lookAt(
+      std::vector<std::string> paths, std::function<void()> done = [] {});
 
  private:
   const std::function<Keeper *()> keeper_;

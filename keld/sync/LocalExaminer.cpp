@@ -12,7 +12,6 @@ namespace {
 constexpr std::uint64_t kChangesAtATime = 500;
 constexpr char kExaminedRank[] = "examinedRank";
 constexpr char kHoldsDeletions[] = "holdsDeletions";
-constexpr char kAllowsDeletions[] = "allowsDeletions";
 
 bool isSynced(const ItemRecord &item) {
   const bool isPlaced = item.zone() == Zone::shown || item.zone() == Zone::trashed;
@@ -47,8 +46,7 @@ std::vector<LocalExaminer::Change> LocalExaminer::nextChanges(std::uint64_t afte
   changes.erase(std::remove_if(changes.begin(), changes.end(),
                                [through](const Change &change) { return change.rank > through; }),
                 changes.end());
-  std::sort(changes.begin(), changes.end(),
-            [](const Change &a, const Change &b) { return a.rank < b.rank; });
+  std::sort(changes.begin(), changes.end(), [](const Change &a, const Change &b) { return a.rank < b.rank; });
   return changes;
 }
 
@@ -85,7 +83,7 @@ void LocalExaminer::examineItem(ItemNumber item) {
 
 // Counts before the first of them is queued, because what is queued may be sent at once.
 void LocalExaminer::guardAgainstSpree(const std::vector<Change> &changes) {
-  if (holdsDeletions_ || store_.number(kAllowsDeletions) != 0) return;
+  if (holdsDeletions_) return;
   std::uint64_t deaths = 0;
   std::uint64_t rank = changes.back().rank;
   for (const Change &change : changes)
@@ -100,9 +98,10 @@ void LocalExaminer::guardAgainstSpree(const std::vector<Change> &changes) {
     more = following.size() == kChangesAtATime;
     if (more) rank = following.back().rank;
   }
-  for (const QueuedUpload &waiting : store_.allQueued(100000)) deaths += waiting.isDeletion ? 1 : 0;
+  deaths += store_.countDeletions();
   const std::uint64_t all = store_.countRows();
-  if (deaths < guard_.atLeast || static_cast<double>(deaths) <= guard_.share * static_cast<double>(all)) return;
+  if (deaths < guard_.atLeast || static_cast<double>(deaths) <= guard_.share * static_cast<double>(all))
+    return;
   holdsDeletions_ = true;
   store_.setNumber(kHoldsDeletions, 1);
   os_log_error(qvc_default_log(),
@@ -202,11 +201,10 @@ bool LocalExaminer::bind(const ItemRecord &item, const std::string &parent) {
   row->item = item.id;
   store_.put(*row);
   store_.dropQueued(item.id);
-  if (isClean(item, *row, parent)) {
-    states_.show({item.id, row->isDataless, true, LocalFileOf(item.facts), true});
-    return true;
-  }
-  return false;
+  if (!isClean(item, *row, parent)) return false;
+  states_.show({item.id, row->isDataless, true, LocalFileOf(item.facts), true});
+  if (bound_) bound_(item.id, *row);
+  return true;
 }
 
 bool LocalExaminer::bindLink(const ItemRecord &item, SyncRow row) {

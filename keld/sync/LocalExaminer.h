@@ -1,7 +1,8 @@
 #pragma once
 
-#include <atomic>
 #include <cstdint>
+#include <functional>
+#include <string>
 #include <vector>
 
 #include "keld/ContainerList.h"
@@ -14,8 +15,8 @@ namespace droxa::keld {
 
 // When deletions are taken for an accident: both must be exceeded.
 struct DeletionGuard {
-  double share = 0.3;           // of the documents and folders that the drive has in the cloud
-  std::uint64_t atLeast = 25;   // deletions
+  double share = 0.3;          // of the documents and folders that the drive has in the cloud
+  std::uint64_t atLeast = 25;  // deletions
 };
 
 // Reads the item table's feed of changes and finds out which of them the cloud doesn't know: those it puts
@@ -32,7 +33,11 @@ class LocalExaminer {
   // Examines one item now, whatever the feed says.
   void examineItem(ItemNumber item);
 
-  // Until the queue holds no deletion, deletions aren't held: a person has said that they are meant.
+  // Called, on the examining thread, for each file that was found to stand for a record.
+  void setBoundHandler(std::function<void(ItemNumber item, const SyncRow &row)> handler) {
+    bound_ = std::move(handler);
+  }
+  // A person has said what is to become of the deletions that were held.
   void allowDeletions();
 
  private:
@@ -58,6 +63,7 @@ class LocalExaminer {
   ItemStates &states_;
   const ReplicaFiles::Read read_;
   const DeletionGuard guard_;
+  std::function<void(ItemNumber, const SyncRow &)> bound_;
   bool holdsDeletions_ = false;
   bool queuedAny_ = false;
 };

@@ -21,6 +21,16 @@ std::optional<ItemRecord> ReplicaFiles::item(ItemNumber item) const {
   return found;
 }
 
+bool ReplicaFiles::itemAtPath(const std::string &path, ItemRecord *item) const {
+  bool found = false;
+  (void)read_([&](ItemQueries &queries) {
+    const auto record = queries.byPathBelowReplica(path);
+    found = record.has_value();
+    if (record) *item = *record;
+  });
+  return found;
+}
+
 std::string ReplicaFiles::pathOf(ItemNumber item) const {
   std::string path;
   (void)read_([&](ItemQueries &queries) {

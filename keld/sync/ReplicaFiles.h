@@ -28,6 +28,8 @@ class ReplicaFiles {
   ReplicaFiles(std::string replicaPath, Read read, SyncStore &store);
 
   std::optional<ItemRecord> item(ItemNumber item) const;
+  // What the item table has at a path below the replica; false when there is nothing.
+  bool itemAtPath(const std::string &path, ItemRecord *item) const;
   // nullopt when the item is gone, or its folder can't be opened (`error` says why; may be null).
   std::optional<FileLocation> locate(ItemNumber item, NSError *error) const;
   // The path below the replica of the folder that stands for a parent record; nullopt when nothing does yet.

@@ -204,6 +204,15 @@ std::uint64_t SyncStore::countRows() {
   return count("SELECT count(*) FROM rows");
 }
 
+std::vector<std::string> SyncStore::recordsInCloud() {
+  const RecursiveLock lock(mutex_);
+  SqlStatement &asked = statement("SELECT record FROM rows WHERE tag <> ''");
+  std::vector<std::string> records;
+  while (asked.step()) records.emplace_back(asked.bytes(0));
+  asked.reset();
+  return records;
+}
+
 void SyncStore::unbindAll() {
   const RecursiveLock lock(mutex_);
   transaction([this]() NO_THREAD_SAFETY_ANALYSIS {
@@ -331,7 +340,8 @@ void SyncStore::dropQueued(ItemNumber item) {
 void SyncStore::uploadFailed(const QueuedUpload &upload, const NSError &error, std::int64_t retry) {
   const RecursiveLock lock(mutex_);
   statement(
-      "UPDATE uploads SET attempts = attempts + 1, retry = ?, errorDomain = ?, errorCode = ?, errorText = ?"
+      "UPDATE uploads SET attempts = attempts + (?2 <> ''), retry = ?1, errorDomain = ?, errorCode = ?, "
+      "errorText = ?"
       " WHERE item = ? AND generation = ?")
       .bind(1, retry)
       .bindText(2, error.domain())
@@ -340,6 +350,11 @@ void SyncStore::uploadFailed(const QueuedUpload &upload, const NSError &error, s
       .bind(5, upload.item)
       .bind(6, upload.generation)
       .run();
+}
+
+void SyncStore::retryNow(ItemNumber item) {
+  const RecursiveLock lock(mutex_);
+  statement("UPDATE uploads SET retry = 0 WHERE item = ?").bind(1, item).run();
 }
 
 void SyncStore::retryAllNow() {
@@ -351,10 +366,14 @@ std::uint64_t SyncStore::countQueued() {
   return count("SELECT count(*) FROM uploads WHERE held = 0");
 }
 std::uint64_t SyncStore::countFailed() {
-  return count("SELECT count(*) FROM uploads WHERE retry <> 0");
+  return count("SELECT count(*) FROM uploads WHERE errorDomain <> ''");
 }
 std::uint64_t SyncStore::countHeld() {
   return count("SELECT count(*) FROM uploads WHERE held = 1");
+}
+
+std::uint64_t SyncStore::countDeletions() {
+  return count("SELECT count(*) FROM uploads WHERE deletion = 1");
 }
 
 void SyncStore::releaseHeld() {

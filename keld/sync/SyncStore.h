@@ -87,6 +87,7 @@ class SyncStore {
   void put(const SyncRow &row);
   void erase(const std::string &record);
   std::uint64_t countRows();
+  std::vector<std::string> recordsInCloud();
   void unbindAll();  // the item database is a new one: every item has another number
 
   // Records that came before their parents.
@@ -103,11 +104,14 @@ class SyncStore {
   std::optional<std::int64_t> nextRetry();    // when the next one that failed is due
   void uploaded(const QueuedUpload &upload);  // unless it changed again meanwhile
   void dropQueued(ItemNumber item);
+  // Not before that time again. A nil error: it wasn't tried, something else comes first.
   void uploadFailed(const QueuedUpload &upload, const NSError &error, std::int64_t retryMilliseconds);
+  void retryNow(ItemNumber item);
   void retryAllNow();
   std::uint64_t countQueued();
   std::uint64_t countFailed();
   std::uint64_t countHeld();
+  std::uint64_t countDeletions();
   void releaseHeld();
   std::vector<QueuedUpload> held(std::uint64_t limit);
 

@@ -1,0 +1,164 @@
+// What both the cloud and the replica have, and the cloud has in a newer state.
+
+#include <cerrno>
+#include <cstdio>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "keld/sync/CloudApplier.h"
+#include "keld/sync/ConflictName.h"
+#include "platform/foundation/NSDate.h"
+#include "tessaly/QVLog.h"
+
+namespace droxa::keld {
+
+void CloudApplier::change(const DocumentRecord &document, const Place &place, SyncRow row,
+                          const ItemRecord &item) {
+  auto location = context_.files.locate(item.id, nullptr);
+  if (!location) {
+    // Its folder can't be opened now; the next fetch of everything tries again.
+    row.tag.clear();
+    context_.store.put(row);
+    return;
+  }
+  const bool isMoved = document.parent != row.parent || document.name != row.name;
+  if (isMoved && move(document, place, &*location)) {
+    row.parent = document.parent;
+    row.name = document.name;
+  } else if (isMoved) {
+    // It can't be there: what it is called here goes to the cloud again.
+    row.parent = document.parent;
+    row.name = document.name;
+    context_.store.enqueue(item.id, false, false);
+  }
+  if (document.kind != NSFileProviderItemKind::document) {
+    const bool changesMode =
+        document.kind == NSFileProviderItemKind::folder && document.content.mode != row.content.mode;
+    if (changesMode)
+      ::fchmodat(location->folder.get(), location->name.c_str(), document.content.mode & 0777U, 0);
+    row.tag = document.tag;
+    row.content = document.content;
+    context_.store.put(row);
+    touch(location->path);
+    return;
+  }
+  changeContents(document, place, std::move(row), *location);
+}
+
+bool CloudApplier::move(const DocumentRecord &document, const Place &place, FileLocation *location) {
+  int code = 0;
+  std::string name = document.name;
+  for (unsigned number = 0; number < 1000; ++number) {
+    const std::string path = place.folderPath + "/" + name;
+    if (path == location->path) return number == 0;
+    if (::renameat2(location->folder.get(), location->name.c_str(), place.folder.get(), name.c_str(),
+                    RENAME_NOREPLACE) == 0) {
+      touch(location->path);
+      touch(path);
+      location->folder = context_.files.openFolder(place.folderPath, &code);
+      location->name = name;
+      location->path = path;
+      return true;
+    }
+    if (errno != EEXIST) return false;
+    name = ConflictName(document.name, document.device, NSDate::now().nanosecondsSince1970(), number + 1);
+  }
+  return false;
+}
+
+void CloudApplier::changeContents(const DocumentRecord &document, const Place &place, SyncRow row,
+                                  const FileLocation &location) {
+  const DocumentLook look = context_.storage.classify(location.folder.get(), location.name);
+  const bool isSameVersion = document.content.digest == row.content.digest;
+  if (look.kind == DocumentClass::dataless || look.kind == DocumentClass::evicting) {
+    if (!isSameVersion || document.content != row.content)
+      return replacePlaceholder(document, std::move(row), location, look);
+    row.tag = document.tag;
+    context_.store.put(row);
+    return;
+  }
+  const bool isIntact =
+      look.kind == DocumentClass::present ||
+      (look.kind == DocumentClass::plain && IsSameContents(LocalFileOf(look.facts), row.local));
+  if (isSameVersion) {
+    // Its contents are the same there; what was written here, if anything, is still to be sent.
+    if (isIntact && document.content.mode != row.content.mode)
+      ::fchmodat(location.folder.get(), location.name.c_str(), document.content.mode & 0777U, 0);
+    row.tag = document.tag;
+    row.content.mode = document.content.mode;
+    row.newerTag.clear();
+    context_.store.put(row);
+    touch(location.path);
+    return;
+  }
+  if (isIntact) {
+    // The newer version is fetched first, and then put in its place at once.
+    row.newerTag = document.tag;
+    row.newer = document.content;
+    context_.store.put(row);
+    return;
+  }
+  // Changed on both sides.
+  if (look.facts.size == document.content.size) {
+    const OwnedDescriptor file(::openat(location.folder.get(), location.name.c_str(),
+                                        O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK));
+    if (file && DigestOfFile(file.get()) == document.content.digest) {
+      DocumentMarker marker = markerOf(document);
+      marker.state = MarkerState::present;
+      marker.modified = look.facts.modified;
+      WriteMarker(file.get(), marker);
+      row.tag = document.tag;
+      row.content = document.content;
+      row.content.modified = look.facts.modified;
+      row.local = LocalFileOf(look.facts);
+      row.isDataless = false;
+      row.newerTag.clear();
+      context_.store.put(row);
+      context_.store.enqueue(row.item, false, false);
+      touch(location.path);
+      return;
+    }
+  }
+  std::string copy;
+  const ItemNumber item = row.item;
+  const NSError problem = conflicts_.setAside(location, {}, &copy);
+  if (problem) {
+    os_log_error(qvc_default_log(), "[ERROR] can't keep what was written at %s: %@", location.path, problem);
+    return;
+  }
+  touch(location.path.substr(0, location.path.size() - location.name.size()) + copy);
+  context_.store.enqueue(item, false, false);
+  row.item = 0;
+  row.local = {};
+  row.newerTag.clear();
+  create(document, place, std::move(row));
+}
+
+void CloudApplier::replacePlaceholder(const DocumentRecord &document, SyncRow row,
+                                      const FileLocation &location, const DocumentLook &look) {
+  PreparedResult prepared = context_.storage.preparePlaceholder(
+      markerOf(document), document.content.mode & 0777U, {0, document.content.modified});
+  if (!prepared.result.isDone()) {
+    row.tag.clear();
+    context_.store.put(row);
+    return;
+  }
+  const ContentsResult result =
+      context_.storage.replaceContents(location.folder.get(), location.name, prepared.file, look.facts);
+  if (result.isDone()) {
+    row.tag = document.tag;
+    row.content = document.content;
+    row.local = LocalFileOf(result.facts);
+    row.isDataless = true;
+    row.newerTag.clear();
+  } else {
+    // Somebody wrote or read there just now: as a version that waits, it is put in place later.
+    row.newerTag = document.tag;
+    row.newer = document.content;
+  }
+  context_.store.put(row);
+  touch(location.path);
+}
+
+}  // namespace droxa::keld

@@ -1,0 +1,233 @@
+// What the cloud has and the replica doesn't.
+
+#include <cerrno>
+#include <cstdio>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "keld/sync/CloudApplier.h"
+#include "keld/sync/ConflictName.h"
+#include "platform/foundation/NSDate.h"
+#include "tessaly/QVLog.h"
+
+namespace droxa::keld {
+
+namespace {
+
+constexpr int kMostTries = 100;
+
+std::optional<FileFacts> factsAt(const FileLocation &location) {
+  return ReadFileFacts(location.folder.get(), location.name, 0);
+}
+
+}  // namespace
+
+void CloudApplier::create(const DocumentRecord &document, const Place &place, SyncRow row) {
+  row.tag = document.tag;
+  row.parent = document.parent;
+  row.name = document.name;
+  row.kind = document.kind;
+  row.content = document.content;
+  row.isDataless = document.kind == NSFileProviderItemKind::document;
+  bool made = false;
+  if (document.kind == NSFileProviderItemKind::folder)
+    made = createFolder(document, place, &row);
+  else if (document.kind == NSFileProviderItemKind::document)
+    made = createDocument(document, place, &row);
+  else
+    made = createLink(document, place, &row);
+  // What couldn't be made is tried again with the next fetch of everything.
+  if (!made) row.tag.clear();
+  context_.store.put(row);
+}
+
+bool CloudApplier::createFolder(const DocumentRecord &document, const Place &place, SyncRow *row) {
+  PreparedResult prepared = context_.storage.prepareFolder(markerOf(document), document.content.mode & 0777U);
+  if (!prepared.result.isDone()) return false;
+  std::string name = document.name;
+  for (int attempt = 0; attempt < kMostTries; ++attempt) {
+    const ContentsResult result = context_.storage.publishNew(prepared.file, place.folder.get(), name);
+    if (result.isDone()) {
+      touch(place.folderPath + "/" + name);
+      return true;
+    }
+    if (result.outcome != ContentsOutcome::nameTaken) return false;
+    const Taken taken = resolveTaken(document, place, name, row);
+    if (taken == Taken::isIt) return true;
+    if (taken == Taken::useOtherName)
+      name = ConflictName(document.name, document.device, NSDate::now().nanosecondsSince1970(),
+                          static_cast<unsigned>(attempt + 1));
+  }
+  return false;
+}
+
+bool CloudApplier::createLink(const DocumentRecord &document, const Place &place, SyncRow *row) {
+  if (document.target.empty()) return false;
+  std::string name = document.name;
+  for (int attempt = 0; attempt < kMostTries; ++attempt) {
+    if (::symlinkat(document.target.c_str(), place.folder.get(), name.c_str()) == 0) {
+      touch(place.folderPath + "/" + name);
+      return true;
+    }
+    if (errno != EEXIST) return false;
+    const Taken taken = resolveTaken(document, place, name, row);
+    if (taken == Taken::isIt) return true;
+    if (taken == Taken::useOtherName)
+      name = ConflictName(document.name, document.device, NSDate::now().nanosecondsSince1970(),
+                          static_cast<unsigned>(attempt + 1));
+  }
+  return false;
+}
+
+bool CloudApplier::createDocument(const DocumentRecord &document, const Place &place, SyncRow *row) {
+  PreparedResult prepared = context_.storage.preparePlaceholder(
+      markerOf(document), document.content.mode & 0777U, {0, document.content.modified});
+  if (!prepared.result.isDone()) return false;
+  std::string name = document.name;
+  for (int attempt = 0; attempt < kMostTries; ++attempt) {
+    const ContentsResult result = context_.storage.publishNew(prepared.file, place.folder.get(), name);
+    if (result.isDone()) {
+      row->local = LocalFileOf(result.facts);
+      touch(place.folderPath + "/" + name);
+      return true;
+    }
+    if (result.outcome != ContentsOutcome::nameTaken) return false;
+    const Taken taken = resolveTaken(document, place, name, row);
+    if (taken == Taken::isIt) return true;
+    if (taken == Taken::useOtherName)
+      name = ConflictName(document.name, document.device, NSDate::now().nanosecondsSince1970(),
+                          static_cast<unsigned>(attempt + 1));
+  }
+  return false;
+}
+
+// --- The name is taken.
+
+CloudApplier::Taken CloudApplier::resolveTaken(const DocumentRecord &document, const Place &place,
+                                               const std::string &name, SyncRow *row) {
+  FileLocation there;
+  int code = 0;
+  there.path = place.folderPath + "/" + name;
+  there.name = name;
+  there.folder = context_.files.openFolder(place.folderPath, &code);
+  const auto facts = there ? factsAt(there) : std::nullopt;
+  if (!facts) return Taken::freed;  // it has just gone
+  (void)context_.files.itemAtPath(there.path, &there.item);
+  auto other = context_.store.byItem(there.item.id);
+  const auto marker = ReadMarker(there.folder.get(), name);
+  if (!other && marker && marker->recordName != document.record)
+    other = context_.store.byRecord(marker->recordName);
+  const bool isFolder = document.kind == NSFileProviderItemKind::folder;
+  const bool isMarked = marker && marker->recordName == document.record;
+  if (facts->kind == NSFileProviderItemKind::folder && isFolder) {
+    // Two folders of one name are one folder; unless they are two in the cloud already.
+    if (other && !other->tag.empty() && other->record != document.record)
+      return freeName(there, other, document.record);
+    const OwnedDescriptor folder(
+        ::openat(there.folder.get(), name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    if (folder) WriteMarker(folder.get(), markerOf(document));
+    if (other && other->record != document.record) context_.store.erase(other->record);
+    row->item = there.item.id;
+    if (row->item != 0) context_.store.dropQueued(row->item);
+    return Taken::isIt;
+  }
+  const bool isLink =
+      facts->kind == NSFileProviderItemKind::symbolicLink || facts->kind == NSFileProviderItemKind::alias;
+  if (isLink && !document.target.empty()) {
+    char target[4096];
+    const ssize_t length = ::readlinkat(there.folder.get(), name.c_str(), target, sizeof target);
+    if (length > 0 && document.target == std::string_view(target, static_cast<std::size_t>(length))) {
+      if (other && other->record != document.record) context_.store.erase(other->record);
+      row->item = there.item.id;
+      if (row->item != 0) context_.store.dropQueued(row->item);
+      return Taken::isIt;
+    }
+  }
+  if (facts->kind == NSFileProviderItemKind::document && document.kind == NSFileProviderItemKind::document &&
+      (isMarked || !other || other->tag.empty()))
+    return resolveTakenByDocument(document, there, other, row);
+  return freeName(there, other, document.record);
+}
+
+CloudApplier::Taken CloudApplier::resolveTakenByDocument(const DocumentRecord &document,
+                                                         const FileLocation &there,
+                                                         const std::optional<SyncRow> &other, SyncRow *row) {
+  const DocumentLook look = context_.storage.classify(there.folder.get(), there.name);
+  const bool isIntact = look.kind == DocumentClass::present || look.kind == DocumentClass::dataless;
+  const bool isOwn = look.marker && look.marker->recordName == document.record;
+  bool isSame = isIntact && isOwn && look.marker->digest == document.content.digest;
+  if (isIntact && isOwn && !isSame) {
+    // An older version, from before the row was written down.
+    PreparedResult prepared = context_.storage.preparePlaceholder(
+        markerOf(document), document.content.mode & 0777U, {0, document.content.modified});
+    if (prepared.result.isDone()) {
+      const ContentsResult result =
+          context_.storage.replaceContents(there.folder.get(), there.name, prepared.file, look.facts);
+      if (result.isDone()) {
+        row->local = LocalFileOf(result.facts);
+        row->isDataless = true;
+        row->item = there.item.id;
+        touch(there.path);
+        return Taken::isIt;
+      }
+    }
+  }
+  DocumentLook found = look;
+  const bool mayBeSame = look.facts.size == document.content.size && look.kind != DocumentClass::dataless &&
+                         look.kind != DocumentClass::partlyWritten && look.kind != DocumentClass::evicting;
+  if (!isSame && mayBeSame) {
+    const OwnedDescriptor file(
+        ::openat(there.folder.get(), there.name.c_str(), O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK));
+    if (file && DigestOfFile(file.get()) == document.content.digest) {
+      DocumentMarker marker = markerOf(document);
+      marker.state = MarkerState::present;
+      marker.modified = look.facts.modified;
+      WriteMarker(file.get(), marker);
+      isSame = true;
+      found = context_.storage.classify(there.folder.get(), there.name);
+    }
+  }
+  if (isSame) {
+    row->item = there.item.id;
+    row->local = LocalFileOf(found.facts);
+    row->isDataless = found.kind == DocumentClass::dataless;
+    if (row->item != 0) context_.store.dropQueued(row->item);
+    if (other && other->record != document.record) context_.store.erase(other->record);
+    touch(there.path);
+    return Taken::isIt;
+  }
+  return freeName(there, other, document.record);
+}
+
+// Of two records with one name the one with the smaller name of its own keeps it, so that all devices decide
+// alike. What the cloud doesn't know yet always makes room.
+CloudApplier::Taken CloudApplier::freeName(const FileLocation &there, const std::optional<SyncRow> &other,
+                                           const std::string &record) {
+  const bool isInCloud = other && !other->tag.empty();
+  if (isInCloud && other->record < record) return Taken::useOtherName;
+  if (!isInCloud) {
+    std::string copy;
+    const NSError problem = conflicts_.setAside(there, {}, &copy);
+    if (problem) return Taken::useOtherName;
+    if (other) context_.store.erase(other->record);
+    touch(there.path);
+    touch(there.path.substr(0, there.path.size() - there.name.size()) + copy);
+    return Taken::freed;
+  }
+  // A rename like any other, which the cloud is told of.
+  for (unsigned number = 1; number < 1000; ++number) {
+    const std::string name =
+        ConflictName(there.name, context_.device, NSDate::now().nanosecondsSince1970(), number);
+    if (::renameat2(there.folder.get(), there.name.c_str(), there.folder.get(), name.c_str(),
+                    RENAME_NOREPLACE) == 0) {
+      touch(there.path);
+      touch(there.path.substr(0, there.path.size() - there.name.size()) + name);
+      return Taken::freed;
+    }
+    if (errno != EEXIST) break;
+  }
+  return Taken::useOtherName;
+}
+
+}  // namespace droxa::keld

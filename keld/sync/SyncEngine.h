@@ -1,0 +1,132 @@
+#pragma once
+
+#include <atomic>
+#include <condition_variable>
+#include <functional>
+#include <memory>
+#include <optional>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "keld/Keeper.h"
+#include "keld/sync/AssetUploads.h"
+#include "keld/sync/CloudApplier.h"
+#include "keld/sync/ConflictCopies.h"
+#include "keld/sync/Downloads.h"
+#include "keld/sync/LocalExaminer.h"
+#include "keld/sync/SyncContext.h"
+#include "keld/sync/Uploader.h"
+#include "platform/foundation/ThreadSafety.h"
+
+namespace droxa::keld {
+
+struct SyncOptions {
+  // The cloud that the drive is in; tests give one of their own. Null: EmbeddedCloud in `cloudFolder`.
+  std::shared_ptr<CKCloud> cloud;
+  std::string cloudFolder;  // "": the folder "cloud" of the home
+  std::string device;       // "": the machine's name, and the home's where it isn't the usual one
+  DeletionGuard deletionGuard;
+  DownloadOptions downloads;
+  ContentsSettings contents;
+  std::chrono::milliseconds pollInterval = std::chrono::seconds(30);  // in case a change wasn't told
+};
+
+// Keeps the replica and the cloud alike: one thread that examines what changed here, applies what changed
+// there, and sends; downloads run beside it. It runs while somebody is signed in.
+// Thread contract: any thread.
+class SyncEngine {
+ public:
+  // Throws SqlError, std::system_error; `read` answers from the item database.
+  SyncEngine(const std::string &replicaPath, const std::string &databasePath, std::shared_ptr<CKCloud> cloud,
+             std::function<Keeper *()> keeper, ReplicaFiles::Read read, SyncOptions options);
+  ~SyncEngine();
+
+  // `itemDatabase` identifies the item database: with another one all items are found anew.
+  void start(const std::string &itemDatabase);
+  void stop();
+
+  void itemsChanged();  // there is something new in the feed
+  void setSignedIn(bool isSignedIn);
+
+  SyncStore &store() { return store_; }
+  ReplicaFiles &files() { return files_; }
+  const ContentsStorage &storage() const { return *storage_; }
+  ItemStates &states() { return states_; }
+  const std::shared_ptr<Downloads> &downloads() const { return downloads_; }
+  AssetUploads &assetUploads() { return *assets_; }
+  const std::string &device() const { return context_.device; }
+
+  // Runs `work` on the sync's thread, after everything that has changed here so far was examined.
+  void perform(std::function<void()> work);
+  // Fetches what the cloud has now; `done` comes when it is applied, or couldn't be.
+  void fetchNow(std::function<void(const NSError &error)> done);
+  // Calls `done` (on the pool) when nothing of `items` (empty: nothing at all) waits to be sent any more, or
+  // with why one of them can't be.
+  void whenUploaded(std::vector<ItemNumber> items, std::function<void(const NSError &error)> done);
+  void answerDeletions(bool carryOut);
+  bool isPinnedOrBelowPin(ItemNumber item);
+
+  struct Status {
+    std::string cloud;
+    std::string cloudProblem;
+    std::uint64_t uploadsDone = 0, uploadsFailed = 0, bytesUploaded = 0, uploadRate = 0;
+    std::uint64_t conflicts = 0;
+  };
+  Status status();
+
+ private:
+  struct Waiter {
+    std::vector<ItemNumber> items;
+    bool isAll = false;
+    std::function<void(const NSError &)> done;
+  };
+
+  void run();
+  bool prepareCloud();
+  void bindAnew(const std::string &itemDatabase);
+  void round();
+  void fetch();
+  void noteCloudProblem(const NSError &error);
+  void answerWaiters();
+  void startWaitingVersions();
+  void waitForWork();
+  CKCallContext call(std::chrono::milliseconds timeout) const;
+
+  const std::shared_ptr<CKCloud> cloud_;
+  const SyncOptions options_;
+  SyncStore store_;
+  ReplicaFiles files_;
+  std::unique_ptr<ContentsStorage> storage_;
+  ItemStates states_;
+  SyncContext context_;
+  std::shared_ptr<AssetUploads> assets_;
+  std::shared_ptr<Downloads> downloads_;
+  ConflictCopies conflicts_;
+  Uploader uploader_;
+  CloudApplier applier_;
+  LocalExaminer examiner_;
+  const std::shared_ptr<CKCancellation> stopping_ = std::make_shared<CKCancellation>();
+  std::unique_ptr<CKSubscription> subscription_;
+
+  // The sync's thread.
+  bool isCloudReady_ = false;
+  bool moreIsDue_ = false;
+  std::chrono::milliseconds retryPause_{0};
+  std::chrono::steady_clock::time_point nextPoll_;
+
+  Mutex mutex_;
+  std::condition_variable_any wake_;
+  bool signedIn_ GUARDED_BY(mutex_) = false;
+  bool stop_ GUARDED_BY(mutex_) = false;
+  bool hasLocalNews_ GUARDED_BY(mutex_) = true;
+  bool hasCloudNews_ GUARDED_BY(mutex_) = true;
+  std::vector<std::function<void()>> work_ GUARDED_BY(mutex_);
+  std::vector<Waiter> waiters_ GUARDED_BY(mutex_);
+  std::vector<std::function<void(const NSError &)>> fetchers_ GUARDED_BY(mutex_);
+  std::string cloudProblem_ GUARDED_BY(mutex_);
+  TransferRate uploadRate_ GUARDED_BY(mutex_);
+  std::thread thread_;
+};
+
+}  // namespace droxa::keld

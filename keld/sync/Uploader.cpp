@@ -1,0 +1,371 @@
+#include "keld/sync/Uploader.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <chrono>
+#include <fcntl.h>
+#include <unistd.h>
+
+#include "keld/sync/CloudErrors.h"
+#include "tessaly/QVLog.h"
+
+namespace droxa::keld {
+
+namespace {
+
+constexpr std::uint64_t kRecordsAtATime = 100;
+constexpr std::uint64_t kInlineSize = 4 << 20;    // larger contents are sent beside this thread
+constexpr std::uint64_t kInlineBytes = 16 << 20;  // of one round
+constexpr std::int64_t kSoon = 300;               // milliseconds
+constexpr std::int64_t kLongestPause = 300'000;
+
+std::int64_t nowMilliseconds() {
+  return std::chrono::duration_cast<std::chrono::milliseconds>(
+             std::chrono::system_clock::now().time_since_epoch())
+      .count();
+}
+
+bool isSyncedItem(const ItemRecord &item) {
+  const bool isPlaced = item.zone() == Zone::shown || item.zone() == Zone::trashed;
+  return isPlaced && (item.flags & kExcludedFlag) == 0;
+}
+
+OwnedDescriptor openFile(const FileLocation &location) {
+  return OwnedDescriptor(::openat(location.folder.get(), location.name.c_str(),
+                                  O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+}
+
+}  // namespace
+
+Uploader::Uploader(const SyncContext &context, AssetUploads &assets, ConflictCopies &conflicts)
+    : context_(context), assets_(assets), conflicts_(conflicts) {}
+
+Uploader::Totals Uploader::totals() const {
+  const Lock lock(mutex_);
+  return totals_;
+}
+
+Uploader::Round Uploader::sendDue(const CKCallContext &call) {
+  Round round;
+  inlineBytes_ = 0;
+  cloudProblem_ = NSError();
+  const auto due = context_.store.due(nowMilliseconds(), kRecordsAtATime);
+  std::vector<Plan> saves, removals;
+  for (const QueuedUpload &entry : due) {
+    Plan plan;
+    plan.entry = entry;
+    const Prepared prepared = prepare(entry, &plan, call);
+    if (prepared == Prepared::save) saves.push_back(std::move(plan));
+    if (prepared == Prepared::remove) removals.push_back(std::move(plan));
+    if (cloudProblem_ || inlineBytes_ >= kInlineBytes || call.isCancelled()) break;
+  }
+  round.cloudProblem = cloudProblem_;
+  if (cloudProblem_ || call.isCancelled() || (saves.empty() && removals.empty())) {
+    round.moreIsDue = !cloudProblem_ && due.size() == kRecordsAtATime;
+    return round;
+  }
+  CKModifyRequest request;
+  request.isAtomic = false;
+  for (const Plan &plan : saves) {
+    CKRecord record = plan.hasContent ? MakeRecordWithContent(plan.document) : MakeRecord(plan.document);
+    request.recordsToSave.push_back(std::move(record));
+  }
+  for (const Plan &plan : removals)
+    request.recordsToDelete.push_back({RecordID(plan.row.record), plan.row.tag});
+  const CKModifyReply reply = context_.cloud.modifyRecords(request, call);
+  if (reply.error && !CKErrorIs(reply.error, CKErrorCode::partialFailure)) {
+    round.cloudProblem = reply.error;
+    return round;
+  }
+  context_.store.transaction([&] {
+    for (std::size_t index = 0; index < saves.size(); ++index) {
+      const CKRecordResult &result = reply.saved[index];
+      if (!result.error)
+        saved(saves[index], result.record);
+      else
+        saveFailed(saves[index], result.error, &round);
+      round.sent += result.error ? 0 : 1;
+    }
+    for (std::size_t index = 0; index < removals.size(); ++index) {
+      const CKDeleteResult &result = reply.deleted[index];
+      if (!result.error)
+        removed(removals[index]);
+      else
+        removeFailed(removals[index], result.error, &round);
+      round.sent += result.error ? 0 : 1;
+    }
+  });
+  context_.states.flush();
+  round.moreIsDue = !context_.store.due(nowMilliseconds(), 1).empty();
+  return round;
+}
+
+// --- Working out what is to be sent.
+
+Uploader::Prepared Uploader::prepare(const QueuedUpload &entry, Plan *plan, const CKCallContext &call) {
+  if (auto row = context_.store.byItem(entry.item)) plan->row = std::move(*row);
+  const auto item = context_.files.item(entry.item);
+  if (!item || !isSyncedItem(*item)) return prepareDeletion(plan);
+  return prepareSave(*item, plan, call);
+}
+
+Uploader::Prepared Uploader::prepareDeletion(Plan *plan) {
+  // What was never seen to die is missing for another reason: the keeper hasn't told yet.
+  if (!plan->entry.isDeletion && !plan->row.record.empty()) return laterWith(plan, NSError());
+  if (plan->row.record.empty()) {
+    context_.store.uploaded(plan->entry);
+    return Prepared::nothing;
+  }
+  plan->isDeletion = true;
+  return Prepared::remove;
+}
+
+Uploader::Prepared Uploader::laterWith(Plan *plan, const NSError &error) {
+  std::int64_t pause = kSoon;
+  for (std::int64_t attempt = 0; error && attempt < plan->entry.attempts && pause < kLongestPause; ++attempt)
+    pause *= 2;
+  context_.store.uploadFailed(plan->entry, error, nowMilliseconds() + std::min(pause, kLongestPause));
+  return Prepared::later;
+}
+
+Uploader::Prepared Uploader::prepareSave(const ItemRecord &item, Plan *plan, const CKCallContext &call) {
+  NSError problem;
+  const auto location = context_.files.locate(item.id, &problem);
+  if (!location) return laterWith(plan, problem);
+  const std::string parent = context_.files.parentRecord(location->item);
+  if (parent.empty()) {
+    // The folder has to be known first.
+    if (!context_.store.queued(item.parent)) context_.store.enqueue(item.parent, false, false);
+    return laterWith(plan, NSError());
+  }
+  SyncRow &row = plan->row;
+  if (row.record.empty()) {
+    // Written down before it is sent, so that a lost reply doesn't make a second record.
+    row.record = NewRecordName();
+    row.item = item.id;
+    row.parent = parent;
+    row.name = item.name;
+    row.kind = item.facts.kind;
+    context_.store.put(row);
+  }
+  DocumentRecord &document = plan->document;
+  document.record = row.record;
+  document.tag = row.tag;
+  document.parent = parent;
+  document.name = location->item.name;
+  document.kind = location->item.facts.kind;
+  document.content = row.content;
+  document.content.mode = location->item.facts.mode & 07777;
+  plan->isDataless = row.isDataless;
+  plan->file = LocalFileOf(location->item.facts);
+  if (document.kind == NSFileProviderItemKind::folder) {
+    plan->changesMarker = row.tag.empty();
+    return Prepared::save;
+  }
+  if (document.kind != NSFileProviderItemKind::document) return prepareLink(*location, plan);
+  return prepareDocument(*location, plan, call);
+}
+
+Uploader::Prepared Uploader::prepareLink(const FileLocation &location, Plan *plan) {
+  char target[4096];
+  const ssize_t length = ::readlinkat(location.folder.get(), location.name.c_str(), target, sizeof target);
+  if (length <= 0) return laterWith(plan, NSError::errorWithPOSIXCode(errno, location.path));
+  plan->document.target.assign(target, static_cast<std::size_t>(length));
+  return Prepared::save;
+}
+
+Uploader::Prepared Uploader::prepareDocument(const FileLocation &location, Plan *plan,
+                                             const CKCallContext &call) {
+  const DocumentLook look = context_.storage.classify(location.folder.get(), location.name);
+  SyncRow &row = plan->row;
+  switch (look.kind) {
+    case DocumentClass::missing:
+    case DocumentClass::notADocument:
+      context_.states.lookAt({location.path});
+      return laterWith(plan, NSError());
+    case DocumentClass::unreadable:
+      return laterWith(plan, NSError::errorWithPOSIXCode(look.error, context_.files.absolute(location.path)));
+    case DocumentClass::evicting:
+      context_.storage.finishEviction(location.folder.get(), location.name);
+      return laterWith(plan, NSError());
+    case DocumentClass::partlyWritten:
+      return restorePartlyWritten(location, look, plan);
+    case DocumentClass::dataless:
+      // Its contents are in the cloud, under this record's name or, for a copy of a placeholder, another's.
+      plan->file = LocalFileOf(look.facts);
+      plan->isDataless = true;
+      plan->changesMarker = look.marker->recordName != row.record;
+      plan->hasContent = row.content.digest != look.marker->digest;
+      plan->document.content.size = look.marker->size;
+      plan->document.content.digest = look.marker->digest;
+      plan->document.content.modified = look.marker->modified;
+      return Prepared::save;
+    case DocumentClass::plain:
+    case DocumentClass::present:
+    case DocumentClass::edited:
+    case DocumentClass::overwritten:
+      break;
+  }
+  plan->file = LocalFileOf(look.facts);
+  plan->isDataless = false;
+  const bool isKnown = !row.content.digest.empty() && !row.tag.empty();
+  if (isKnown && !row.isDataless && IsSameContents(plan->file, row.local)) return Prepared::save;
+  plan->hasContent = true;
+  plan->changesMarker = true;
+  return sendContents(location, plan, call);
+}
+
+Uploader::Prepared Uploader::sendContents(const FileLocation &location, Plan *plan,
+                                          const CKCallContext &call) {
+  const OwnedDescriptor file = openFile(location);
+  if (!file)
+    return laterWith(plan, NSError::errorWithPOSIXCode(errno, context_.files.absolute(location.path)));
+  AssetUploads::Finished finished;
+  if (plan->file.size <= kInlineSize) {
+    finished = SendContents(context_.cloud, file.get(), plan->file, nullptr, call);
+    inlineBytes_ += plan->file.size;
+  } else {
+    auto taken = assets_.take(plan->entry.item, plan->file, file.get());
+    if (!taken) return laterWith(plan, NSError());
+    finished = std::move(*taken);
+  }
+  if (finished.error) {
+    if (CKErrorIsTransient(finished.error)) {
+      cloudProblem_ = finished.error;
+      return Prepared::later;
+    }
+    const bool changed = CKErrorIs(finished.error, CKErrorCode::assetFileModified);
+    if (!changed) failed(*plan, finished.error);
+    if (changed) laterWith(plan, NSError());
+    return Prepared::later;
+  }
+  plan->document.content.size = plan->file.size;
+  plan->document.content.modified = plan->file.modified;
+  plan->document.content.digest = finished.digest;
+  const Lock lock(mutex_);
+  totals_.bytes += plan->file.size;
+  return Prepared::save;
+}
+
+// Somebody wrote into a document whose other parts aren't here: what was written is kept beside it, and the
+// document stays what it is in the cloud.
+Uploader::Prepared Uploader::restorePartlyWritten(const FileLocation &location, const DocumentLook &look,
+                                                  Plan *plan) {
+  SyncRow row = plan->row;
+  std::string copy;
+  const NSError problem = conflicts_.setAside(location, plan->file, &copy);
+  if (problem) return laterWith(plan, problem);
+  context_.store.uploaded(plan->entry);
+  DocumentMarker marker = *look.marker;
+  marker.state = MarkerState::dataless;
+  PreparedResult prepared =
+      context_.storage.preparePlaceholder(marker, row.content.mode | 0600, {marker.birth, marker.modified});
+  if (prepared.result.isDone())
+    context_.storage.publishNew(prepared.file, location.folder.get(), location.name);
+  const std::string folder = location.path.substr(0, location.path.size() - location.name.size());
+  context_.states.lookAt({location.path, folder + copy});
+  return Prepared::nothing;
+}
+
+// --- What became of it.
+
+void Uploader::saved(const Plan &plan, const CKRecord &record) {
+  SyncRow row = plan.row;
+  row.item = plan.entry.item;
+  row.tag = record.recordChangeTag;
+  row.parent = plan.document.parent;
+  row.name = plan.document.name;
+  row.kind = plan.document.kind;
+  row.content = plan.document.content;
+  row.local = plan.file;
+  row.isDataless = plan.isDataless;
+  if (plan.hasContent) {
+    row.newerTag.clear();
+    row.newer = {};
+  }
+  if (plan.changesMarker) markFile(plan, &row);
+  context_.store.put(row);
+  context_.store.uploaded(plan.entry);
+  const bool hasFile = row.kind == NSFileProviderItemKind::document;
+  context_.states.show({row.item, row.isDataless, true, row.local, hasFile});
+  const Lock lock(mutex_);
+  ++totals_.documents;
+}
+
+// The mark lets the item be found again without any database.
+void Uploader::markFile(const Plan &plan, SyncRow *row) {
+  if (!context_.storage.capabilities().extendedAttributes) return;
+  const auto location = context_.files.locate(plan.entry.item, nullptr);
+  if (!location) return;
+  const OwnedDescriptor file = openFile(*location);
+  if (!file) return;
+  if (row->kind == NSFileProviderItemKind::folder) {
+    WriteMarker(file.get(), DocumentMarker::ofFolder(row->record));
+    return;
+  }
+  const auto facts = ReadFolderFacts(file.get(), 0);
+  if (!facts || !IsSameContents(LocalFileOf(*facts), plan.file)) return;
+  DocumentMarker marker;
+  marker.state = row->isDataless ? MarkerState::dataless : MarkerState::present;
+  marker.recordName = row->record;
+  marker.digest = row->content.digest;
+  marker.size = row->content.size;
+  marker.modified = row->content.modified;
+  if (WriteMarker(file.get(), marker) != 0) return;
+  if (const auto marked = ReadFolderFacts(file.get(), 0)) row->local.changed = marked->changed;
+}
+
+void Uploader::removed(const Plan &plan) {
+  context_.store.erase(plan.row.record);
+  context_.store.uploaded(plan.entry);
+  const Lock lock(mutex_);
+  ++totals_.documents;
+}
+
+void Uploader::saveFailed(const Plan &plan, const NSError &error, Round *round) {
+  if (const auto server = CKErrorServerRecord(error)) {
+    CKRecord sent = plan.hasContent ? MakeRecordWithContent(plan.document) : MakeRecord(plan.document);
+    if (CKServerRecordIsOwnSave(sent, *server, context_.cloud.deviceName())) return saved(plan, *server);
+    round->newerRecords.push_back(*server);
+    context_.store.retryNow(plan.entry.item);
+    return;
+  }
+  if (CKErrorIs(error, CKErrorCode::unknownItem)) {
+    // Deleted in the cloud, and changed here: what was changed here lives.
+    SyncRow row = plan.row;
+    row.tag.clear();
+    row.content = {};
+    context_.store.put(row);
+    context_.store.enqueue(plan.entry.item, false, false);
+    return;
+  }
+  if (CKErrorIs(error, CKErrorCode::assetFileNotFound)) {
+    // The contents were collected before the record named them: they are sent again.
+    SyncRow row = plan.row;
+    row.content.digest.clear();
+    context_.store.put(row);
+  }
+  failed(plan, error);
+}
+
+void Uploader::removeFailed(const Plan &plan, const NSError &error, Round *round) {
+  if (CKErrorIs(error, CKErrorCode::unknownItem)) return removed(plan);
+  if (const auto server = CKErrorServerRecord(error)) {
+    round->newerRecords.push_back(*server);
+    return;
+  }
+  failed(plan, error);
+}
+
+void Uploader::failed(const Plan &plan, const NSError &error) {
+  const std::string path = context_.files.pathOf(plan.entry.item);
+  const NSError told = ErrorForClients(error, path);
+  os_log_error(qvc_default_log(), "[ERROR] can't upload %s: %@", path, error);
+  Plan again = plan;
+  again.entry.attempts = std::max<std::int64_t>(again.entry.attempts, 2);
+  laterWith(&again, told);
+  const Lock lock(mutex_);
+  ++totals_.failed;
+}
+
+}  // namespace droxa::keld

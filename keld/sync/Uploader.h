@@ -1,0 +1,75 @@
+#pragma once
+
+#include <functional>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "keld/sync/AssetUploads.h"
+#include "keld/sync/ConflictCopies.h"
+#include "keld/sync/DocumentRecord.h"
+#include "keld/sync/SyncContext.h"
+
+namespace droxa::keld {
+
+// Sends what is in the queue of uploads: small contents and the records, many in one call, in the order of
+// the changes; large contents through AssetUploads. Thread contract: the sync's thread.
+class Uploader {
+ public:
+  struct Round {
+    std::uint64_t sent = 0;
+    bool moreIsDue = false;
+    std::vector<CKRecord> newerRecords;  // that the cloud has instead of what was sent: to be applied first
+    NSError cloudProblem;                // the cloud couldn't be reached at all
+  };
+
+  Uploader(const SyncContext &context, AssetUploads &assets, ConflictCopies &conflicts);
+
+  // Sends a batch of what is due.
+  Round sendDue(const CKCallContext &call);
+
+  struct Totals {
+    std::uint64_t documents = 0, failed = 0, bytes = 0;
+  };
+  Totals totals() const;
+
+ private:
+  struct Plan {
+    QueuedUpload entry;
+    SyncRow row;
+    DocumentRecord document;
+    LocalFile file;  // that is sent
+    bool isDeletion = false;
+    bool hasContent = false;
+    bool isDataless = false;
+    bool changesMarker = false;
+  };
+  enum class Prepared { save, remove, later, nothing };
+
+  Prepared prepare(const QueuedUpload &entry, Plan *plan, const CKCallContext &call);
+  Prepared prepareDeletion(Plan *plan);
+  Prepared prepareSave(const ItemRecord &item, Plan *plan, const CKCallContext &call);
+  Prepared prepareDocument(const FileLocation &location, Plan *plan, const CKCallContext &call);
+  Prepared prepareLink(const FileLocation &location, Plan *plan);
+  Prepared sendContents(const FileLocation &location, Plan *plan, const CKCallContext &call);
+  Prepared restorePartlyWritten(const FileLocation &location, const DocumentLook &look, Plan *plan);
+  void saved(const Plan &plan, const CKRecord &record);
+  void markFile(const Plan &plan, SyncRow *row);
+  void removed(const Plan &plan);
+  void saveFailed(const Plan &plan, const NSError &error, Round *round);
+  void removeFailed(const Plan &plan, const NSError &error, Round *round);
+  void failed(const Plan &plan, const NSError &error);
+  Prepared laterWith(Plan *plan, const NSError &error);
+
+  const SyncContext &context_;
+  AssetUploads &assets_;
+  ConflictCopies &conflicts_;
+  std::uint64_t inlineBytes_ = 0;  // sent by this round on this thread
+  NSError cloudProblem_;
+  mutable Mutex mutex_;
+  Totals totals_ GUARDED_BY(mutex_);
+};
+
+}  // namespace droxa::keld
