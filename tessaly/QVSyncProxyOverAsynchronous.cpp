@@ -116,6 +116,47 @@ class BlockingProxy final : public QVSyncProxy, public QVProtocol {
   void getStatus(QVStatusReply reply) override {
     wait(reply, [](QVProtocol &daemon, QVStatusReply answer) { daemon.getStatus(std::move(answer)); });
   }
+  void startDownloadAtURL(const NSURL &url, std::uint64_t options, QVTransferReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVTransferReply answer) {
+      daemon.startDownloadAtURL(url, options, std::move(answer));
+    });
+  }
+  void evictItemAtURL(const NSURL &url, QVContentsResultReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVContentsResultReply answer) {
+      daemon.evictItemAtURL(url, std::move(answer));
+    });
+  }
+  void setPinnedAtURL(const NSURL &url, bool isPinned, QVContentsErrorReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVContentsErrorReply answer) {
+      daemon.setPinnedAtURL(url, isPinned, std::move(answer));
+    });
+  }
+  void getContentsStatusAtURL(const NSURL &url, QVContentsStatusReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVContentsStatusReply answer) {
+      daemon.getContentsStatusAtURL(url, std::move(answer));
+    });
+  }
+  void getTransferStatus(QVTransferStatusReply reply) override {
+    wait(reply, [](QVProtocol &daemon, QVTransferStatusReply answer) {
+      daemon.getTransferStatus(std::move(answer));
+    });
+  }
+  void waitForUploadAtURL(const NSURL &url, QVContentsErrorReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVContentsErrorReply answer) {
+      daemon.waitForUploadAtURL(url, std::move(answer));
+    });
+  }
+  void getMoveCapability(const NSURL &source, const NSURL &destination,
+                         QVMoveCapabilityReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVMoveCapabilityReply answer) {
+      daemon.getMoveCapability(source, destination, std::move(answer));
+    });
+  }
+  void confirmDeletions(bool carryOut, QVContentsErrorReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVContentsErrorReply answer) {
+      daemon.confirmDeletions(carryOut, std::move(answer));
+    });
+  }
 
  private:
   template <class... Args, class Call>

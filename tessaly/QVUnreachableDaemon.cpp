@@ -50,6 +50,22 @@ class UnreachableDaemon final : public QVProtocol {
   void signIn(const std::string & /*name*/, QVAccountReply /*reply*/) override { failed_(); }
   void signOut(QVErrorReply /*reply*/) override { failed_(); }
   void getStatus(QVStatusReply /*reply*/) override { failed_(); }
+  void startDownloadAtURL(const NSURL & /*url*/, std::uint64_t /*options*/,
+                          QVTransferReply /*reply*/) override {
+    failed_();
+  }
+  void evictItemAtURL(const NSURL & /*url*/, QVContentsResultReply /*reply*/) override { failed_(); }
+  void setPinnedAtURL(const NSURL & /*url*/, bool /*isPinned*/, QVContentsErrorReply /*reply*/) override {
+    failed_();
+  }
+  void getContentsStatusAtURL(const NSURL & /*url*/, QVContentsStatusReply /*reply*/) override { failed_(); }
+  void getTransferStatus(QVTransferStatusReply /*reply*/) override { failed_(); }
+  void waitForUploadAtURL(const NSURL & /*url*/, QVContentsErrorReply /*reply*/) override { failed_(); }
+  void getMoveCapability(const NSURL & /*source*/, const NSURL & /*destination*/,
+                         QVMoveCapabilityReply /*reply*/) override {
+    failed_();
+  }
+  void confirmDeletions(bool /*carryOut*/, QVContentsErrorReply /*reply*/) override { failed_(); }
 
  private:
   const std::function<void()> failed_;

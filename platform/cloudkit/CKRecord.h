@@ -20,6 +20,9 @@ namespace droxa {
 using CKRecordValue = std::variant<std::monostate, std::int64_t, double, std::string, NSData, NSDate,
                                    std::vector<std::string>, CKAsset>;
 
+// Whether the value stands for none: monostate, or a nil NSData, NSDate or CKAsset.
+bool CKRecordValueIsNone(const CKRecordValue &value);
+
 // One record as a device made it or as the cloud answered it. A record of at most 1 MiB in all, its assets
 // not counted; a larger one is refused with limitExceeded.
 // Thread contract: a value.

@@ -7,6 +7,7 @@
 #include "tessaly/xpc/QVDaemonNotificationReceiving.capnp.h"
 #include "tessaly/xpc/QVItemNotificationReceiving.capnp.h"
 #include "tessaly/xpc/QVItemNotificationSending.capnp.h"
+#include "tessaly/xpc/QVTransfer.capnp.h"
 
 // The objects that the daemon protocol's calls and replies pass along. On the loop; null isn't taken.
 
@@ -21,6 +22,9 @@ schema::QVItemNotificationReceiving::Client exportReceiver(
     Session &session, std::shared_ptr<QVItemNotificationReceiving> receiver);
 std::shared_ptr<QVItemNotificationReceiving> receivedReceiver(
     Session &session, schema::QVItemNotificationReceiving::Client client);
+
+schema::QVTransfer::Client exportTransfer(Session &session, std::shared_ptr<QVTransferring> transfer);
+std::shared_ptr<QVTransfer> receivedTransfer(const RemoteObject &via, schema::QVTransfer::Client client);
 
 schema::QVDaemonNotificationReceiving::Client exportDaemonReceiver(
     Session &session, std::shared_ptr<QVDaemonNotificationReceiving> receiver);

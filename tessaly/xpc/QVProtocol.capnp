@@ -1,10 +1,12 @@
 @0xfcc3f3fc6cee051c;
 
 using Cxx = import "/capnp/c++.capnp";
+using Contents = import "/tessaly/xpc/QVContents.capnp";
 using DaemonNotifications = import "/tessaly/xpc/QVDaemonNotificationReceiving.capnp";
 using Item = import "/tessaly/xpc/QVQueryItem.capnp";
 using Receiving = import "/tessaly/xpc/QVItemNotificationReceiving.capnp";
 using Sending = import "/tessaly/xpc/QVItemNotificationSending.capnp";
+using Transfer = import "/tessaly/xpc/QVTransfer.capnp";
 using Values = import "/platform/xpc/Values.capnp";
 $Cxx.namespace("droxa::schema");
 
@@ -30,6 +32,17 @@ interface QVProtocol {
   signIn @12 (name :Data) -> (account :Account, error :Values.Error);
   signOut @13 () -> (error :Values.Error);
   getStatus @14 () -> (status :Status, error :Values.Error);
+
+  startDownloadAtURL @15 (url :Values.Url, options :UInt64)
+      -> (transfer :Transfer.QVTransfer, error :Values.Error);
+  evictItemAtURL @16 (url :Values.Url) -> (result :Contents.QVContentsResult, error :Values.Error);
+  setPinnedAtURL @17 (url :Values.Url, isPinned :Bool) -> (error :Values.Error);
+  getContentsStatusAtURL @18 (url :Values.Url) -> (status :Contents.QVContentsStatus, error :Values.Error);
+  getTransferStatus @19 () -> (status :Contents.QVTransferStatus, error :Values.Error);
+  waitForUploadAtURL @20 (url :Values.Url) -> (error :Values.Error);  # answered when everything is safe
+  getMoveCapability @21 (source :Values.Url, destination :Values.Url)
+      -> (capability :UInt64, error :Values.Error);
+  confirmDeletions @22 (carryOut :Bool) -> (error :Values.Error);
 
   struct Information {
     key @0 :Data;

@@ -33,6 +33,15 @@ class QVProtocolProxy final : public XPCProxy<schema::QVProtocol, QVProtocol, QV
   void signIn(const std::string &name, QVAccountReply reply) override;
   void signOut(QVErrorReply reply) override;
   void getStatus(QVStatusReply reply) override;
+
+  void startDownloadAtURL(const NSURL &url, std::uint64_t options, QVTransferReply reply) override;
+  void evictItemAtURL(const NSURL &url, QVContentsResultReply reply) override;
+  void setPinnedAtURL(const NSURL &url, bool isPinned, QVContentsErrorReply reply) override;
+  void getContentsStatusAtURL(const NSURL &url, QVContentsStatusReply reply) override;
+  void getTransferStatus(QVTransferStatusReply reply) override;
+  void waitForUploadAtURL(const NSURL &url, QVContentsErrorReply reply) override;
+  void getMoveCapability(const NSURL &source, const NSURL &destination, QVMoveCapabilityReply reply) override;
+  void confirmDeletions(bool carryOut, QVContentsErrorReply reply) override;
 };
 
 }  // namespace droxa

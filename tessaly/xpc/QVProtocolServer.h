@@ -33,6 +33,15 @@ class QVProtocolServer final : public schema::QVProtocol::Server {
   kj::Promise<void> signOut(SignOutContext context) override;
   kj::Promise<void> getStatus(GetStatusContext context) override;
 
+  kj::Promise<void> startDownloadAtURL(StartDownloadAtURLContext context) override;
+  kj::Promise<void> evictItemAtURL(EvictItemAtURLContext context) override;
+  kj::Promise<void> setPinnedAtURL(SetPinnedAtURLContext context) override;
+  kj::Promise<void> getContentsStatusAtURL(GetContentsStatusAtURLContext context) override;
+  kj::Promise<void> getTransferStatus(GetTransferStatusContext context) override;
+  kj::Promise<void> waitForUploadAtURL(WaitForUploadAtURLContext context) override;
+  kj::Promise<void> getMoveCapability(GetMoveCapabilityContext context) override;
+  kj::Promise<void> confirmDeletions(ConfirmDeletionsContext context) override;
+
  private:
   Exported<QVProtocol> exported_;
 };

@@ -1,6 +1,7 @@
 #include "tests/cli/ScriptedHost.h"
 
 #include "platform/xpc/NSXPCConnection.h"
+#include "tessaly/QVUnreachableDaemon.h"
 
 namespace droxa::testing {
 
@@ -60,48 +61,6 @@ class SilentWatch final : public FPDWatch {
   void stop() override {}
 };
 
-// Every call fails in transport.
-template <class... Arguments>
-void failWith(const NSXPCErrorHandler &handler) {
-  handler(NSError(NSCocoaErrorDomain, NSXPCConnectionInvalid));
-}
-
-class AbsentProtocol final : public QVProtocol {
- public:
-  explicit AbsentProtocol(NSXPCErrorHandler handler) : handler_(std::move(handler)) {}
-  void enumerateItemsInFolder(const std::optional<QVFileObjectID> &, std::int64_t, std::uint64_t,
-                              std::uint64_t, QVItemsCompletion) override {
-    failWith(handler_);
-  }
-  void enumerateAllFoldersWithSortOrder(std::int64_t, std::uint64_t, std::uint64_t,
-                                        QVItemsCompletion) override {
-    failWith(handler_);
-  }
-  void currentNotifRankWithReply(QVRankReply) override { failWith(handler_); }
-  void enumerateWorkingSetChangesFromChangeToken(const NSData &, std::uint64_t,
-                                                 QVWorkingSetCompletion) override {
-    failWith(handler_);
-  }
-  void getItemUpdateSenderWithReceiver(std::shared_ptr<QVItemNotificationReceiving>, QVSenderReply) override {
-    failWith(handler_);
-  }
-  void getURLForItemIdentifier(const std::string &, QVURLReply) override { failWith(handler_); }
-  void getURLForFileObjectID(const QVFileObjectID &, QVURLReply) override { failWith(handler_); }
-  void getQueryItemForURL(const NSURL &, bool, QVItemReply) override { failWith(handler_); }
-  void getContainerItem(const std::string &, bool, QVItemReply) override { failWith(handler_); }
-  void getContainers(QVContainersReply) override { failWith(handler_); }
-  void subscribeToNotifications(std::shared_ptr<QVDaemonNotificationReceiving>, QVErrorReply) override {
-    failWith(handler_);
-  }
-  void getAccount(QVAccountReply) override { failWith(handler_); }
-  void signIn(const std::string &, QVAccountReply) override { failWith(handler_); }
-  void signOut(QVErrorReply) override { failWith(handler_); }
-  void getStatus(QVStatusReply) override { failWith(handler_); }
-
- private:
-  const NSXPCErrorHandler handler_;
-};
-
 }  // namespace
 
 void ScriptedHost::itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion) {
@@ -146,7 +105,8 @@ std::shared_ptr<FPDControlProtocol> ScriptedHostConnecting::control(NSXPCErrorHa
 }
 
 std::shared_ptr<QVProtocol> AbsentDaemon::remoteObjectProxyWithErrorHandler(NSXPCErrorHandler handler) {
-  return std::make_shared<AbsentProtocol>(std::move(handler));
+  return QVUnreachableDaemon(
+      [handler = std::move(handler)] { handler(NSError(NSCocoaErrorDomain, NSXPCConnectionInvalid)); });
 }
 
 CommandFixture::CommandFixture() {

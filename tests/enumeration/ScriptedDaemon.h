@@ -86,6 +86,14 @@ class ScriptedDaemon final : public QVDaemonConnection {
     void signIn(const std::string &, QVAccountReply) override { unexpected(); }
     void signOut(QVErrorReply) override { unexpected(); }
     void getStatus(QVStatusReply) override { unexpected(); }
+    void startDownloadAtURL(const NSURL &, std::uint64_t, QVTransferReply) override { unexpected(); }
+    void evictItemAtURL(const NSURL &, QVContentsResultReply) override { unexpected(); }
+    void setPinnedAtURL(const NSURL &, bool, QVContentsErrorReply) override { unexpected(); }
+    void getContentsStatusAtURL(const NSURL &, QVContentsStatusReply) override { unexpected(); }
+    void getTransferStatus(QVTransferStatusReply) override { unexpected(); }
+    void waitForUploadAtURL(const NSURL &, QVContentsErrorReply) override { unexpected(); }
+    void getMoveCapability(const NSURL &, const NSURL &, QVMoveCapabilityReply) override { unexpected(); }
+    void confirmDeletions(bool, QVContentsErrorReply) override { unexpected(); }
     static void unexpected() { ADD_FAILURE() << "a call that this test doesn't expect"; }
   };
 

@@ -58,5 +58,10 @@ INSTANTIATE_TEST_SUITE_P(Keld, DaemonConformance,
                                          DaemonWorldMaker{"Inotify", byInotify},
                                          DaemonWorldMaker{"Scanning", byScanning}),
                          ConformanceName);
+INSTANTIATE_TEST_SUITE_P(Keld, DaemonContentsConformance,
+                         testing::Values(DaemonWorldMaker{"BestWatcher", byFanotify},
+                                         DaemonWorldMaker{"Inotify", byInotify},
+                                         DaemonWorldMaker{"Scanning", byScanning}),
+                         ConformanceName);
 
 }  // namespace droxa

@@ -2,8 +2,10 @@
 
 #include <atomic>
 #include <cstdint>
+#include <map>
 #include <memory>
 #include <optional>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -15,6 +17,7 @@
 #include "tests/support/FakeDrive.h"
 #include "tests/support/FakeItemNotificationSender.h"
 #include "tests/support/FakeReplies.h"
+#include "tests/support/FakeTransfer.h"
 
 namespace droxa {
 
@@ -35,6 +38,7 @@ class FakeDaemon final : public QVProtocol, public std::enable_shared_from_this<
 
   // Changes of the drive; a path that doesn't fit fails the test.
   QVFileObjectID addDocument(const std::string &path, std::uint64_t size = 0);
+  QVFileObjectID addDatalessDocument(const std::string &path, std::uint64_t size = 0);
   QVFileObjectID addFolder(const std::string &path);
   QVFileObjectID addAlias(const std::string &path);
   QVFileObjectID addSymbolicLink(const std::string &path);
@@ -49,6 +53,21 @@ class FakeDaemon final : public QVProtocol, public std::enable_shared_from_this<
   void setReadable(const std::string &path, bool readable);
   // Who is signed in, without a notification.
   void setAccount(std::optional<QVAccountDescription> account);
+
+  // What makes an eviction refused.
+  void setUnsent(const std::string &path, bool unsent);
+  void setInUse(const std::string &path, bool inUse);
+  // The answer to every question about a move; nullopt: by the drive (tessaly/QVMoveCapability.h).
+  void setMoveCapability(std::optional<std::uint64_t> capability);
+
+  // Downloads. One ends before its startDownloadAtURL returns, as replies().failNext("download", …) says, or
+  // after replies().hold("download") when the test says, all by release() or one by one:
+  void progressDownload(const std::string &path, std::uint64_t bytes);
+  void finishDownload(const std::string &path);
+  void failDownload(const std::string &path, const NSError &error);
+  bool isDownloading(const std::string &path) const;
+  std::size_t interests(const std::string &path) const;  // in the document's download
+  std::size_t downloadsStarted() const;
 
   std::shared_ptr<const QVQueryItem> item(const std::string &path) const;
   QVFileObjectID identifier(const std::string &path) const;
@@ -89,13 +108,46 @@ class FakeDaemon final : public QVProtocol, public std::enable_shared_from_this<
   void signOut(QVErrorReply reply) override;
   void getStatus(QVStatusReply reply) override;
 
+  void startDownloadAtURL(const NSURL &url, std::uint64_t options, QVTransferReply reply) override;
+  void evictItemAtURL(const NSURL &url, QVContentsResultReply reply) override;
+  void setPinnedAtURL(const NSURL &url, bool isPinned, QVContentsErrorReply reply) override;
+  void getContentsStatusAtURL(const NSURL &url, QVContentsStatusReply reply) override;
+  void getTransferStatus(QVTransferStatusReply reply) override;
+  void waitForUploadAtURL(const NSURL &url, QVContentsErrorReply reply) override;
+  void getMoveCapability(const NSURL &source, const NSURL &destination, QVMoveCapabilityReply reply) override;
+  void confirmDeletions(bool carryOut, QVContentsErrorReply reply) override;
+
  private:
+  friend class FakeTransfer;
+  // One document on its way.
+  struct Download {
+    std::uint64_t serial = 0;  // a later download of the same document is another one
+    std::uint64_t bytes = 0;
+    bool isPinned = false;                                           // wanted without an interest
+    std::map<std::uint64_t, std::weak_ptr<FakeTransfer>> interests;  // by the transfers' indices
+  };
+  struct UploadWaiter {
+    std::set<std::uint64_t> documents;
+    QVContentsErrorReply reply;
+  };
+
   explicit FakeDaemon(std::string replica);
   NSError begin(const char *operation, const std::string &arguments);
   NSError loggedOut() const REQUIRES(mutex_);
   template <class Change>
   void change(const std::string &what, const Change &change);
   void tellSenders(const std::vector<FakeDriveChange> &changes);
+  NSError findItem(const NSURL &url, std::uint64_t *number) const REQUIRES(mutex_);
+  std::uint64_t beginDownload(std::uint64_t number) REQUIRES(mutex_);
+  NSError refusalToEvict(std::uint64_t number) const REQUIRES(mutex_);
+  QVContentsStatus documentStatus(std::uint64_t number) const REQUIRES(mutex_);
+  std::uint64_t moveCapability(std::uint64_t source, const NSURL &destination) const REQUIRES(mutex_);
+  void runDownload(std::uint64_t number, std::uint64_t serial);
+  bool isCurrentDownload(std::uint64_t number, std::uint64_t serial) const;
+  void endDownload(std::uint64_t number, std::uint64_t serial, const NSError &error);
+  std::pair<std::uint64_t, std::uint64_t> downloadAt(const std::string &path) const;
+  void releaseInterest(std::uint64_t transfer, const std::set<std::uint64_t> &documents);
+  std::uint64_t bytesLeft(const std::set<std::uint64_t> &documents) const;
 
   const std::shared_ptr<CallLog> log_ = std::make_shared<CallLog>();
   const std::shared_ptr<FakeReplies> replies_ = std::make_shared<FakeReplies>();
@@ -106,6 +158,12 @@ class FakeDaemon final : public QVProtocol, public std::enable_shared_from_this<
   std::optional<QVAccountDescription> account_ GUARDED_BY(mutex_);
   std::vector<std::shared_ptr<FakeItemNotificationSender>> senders_ GUARDED_BY(mutex_);
   std::vector<std::shared_ptr<QVDaemonNotificationReceiving>> subscribers_ GUARDED_BY(mutex_);
+  std::map<std::uint64_t, Download> downloads_ GUARDED_BY(mutex_);  // by the documents' numbers
+  std::size_t downloadsStarted_ GUARDED_BY(mutex_) = 0;
+  std::size_t transfersMade_ GUARDED_BY(mutex_) = 0;
+  QVTransferCounts downloadCounts_ GUARDED_BY(mutex_);
+  std::vector<UploadWaiter> uploadWaiters_ GUARDED_BY(mutex_);
+  std::optional<std::uint64_t> moveCapability_ GUARDED_BY(mutex_);
 };
 
 }  // namespace droxa

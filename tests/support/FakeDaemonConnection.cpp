@@ -34,6 +34,57 @@ struct FakeDaemonConnection::State {
   }
 };
 
+// Ends each call by its reply or by the error handler, whichever comes first.
+template <class... Args>
+std::function<void(Args...)> trackedCall(const std::shared_ptr<FakeDaemonConnection::State> &state,
+                                         const NSXPCErrorHandler &handler,
+                                         std::function<void(Args...)> reply) {
+  return [state, call = state->begin(handler), reply = std::move(reply)](Args... args) {
+    if (state->end(call)) reply(args...);
+  };
+}
+
+// A transfer as it comes over the connection.
+class FakeConnectedTransfer final : public QVTransfer {
+ public:
+  FakeConnectedTransfer(std::shared_ptr<FakeDaemon> daemon,
+                        std::shared_ptr<FakeDaemonConnection::State> state,
+                        std::shared_ptr<QVTransferring> transfer, NSXPCErrorHandler handler)
+      : daemon_(std::move(daemon)),
+        state_(std::move(state)),
+        transfer_(std::move(transfer)),
+        handler_(std::move(handler)) {}
+
+  void waitWithReply(QVContentsErrorReply reply) override {
+    if (failed("waitWithReply")) return;
+    transfer_->waitWithReply(trackedCall(state_, handler_, std::move(reply)));
+  }
+  void getProgress(QVProgressReply reply) override {
+    if (failed("getProgress")) return;
+    transfer_->getProgress(trackedCall(state_, handler_, std::move(reply)));
+  }
+  void cancel() override {
+    if (!failed("cancel")) transfer_->cancel();
+  }
+  std::shared_ptr<QVTransferring> remoteObjectProxyWithErrorHandler(NSXPCErrorHandler handler) override {
+    return std::make_shared<FakeConnectedTransfer>(daemon_, state_, transfer_, std::move(handler));
+  }
+
+ private:
+  bool failed(const char *operation) {
+    const NSError failure = daemon_->replies().takeTransportFailure(operation);
+    if (!failure) return false;
+    daemon_->log().add(std::string(operation) + " failed in transport");
+    daemon_->replies().give(operation, [handler = handler_, failure] { handler(failure); });
+    return true;
+  }
+
+  const std::shared_ptr<FakeDaemon> daemon_;
+  const std::shared_ptr<FakeDaemonConnection::State> state_;
+  const std::shared_ptr<QVTransferring> transfer_;
+  const NSXPCErrorHandler handler_;
+};
+
 // One proxy of the daemon: each call is ended by its reply or by the error handler.
 class FakeDaemonProxy final : public QVProtocol {
  public:
@@ -107,6 +158,45 @@ class FakeDaemonProxy final : public QVProtocol {
     if (failed("getStatus")) return;
     daemon_->getStatus(tracked(std::move(reply)));
   }
+  void startDownloadAtURL(const NSURL &url, std::uint64_t options, QVTransferReply reply) override {
+    if (failed("startDownloadAtURL")) return;
+    const QVTransferReply wrapped = [daemon = daemon_, state = state_, handler = handler_,
+                                     answer = std::move(reply)](const std::shared_ptr<QVTransfer> &transfer,
+                                                                const NSError &error) {
+      answer(transfer ? std::make_shared<FakeConnectedTransfer>(daemon, state, transfer, handler) : nullptr,
+             error);
+    };
+    daemon_->startDownloadAtURL(url, options, tracked(wrapped));
+  }
+  void evictItemAtURL(const NSURL &url, QVContentsResultReply reply) override {
+    if (failed("evictItemAtURL")) return;
+    daemon_->evictItemAtURL(url, tracked(std::move(reply)));
+  }
+  void setPinnedAtURL(const NSURL &url, bool isPinned, QVContentsErrorReply reply) override {
+    if (failed("setPinnedAtURL")) return;
+    daemon_->setPinnedAtURL(url, isPinned, tracked(std::move(reply)));
+  }
+  void getContentsStatusAtURL(const NSURL &url, QVContentsStatusReply reply) override {
+    if (failed("getContentsStatusAtURL")) return;
+    daemon_->getContentsStatusAtURL(url, tracked(std::move(reply)));
+  }
+  void getTransferStatus(QVTransferStatusReply reply) override {
+    if (failed("getTransferStatus")) return;
+    daemon_->getTransferStatus(tracked(std::move(reply)));
+  }
+  void waitForUploadAtURL(const NSURL &url, QVContentsErrorReply reply) override {
+    if (failed("waitForUploadAtURL")) return;
+    daemon_->waitForUploadAtURL(url, tracked(std::move(reply)));
+  }
+  void getMoveCapability(const NSURL &source, const NSURL &destination,
+                         QVMoveCapabilityReply reply) override {
+    if (failed("getMoveCapability")) return;
+    daemon_->getMoveCapability(source, destination, tracked(std::move(reply)));
+  }
+  void confirmDeletions(bool carryOut, QVContentsErrorReply reply) override {
+    if (failed("confirmDeletions")) return;
+    daemon_->confirmDeletions(carryOut, tracked(std::move(reply)));
+  }
 
  private:
   bool failed(const char *operation) {
@@ -119,9 +209,7 @@ class FakeDaemonProxy final : public QVProtocol {
   }
   template <class... Args>
   std::function<void(Args...)> tracked(std::function<void(Args...)> reply) {
-    return [state = state_, call = state_->begin(handler_), reply = std::move(reply)](Args... args) {
-      if (state->end(call)) reply(args...);
-    };
+    return trackedCall(state_, handler_, std::move(reply));
   }
 
   const std::shared_ptr<FakeDaemon> daemon_;

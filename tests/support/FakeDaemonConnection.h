@@ -16,6 +16,7 @@ namespace droxa {
 // (breakOff). Thread contract: any thread.
 class FakeDaemonConnection final : public QVDaemonConnection {
  public:
+  struct State;
   explicit FakeDaemonConnection(std::shared_ptr<FakeDaemon> daemon);
   ~FakeDaemonConnection() override;
 
@@ -36,7 +37,6 @@ class FakeDaemonConnection final : public QVDaemonConnection {
 
  private:
   friend class FakeDaemonProxy;
-  struct State;
   const std::shared_ptr<FakeDaemon> daemon_;
   const std::shared_ptr<State> state_;
 };

@@ -17,6 +17,11 @@ void FakeDaemonWorld::makeFile(const NSURL &url, std::size_t size) {
   fake_->addDocument(url.path(), size);
 }
 
+bool FakeDaemonWorld::addDatalessDocument(const NSURL &url, const std::string &contents) {
+  fake_->addDatalessDocument(url.path(), contents.size());
+  return true;
+}
+
 void FakeDaemonWorld::changeFile(const NSURL &url, std::size_t size, std::int64_t seconds) {
   fake_->setContents(url.path(), size, seconds * 1'000'000'000);
 }

@@ -21,6 +21,7 @@ class FakeDaemonWorld final : public DaemonWorld {
   FakeDaemon &fake() { return *fake_; }
   NSURL documents(const std::string &containerID) override;
   void makeFile(const NSURL &url, std::size_t size) override;
+  bool addDatalessDocument(const NSURL &url, const std::string &contents) override;
   void changeFile(const NSURL &url, std::size_t size, std::int64_t seconds) override;
   void makeFolder(const NSURL &url) override;
   void makeAlias(const NSURL &url, const NSURL &target) override;

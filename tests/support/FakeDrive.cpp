@@ -55,6 +55,7 @@ bool FakeDrive::add(const std::string &path, const Attributes &attributes,
   node.kind = attributes.kind;
   node.size = attributes.size;
   node.modified = attributes.modifiedNanoseconds;
+  node.contents.isDataless = attributes.isDataless;
   const std::uint64_t number = insert(std::move(node));
   changes.push_back({item(number), {}, foldersAbove(number)});
   return true;
@@ -303,6 +304,7 @@ std::shared_ptr<const QVQueryItem> FakeDrive::itemOf(const Node &node) const {
   fields.changeRank = node.rank;
   fields.isTrashed = !node.isContainer && containerOf(node) == QVUbiquitousTrashContainerID;
   fields.isExcludedFromSync = isExcluded(node);
+  fields.isDownloaded = !node.contents.isDataless;
   return std::make_shared<const QVQueryItem>(fileObjectID, std::move(fields));
 }
 

@@ -39,6 +39,7 @@ class FakeDrive {
     std::uint64_t size = 0;
     std::int64_t modifiedNanoseconds = 1'700'000'000'000'000'000;
     std::optional<std::uint64_t> number;  // of the identifier; the next one by default
+    bool isDataless = false;
   };
   // What changed is appended to `changes`. False, changing nothing, for a path that doesn't fit: a missing
   // parent folder or item, a name that is taken.
@@ -50,6 +51,24 @@ class FakeDrive {
   bool addContainer(const std::string &containerID, std::vector<FakeDriveChange> &changes);
   bool removeContainer(const std::string &containerID, std::vector<FakeDriveChange> &changes);
   void setReadable(const std::string &path, bool readable);
+
+  // What the daemon knows of a document's contents; of a folder, `isPinned` alone means something.
+  struct Contents {
+    bool isDataless = false;
+    bool isPinned = false;
+    bool isUnsent = false;  // the cloud doesn't have them
+    bool isInUse = false;
+    NSError lastFailure;
+  };
+  Contents &contents(std::uint64_t number) { return nodes_.at(number).contents; }
+  const Contents &contents(std::uint64_t number) const { return nodes_.at(number).contents; }
+  bool isPinned(std::uint64_t number) const;  // itself, or a folder above it
+  std::uint64_t size(std::uint64_t number) const { return nodes_.at(number).size; }
+  bool exists(std::uint64_t number) const { return nodes_.count(number) != 0; }
+  // A document, or those below a folder.
+  std::vector<std::uint64_t> documentsAt(std::uint64_t number) const;
+  // The item's properties changed, but not its contents.
+  void touch(std::uint64_t number, std::vector<FakeDriveChange> &changes);
 
   // Questions. Zero or null: there is no such item.
   std::uint64_t numberAtPath(const std::string &path) const;
@@ -88,6 +107,7 @@ class FakeDrive {
     std::uint64_t rank = 0;
     bool isContainer = false;
     bool readable = true;
+    Contents contents;
   };
 
   std::optional<std::pair<std::uint64_t, std::string>> parentAndName(const std::string &path) const;

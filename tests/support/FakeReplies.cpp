@@ -40,6 +40,18 @@ void FakeReplies::checkName(const std::string &operation) {
       "boostPriority",
       "watchItemAtURL",
       "invalidate",
+      "startDownloadAtURL",
+      "evictItemAtURL",
+      "setPinnedAtURL",
+      "getContentsStatusAtURL",
+      "getTransferStatus",
+      "waitForUploadAtURL",
+      "getMoveCapability",
+      "confirmDeletions",
+      "waitWithReply",
+      "getProgress",
+      "cancel",
+      "download",  // the end of a document's download
   };
   if (known.count(operation) == 0) ADD_FAILURE() << "the daemon has no operation " << operation;
 }

@@ -31,5 +31,10 @@ INSTANTIATE_TEST_SUITE_P(Fake, DaemonConformance,
                                          maker("FromAnotherThread", fromAnotherThread),
                                          maker("ThroughItsConnection", throughItsConnection)),
                          ConformanceName);
+INSTANTIATE_TEST_SUITE_P(Fake, DaemonContentsConformance,
+                         testing::Values(maker("AtOnce", nullptr),
+                                         maker("FromAnotherThread", fromAnotherThread),
+                                         maker("ThroughItsConnection", throughItsConnection)),
+                         ConformanceName);
 
 }  // namespace droxa

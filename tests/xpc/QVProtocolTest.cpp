@@ -37,5 +37,8 @@ DaemonWorldMaker maker(const char *name, bool answerFromAnotherThread) {
 INSTANTIATE_TEST_SUITE_P(OverConnection, DaemonConformance,
                          testing::Values(maker("AtOnce", false), maker("FromAnotherThread", true)),
                          ConformanceName);
+INSTANTIATE_TEST_SUITE_P(OverConnection, DaemonContentsConformance,
+                         testing::Values(maker("AtOnce", false), maker("FromAnotherThread", true)),
+                         ConformanceName);
 
 }  // namespace droxa

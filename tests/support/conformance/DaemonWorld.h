@@ -24,6 +24,8 @@ class DaemonWorld {
   // The documents folder of a container.
   virtual NSURL documents(const std::string &containerID) = 0;
   virtual void makeFile(const NSURL &url, std::size_t size) = 0;
+  // A document whose contents the cloud has and this machine doesn't; false when this world can't make one.
+  virtual bool addDatalessDocument(const NSURL & /*url*/, const std::string & /*contents*/) { return false; }
   // Gives a file other contents of that size; its date becomes `seconds` since 1970.
   virtual void changeFile(const NSURL &url, std::size_t size, std::int64_t seconds) = 0;
   virtual void makeFolder(const NSURL &url) = 0;
