@@ -268,8 +268,10 @@ void Keeper::step(Work &work) {
   edits_->compactTombstones(options_.mostTombstones);
   edits_->writeCounters();
   transaction.commit();
+  bool isAdvanced = false;
   {
     const Lock lock(mutex_);
+    isAdvanced = committed_.rank != edits_->counters().rank;
     committed_ = edits_->counters();
   }
   // Told only now: readers see what is committed.
@@ -279,6 +281,7 @@ void Keeper::step(Work &work) {
     scannedThrough_ = std::max<ItemNumber>(scannedThrough_, walkedThrough_);
   const auto after = containers_.current();
   if (!changes.empty()) listener_.itemsChanged(changes, *before, *after, *queries_);
+  if (isAdvanced) listener_.feedAdvanced();
   if (containers.list) listener_.containerListChanged();
   for (auto &job : work.jobs) dispatch_async_global(std::move(job.second));
 }

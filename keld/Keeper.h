@@ -34,6 +34,7 @@ class KeeperListener {
   virtual ~KeeperListener() = default;
   virtual void itemsChanged(const std::vector<ItemChange> &changes, const Containers &before,
                             const Containers &after, ItemQueries &queries) = 0;
+  virtual void feedAdvanced() = 0;  // there are newer ranks than before, told of as changes or not
   virtual void containerListChanged() = 0;
   virtual bool wantsChanges() = 0;  // whether anybody would be told
   // The database failed for good; the keeper has stopped.

@@ -8,6 +8,8 @@
 
 #include "keld/KeldSession.h"
 #include "keld/Schema.h"
+#include "keld/sync/DeviceName.h"
+#include "platform/cloudkit/EmbeddedCloud.h"
 #include "platform/foundation/NSDate.h"
 #include "tessaly/QVErrors.h"
 #include "tessaly/QVLog.h"
@@ -53,9 +55,43 @@ void Keld::open() {
   account_ = std::make_unique<AccountKeeper>(
       home_.configuration(), [this](const std::string &name) { return identifierForAccount(name); });
   keeper_->start();
+  openSync();
   const NSError error = account_->load();
   if (error) os_log_error(qvc_default_log(), "[ERROR] can't read the account: %@", error);
   offerLocalAccount(!wasDamaged && !error);
+  accountChanged();
+}
+
+void Keld::openSync() {
+  SyncOptions options = options_.sync;
+  if (options.device.empty()) options.device = DeviceName(home_);
+  std::shared_ptr<CKCloud> cloud = options.cloud;
+  if (!cloud) {
+    const std::string folder = options.cloudFolder.empty() ? home_.root() + "/cloud" : options.cloudFolder;
+    NSError error;
+    cloud = EmbeddedCloud::open(folder, AccountKeeper::localUserName(), options.device, &error);
+    if (!cloud) throw std::runtime_error(error.localizedDescription());
+  }
+  const auto readItems = [this](const std::function<void(ItemQueries &)> &work) {
+    return read([&](ItemQueries &queries, const ItemPresenter &) { work(queries); });
+  };
+  sync_ = std::make_shared<SyncEngine>(
+      replicaPath_, home_.state() + "/sync.sqlite", std::move(cloud), [this] { return keeper_.get(); },
+      readItems, options);
+  ContentsServiceHost host;
+  host.replicaPath = replicaPath_;
+  host.keeper = [this]() -> Keeper & { return *keeper_; };
+  host.read = readItems;
+  host.pathBelowReplica = [this](const NSURL &url) { return pathBelowReplica(url); };
+  host.isSignedIn = [this] { return account_->isSignedIn(); };
+  contents_ = std::make_shared<ContentsService>(std::move(host), sync_);
+  std::string itemDatabase;
+  (void)readItems([&](ItemQueries &queries) { itemDatabase = queries.metaText("uuid"); });
+  sync_->start(itemDatabase);
+}
+
+void Keld::accountChanged() {
+  sync_->setSignedIn(account_->isSignedIn());
 }
 
 // A home that is used for the first time works at once. Who signed out there stays signed out: the database
@@ -87,9 +123,9 @@ std::string Keld::identifierForAccount(const std::string &name) {
   (void)read([&](ItemQueries &queries, const ItemPresenter &) { known = queries.metaText(key); });
   if (!known.empty()) return known;
   uuid_t uuid;
-  uuid_generate(uuid);
+  ::uuid_generate(uuid);
   char text[37];
-  uuid_unparse_lower(uuid, text);
+  ::uuid_unparse_lower(uuid, text);
   const std::string made = text;
   performAndWait([&](ItemEdits &edits) { edits.setMetaText(key, made); });
   return made;
@@ -97,6 +133,7 @@ std::string Keld::identifierForAccount(const std::string &name) {
 
 void Keld::stop() {
   if (stopped_.exchange(true)) return;
+  if (sync_) sync_->stop();
   if (keeper_) keeper_->stop();
 }
 
@@ -158,6 +195,10 @@ QVDaemonStatus Keld::status() {
 void Keld::itemsChanged(const std::vector<ItemChange> &changes, const Containers &before,
                         const Containers &after, ItemQueries &queries) {
   senders_.publish(changes, before, after, queries);
+}
+
+void Keld::feedAdvanced() {
+  if (sync_) sync_->itemsChanged();
 }
 
 void Keld::containerListChanged() {

@@ -14,6 +14,7 @@
 #include "keld/NotificationHub.h"
 #include "keld/ReaderPool.h"
 #include "keld/UpdateSenders.h"
+#include "keld/sync/ContentsService.h"
 #include "platform/foundation/Paths.h"
 #include "tessaly/QVProtocol.h"
 
@@ -21,6 +22,7 @@ namespace droxa::keld {
 
 struct KeldOptions {
   KeeperOptions keeper;
+  SyncOptions sync;
   // Called once, on a thread of the daemon, when it can't go on: its program ends then.
   std::function<void(const std::string &why)> failed;
 };
@@ -53,6 +55,9 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   AccountKeeper &account() { return *account_; }
   UpdateSenders &senders() { return senders_; }
   QVContentsProtocol &contents() { return *contents_; }
+  SyncEngine &sync() { return *sync_; }
+  // Whether anybody is signed in has changed.
+  void accountChanged();
   std::shared_ptr<const Containers> containers() const { return containers_.current(); }
   const std::string &replicaPath() const { return replicaPath_; }
   // The part of the URL's path below the replica; nullopt for one outside of it, or the replica itself.
@@ -62,6 +67,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   // KeeperListener.
   void itemsChanged(const std::vector<ItemChange> &changes, const Containers &before, const Containers &after,
                     ItemQueries &queries) override;
+  void feedAdvanced() override;
   void containerListChanged() override;
   bool wantsChanges() override;
   void keeperFailed(const std::string &why) override;
@@ -75,6 +81,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
  private:
   Keld(const DroxaHome &home, KeldOptions options);
   void open();
+  void openSync();
   void offerLocalAccount(bool mayOffer);
   std::string identifierForAccount(const std::string &name);
   void performAndWait(const std::function<void(ItemEdits &edits)> &edit);
@@ -92,7 +99,8 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   std::unique_ptr<ReaderPool> readers_;
   std::unique_ptr<AccountKeeper> account_;
   std::unique_ptr<Keeper> keeper_;
-  std::unique_ptr<QVContentsProtocol> contents_;
+  std::shared_ptr<SyncEngine> sync_;
+  std::shared_ptr<QVContentsProtocol> contents_;
   std::atomic<bool> stopped_{false};
 };
 

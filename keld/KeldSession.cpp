@@ -242,13 +242,17 @@ void KeldSession::getAccount(QVAccountReply reply) {
 void KeldSession::signIn(const std::string &name, QVAccountReply reply) {
   const NSError error = daemon_->account().signIn(name);
   if (error) return reply(std::nullopt, error);
+  daemon_->accountChanged();
   daemon_->notifications().post(QVAccountTokenDidChangeNotification);
   reply(daemon_->account().account(), NSError());
 }
 
 void KeldSession::signOut(QVErrorReply reply) {
   const NSError error = daemon_->account().signOut();
-  if (!error) daemon_->notifications().post(QVAccountTokenDidChangeNotification);
+  if (!error) {
+    daemon_->accountChanged();
+    daemon_->notifications().post(QVAccountTokenDidChangeNotification);
+  }
   reply(error);
 }
 

@@ -232,9 +232,9 @@ void Reconciler::refresh(ItemRecord record, const FileFacts &facts) {
   if (becameAccessible && !isIdentical) foldersToScan_.push_back(record.id);
   if (isIdentical) return;
   // Whatever was written here, the cloud doesn't have it yet.
-  const bool isWritten = !record.isFolder() && (record.facts.size != facts.size ||
-                                                record.facts.modified != facts.modified ||
-                                                record.facts.inode != facts.inode);
+  const bool isWritten =
+      !record.isFolder() && (record.facts.size != facts.size || record.facts.modified != facts.modified ||
+                             record.facts.inode != facts.inode);
   if (isWritten) record.flags &= ~kUploadedFlag;
   record.facts = facts;
   if (looksTheSame || isUnlistedStructure(record)) return edits_.updateSilently(record);

@@ -14,6 +14,9 @@
 
 #include "keld/Keld.h"
 #include "keld/KeldListener.h"
+#include "keld/sync/CloudImport.h"
+#include "keld/sync/DeviceName.h"
+#include "platform/cloudkit/EmbeddedCloud.h"
 #include "platform/foundation/Paths.h"
 #include "tessaly/QVLog.h"
 
@@ -22,6 +25,9 @@ namespace {
 
 struct Arguments {
   std::optional<std::string> home;
+  std::string cloud;       // "": the home's own
+  std::string importFrom;  // "": serve
+  std::string device;
   WatcherKind watcher = WatcherKind::best;
   bool foreground = true;
 };
@@ -45,6 +51,8 @@ int serve(const Arguments &arguments, int signals) {
   const int failure = ::eventfd(0, EFD_CLOEXEC);
   KeldOptions options;
   options.keeper.watcher = arguments.watcher;
+  options.sync.cloudFolder = arguments.cloud;
+  options.sync.device = arguments.device;
   options.failed = [failure](const std::string &) {
     const std::uint64_t one = 1;
     (void)!::write(failure, &one, sizeof one);
@@ -67,6 +75,26 @@ int serve(const Arguments &arguments, int signals) {
   return wasAsked ? EX_OK : EX_SOFTWARE;
 }
 
+// Puts a folder's documents into the home's cloud, and says what it did, the last line in full.
+int importFolder(const Arguments &arguments) {
+  const DroxaHome home = DroxaHome::resolve(arguments.home);
+  std::string problem;
+  if (!home.create(&problem)) return fail(problem, EX_CANTCREAT);
+  const std::string folder = arguments.cloud.empty() ? home.root() + "/cloud" : arguments.cloud;
+  const std::string device = arguments.device.empty() ? DeviceName(home) : arguments.device;
+  NSError error;
+  const auto cloud = EmbeddedCloud::open(folder, AccountKeeper::localUserName(), device, &error);
+  if (!cloud) return fail(folder + ": " + error.localizedDescription(), EX_UNAVAILABLE);
+  const ImportReport report =
+      ImportIntoCloud(*cloud, arguments.importFrom, {home.root(), folder}, [](const ImportReport &so) {
+        std::cout << so.documents << " documents, " << so.folders << " folders, " << so.bytes << " bytes"
+                  << std::endl;
+      });
+  for (const std::string &left : report.problems) std::cerr << "keld: left out " << left << "\n";
+  if (report.error) return fail(report.error.localizedDescription(), EX_IOERR);
+  return EX_OK;
+}
+
 int run(int argc, char **argv) {
   CLI::App app("keld keeps the item database of a drive in line with its documents, and serves it.", "keld");
   Arguments arguments;
@@ -82,6 +110,14 @@ int run(int argc, char **argv) {
       ->envname("DROXA_WATCHER")
       ->transform(CLI::CheckedTransformer(kinds, CLI::ignore_case))
       ->option_text("KIND");
+  app.add_option("--cloud", arguments.cloud, "The folder that the drive's cloud is in (default: the home's)")
+      ->envname("DROXA_CLOUD")
+      ->option_text("DIR");
+  app.add_option("--device", arguments.device, "What this device is called (default: the machine's name)")
+      ->option_text("NAME");
+  app.add_option("--import", arguments.importFrom,
+                 "Put the documents of a folder into the cloud, and end; the folder is only read")
+      ->option_text("FOLDER");
   app.add_flag("--foreground,!--no-foreground", arguments.foreground,
                "Stay in the foreground, which it always does");
   try {
@@ -90,6 +126,7 @@ int run(int argc, char **argv) {
     return app.exit(error) == 0 ? EX_OK : 2;
   }
   if (homeOption->count() > 0) arguments.home = home;
+  if (!arguments.importFrom.empty()) return importFolder(arguments);
 
   // Blocked before the first thread is made, so that they are taken from the descriptor alone.
   sigset_t ending;

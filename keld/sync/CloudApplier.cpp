@@ -9,6 +9,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include "platform/cloudkit/CKDigest.h"
 #include "tessaly/QVLog.h"
 
 namespace droxa::keld {

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <system_error>
+#include <utility>
 
 #include "keld/sync/CloudErrors.h"
 #include "platform/dispatch/dispatch.h"
@@ -85,6 +86,8 @@ void SyncEngine::stop() {
     waiters.swap(waiters_);
     fetchers.swap(fetchers_);
   }
+  for (Waiter &waiter : waiting_) waiters.push_back(std::move(waiter));
+  waiting_.clear();
   const NSError error = qvc_error(QVErrorShuttingDown, "the daemon is shutting down");
   for (Waiter &waiter : waiters)
     dispatch_async_global([done = std::move(waiter.done), error] { done(error); });
@@ -223,6 +226,9 @@ void SyncEngine::round() {
     fetches = hasCloudNews_ || std::chrono::steady_clock::now() >= nextPoll_;
     hasCloudNews_ = false;
     work.swap(work_);
+    // What they wait for is examined now, and not before.
+    for (Waiter &waiter : waiters_) waiting_.push_back(std::move(waiter));
+    waiters_.clear();
   }
   moreIsDue_ = false;
   examiner_.examine();
@@ -322,14 +328,9 @@ void SyncEngine::startWaitingVersions() {
 }
 
 void SyncEngine::answerWaiters() {
-  std::vector<Waiter> waiters;
-  {
-    const Lock lock(mutex_);
-    if (waiters_.empty()) return;
-    waiters.swap(waiters_);
-  }
+  if (waiting_.empty()) return;
+  std::vector<Waiter> waiters = std::exchange(waiting_, {});
   const std::vector<QueuedUpload> queued = store_.allQueued(UINT32_MAX);
-  std::vector<Waiter> remaining;
   for (Waiter &waiter : waiters) {
     bool isWaiting = false;
     NSError failure;
@@ -343,13 +344,11 @@ void SyncEngine::answerWaiters() {
         failure = qvc_error(QVErrorUnsentChanges, "deletions wait for an answer: droxa deletions");
     }
     if (isWaiting && !failure) {
-      remaining.push_back(std::move(waiter));
+      waiting_.push_back(std::move(waiter));
       continue;
     }
     dispatch_async_global([done = std::move(waiter.done), failure] { done(failure); });
   }
-  const Lock lock(mutex_);
-  for (Waiter &waiter : remaining) waiters_.push_back(std::move(waiter));
 }
 
 void SyncEngine::waitForWork() {

@@ -112,6 +112,7 @@ class SyncEngine {
   // The sync's thread.
   bool isCloudReady_ = false;
   bool moreIsDue_ = false;
+  std::vector<Waiter> waiting_;
   std::chrono::milliseconds retryPause_{0};
   std::chrono::steady_clock::time_point nextPoll_;
 
@@ -122,7 +123,7 @@ class SyncEngine {
   bool hasLocalNews_ GUARDED_BY(mutex_) = true;
   bool hasCloudNews_ GUARDED_BY(mutex_) = true;
   std::vector<std::function<void()>> work_ GUARDED_BY(mutex_);
-  std::vector<Waiter> waiters_ GUARDED_BY(mutex_);
+  std::vector<Waiter> waiters_ GUARDED_BY(mutex_);  // asked since the round began
   std::vector<std::function<void(const NSError &)>> fetchers_ GUARDED_BY(mutex_);
   std::string cloudProblem_ GUARDED_BY(mutex_);
   TransferRate uploadRate_ GUARDED_BY(mutex_);

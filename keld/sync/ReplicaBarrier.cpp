@@ -1,0 +1,40 @@
+#include "keld/sync/ReplicaBarrier.h"
+
+#include <atomic>
+#include <cerrno>
+#include <chrono>
+#include <fcntl.h>
+#include <thread>
+#include <unistd.h>
+
+#include "tessaly/QVContainer.h"
+
+namespace droxa::keld {
+
+namespace {
+constexpr std::chrono::seconds kLongestWait{30};
+constexpr std::chrono::milliseconds kBetween{2};
+}  // namespace
+
+NSError WaitUntilReplicaIsSeen(const std::string &replicaPath, const ReplicaFiles::Read &read) {
+  static std::atomic<std::uint64_t> last{0};
+  const std::string mark = std::string(QVUbiquitousDefaultContainerID) + "/.mark-" +
+                           std::to_string(::getpid()) + "-" + std::to_string(++last);
+  const std::string path = replicaPath + "/" + mark;
+  const int file = ::open(path.c_str(), O_CREAT | O_EXCL | O_WRONLY | O_CLOEXEC | O_NOFOLLOW, 0600);
+  // On a disk that takes no file nothing else was written either.
+  if (file < 0) return errno == EROFS ? NSError() : NSError::errorWithPOSIXCode(errno, path);
+  ::close(file);
+  const auto end = std::chrono::steady_clock::now() + kLongestWait;
+  bool isSeen = false;
+  NSError problem;
+  while (!isSeen && !problem && std::chrono::steady_clock::now() < end) {
+    problem = read([&](ItemQueries &queries) { isSeen = queries.byPathBelowReplica(mark).has_value(); });
+    if (!isSeen) std::this_thread::sleep_for(kBetween);
+  }
+  ::unlink(path.c_str());
+  if (problem || isSeen) return problem;
+  return NSError::errorWithPOSIXCode(ETIMEDOUT, replicaPath + ": the changes there aren't noticed");
+}
+
+}  // namespace droxa::keld

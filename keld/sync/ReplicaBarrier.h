@@ -1,0 +1,13 @@
+#pragma once
+
+#include <string>
+
+#include "keld/sync/ReplicaFiles.h"
+
+namespace droxa::keld {
+
+// Returns when everything that was done in the replica before the call has reached the item table: watchers
+// tell in order, so a mark that is made now is seen after all of it. nil, or why it can't be known. Blocks.
+NSError WaitUntilReplicaIsSeen(const std::string &replicaPath, const ReplicaFiles::Read &read);
+
+}  // namespace droxa::keld
