@@ -57,6 +57,9 @@ struct RescuedFile {
 };
 
 class ContentsStorage;
+class OutgoingDocument;
+struct ExchangeNote;
+enum class TemporaryKind : char;
 
 // Something made in the storage and not yet at its place: durable, removed with this object unless it was
 // published (contents made of a part go back to being that part). Thread contract: a value that moves; it
@@ -83,7 +86,7 @@ class PreparedFile {
   DocumentMarker marker_;
   std::uint32_t mode_ = 0644;
   FileFacts facts_;
-  OwnedDescriptor lock_;  // keeps recover() of another from taking it for a leftover
+  OwnedDescriptor file_;  // of a consumed part, whose lock goes with it
 };
 
 struct PreparedResult {
@@ -177,7 +180,58 @@ class ContentsStorage {
 
  private:
   friend class PreparedFile;
-  ContentsStorage(ContentsSettings settings) : settings_(std::move(settings)) {}
+  explicit ContentsStorage(ContentsSettings settings) : settings_(std::move(settings)) {}
+  int openFolders(const std::string &replicaPath);
+  int hasNoRoomFor(std::uint64_t bytes) const;
+
+  // Making things (ContentsStorage.cpp, PreparedFiles.cpp).
+  std::string newTemporary(TemporaryKind kind, const std::string &digest = {}) const;
+  PreparedResult prepareEmptyFile(const DocumentMarker &marker, std::uint32_t mode,
+                                  std::int64_t modified) const;
+  PreparedResult preparePromise(const DocumentMarker &marker, std::uint32_t mode,
+                                const DocumentDates &dates) const;
+  int completeFile(int file, const DocumentMarker &marker, std::uint32_t mode) const;
+  int takePart(PartFile &part, PreparedFile *prepared) const;
+  int copyPart(PartFile &part, PreparedFile *prepared) const;
+  void giveBack(PreparedFile &prepared, PartFile &part) const;
+  void discardTemporary(const std::string &temporary) const;
+  int writePromise(const PreparedFile &prepared, const std::string &name) const;
+
+  // Replacing (Replacement.cpp). The file at the name comes out under the prepared file's temporary name.
+  ContentsResult replaceOpened(int folder, const std::string &name, PreparedFile &prepared,
+                               OutgoingDocument &outgoing) const;
+  ContentsResult exchange(int folder, const std::string &name, PreparedFile &prepared,
+                          OutgoingDocument &outgoing) const;
+  ContentsResult undoExchange(int folder, const std::string &name, PreparedFile &prepared,
+                              const OutgoingDocument &outgoing) const;
+  ContentsResult fulfilPromise(int folder, const std::string &name, PreparedFile &prepared,
+                               const FileFacts &expected) const;
+  // Without exchanging: the name is free for a moment.
+  ContentsResult replaceByTakingOut(int folder, const std::string &name, PreparedFile &prepared,
+                                    OutgoingDocument &outgoing) const;
+  ContentsResult publishAtFreeName(PreparedFile &prepared, int folder, const std::string &name) const;
+  ContentsResult takeOut(int folder, const std::string &name, const OutgoingDocument &outgoing,
+                         std::string *temporary) const;
+  ContentsResult putBack(const std::string &temporary, int folder, const std::string &name) const;
+  ContentsResult succeeded(int folder, const std::string &name) const;
+
+  // Letting go (Eviction.cpp).
+  ContentsResult letGo(OutgoingDocument &document, DocumentMarker marker) const;
+  ContentsResult evictToPromise(int folder, const std::string &name, const FileFacts &expected,
+                                const DocumentMarker &marker) const;
+
+  // Notes and recovery (Recovery.cpp).
+  int writeNote(const std::string &temporary, int folder, const std::string &name,
+                const OutgoingDocument &outgoing, const FileFacts &incoming) const;
+  void removeNote(const std::string &temporary) const;
+  void dispose(const std::string &temporary) const;
+  bool rescue(const std::string &temporary) const;
+  bool isAsPrepared(const PreparedFile &prepared) const;
+  void recoverNote(const std::string &noteName) const;
+  void recoverTemporary(const std::string &temporary) const;
+  void recoverOutgoing(const std::string &temporary, const ExchangeNote &note) const;
+  void removeStaleParts() const;
+  OwnedDescriptor openNoted(const ExchangeNote &note) const;
 
   const ContentsSettings settings_;
   ContentsCapabilities capabilities_;

@@ -49,6 +49,9 @@ std::optional<DocumentMarker> ParseMarker(std::string_view bytes);
 std::optional<DocumentMarker> ReadMarker(int folder, const std::string &name);
 // The marker of an open file or folder.
 std::optional<DocumentMarker> ReadMarker(int descriptor);
+// The same of `name` in the folder, or of the descriptor itself where `name` is null; tells "none" (0 and no
+// marker) from "can't be read" (an errno).
+int ReadMarkerOrError(int folder, const std::string *name, std::optional<DocumentMarker> *marker);
 
 // Writes the marker onto an open file or folder (not one open as a path alone). It is durable after the next
 // fsync. 0 or an errno: ENOTSUP where the file system has no such attributes, EINVAL for a marker that isn't
