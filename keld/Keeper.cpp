@@ -280,7 +280,7 @@ void Keeper::step(Work &work) {
   else
     scannedThrough_ = std::max<ItemNumber>(scannedThrough_, walkedThrough_);
   const auto after = containers_.current();
-  if (!changes.empty()) listener_.itemsChanged(changes, *before, *after, *queries_);
+  if (!changes.empty()) listener_.itemsChanged({0, std::move(changes), before, after}, *queries_);
   if (isAdvanced) listener_.feedAdvanced();
   if (containers.list) listener_.containerListChanged();
   for (auto &job : work.jobs) dispatch_async_global(std::move(job.second));
@@ -335,7 +335,6 @@ void Keeper::walk() {
       reconciler_->keepMissing();
     else
       reconciler_->bury(true);
-    if (bulkLoading_ && !listener_.wantsChanges()) reconciler_->takeChanges();
   }
 }
 

@@ -12,6 +12,7 @@
 #include <thread>
 #include <vector>
 
+#include "keld/ChangeJournal.h"
 #include "keld/ContainerList.h"
 #include "keld/FolderOpener.h"
 #include "keld/ItemEdits.h"
@@ -32,11 +33,9 @@ struct KeeperOptions {
 class KeeperListener {
  public:
   virtual ~KeeperListener() = default;
-  virtual void itemsChanged(const std::vector<ItemChange> &changes, const Containers &before,
-                            const Containers &after, ItemQueries &queries) = 0;
+  virtual void itemsChanged(Commit commit, ItemQueries &queries) = 0;  // unnumbered
   virtual void feedAdvanced() = 0;  // there are newer ranks than before, told of as changes or not
   virtual void containerListChanged() = 0;
-  virtual bool wantsChanges() = 0;  // whether anybody would be told
   // The database failed for good; the keeper has stopped.
   virtual void keeperFailed(const std::string &why) = 0;
 };

@@ -192,9 +192,8 @@ QVDaemonStatus Keld::status() {
 
 // --- What the keeper tells.
 
-void Keld::itemsChanged(const std::vector<ItemChange> &changes, const Containers &before,
-                        const Containers &after, ItemQueries &queries) {
-  senders_.publish(changes, before, after, queries);
+void Keld::itemsChanged(Commit commit, ItemQueries &queries) {
+  senders_.publish(std::move(commit), queries);
 }
 
 void Keld::feedAdvanced() {
@@ -203,10 +202,6 @@ void Keld::feedAdvanced() {
 
 void Keld::containerListChanged() {
   notifications_->post(QVContainerListDidChangeNotification);
-}
-
-bool Keld::wantsChanges() {
-  return senders_.count() != 0;
 }
 
 void Keld::keeperFailed(const std::string &why) {
@@ -224,7 +219,7 @@ void Keld::findWatchTarget(const NSURL &url,
     std::optional<UpdateWatch> watch;
     *error = self->read([&](ItemQueries &queries, const ItemPresenter &presenter) {
       const auto record = queries.byPathBelowReplica(path);
-      if (record) watch = UpdateWatch{record->id, record->id == presenter.containers().root(), 0};
+      if (record) watch = UpdateWatch{record->id, record->id == presenter.containers().root(), 0, 0};
     });
     return watch;
   };
@@ -236,6 +231,12 @@ void Keld::findWatchTarget(const NSURL &url,
     NSError problem;
     const auto found = find(&problem);
     reply(found, problem);
+  });
+}
+
+NSError Keld::beginWatch(UpdateSender &sender, UpdateWatch watch, std::uint64_t since) {
+  return senders_.beginWatch(sender, watch, since, [this](const auto &question) {
+    return read([&](ItemQueries &queries, const ItemPresenter &) { question(queries); });
   });
 }
 
@@ -257,7 +258,10 @@ QVQueryItems Keld::itemsForPush(const std::vector<PendingPush> &pushes) {
         continue;
       }
       const auto record = queries.byID(push.id);
-      if (!record || record->parent == kLimboFolder) continue;
+      if (!record || record->parent == kLimboFolder) {
+        if (push.hasLeft) items.push_back(ItemPresenter::deadItem(push.id, push.kind));
+        continue;
+      }
       // What went into private storage is gone, for everybody but its owner.
       const bool isHidden = record->zone() == Zone::privateStorage;
       items.push_back(isHidden ? ItemPresenter::deadItem(push.id, push.kind) : presenter.item(*record));

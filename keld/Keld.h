@@ -65,16 +65,16 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   QVDaemonStatus status();
 
   // KeeperListener.
-  void itemsChanged(const std::vector<ItemChange> &changes, const Containers &before, const Containers &after,
-                    ItemQueries &queries) override;
+  void itemsChanged(Commit commit, ItemQueries &queries) override;
   void feedAdvanced() override;
   void containerListChanged() override;
-  bool wantsChanges() override;
   void keeperFailed(const std::string &why) override;
 
   // UpdateSenderHost.
   void findWatchTarget(const NSURL &url,
                        std::function<void(std::optional<UpdateWatch>, const NSError &)> reply) override;
+  std::uint64_t lastCommit() override { return senders_.lastCommit(); }
+  NSError beginWatch(UpdateSender &sender, UpdateWatch watch, std::uint64_t since) override;
   bool exists(ItemNumber id) override;
   QVQueryItems itemsForPush(const std::vector<PendingPush> &pushes) override;
 

@@ -132,7 +132,8 @@ void KeldSession::enumerateWorkingSetChangesFromChangeToken(const NSData &token,
 void KeldSession::getItemUpdateSenderWithReceiver(std::shared_ptr<QVItemNotificationReceiving> receiver,
                                                   QVSenderReply reply) {
   if (!receiver) return reply(nullptr, {}, qvc_error(QVErrorInvalidArgument, "a sender needs a receiver"));
-  const auto sender = std::make_shared<UpdateSender>(daemon_, std::move(receiver));
+  const auto sender =
+      std::make_shared<UpdateSender>(daemon_, std::move(receiver), daemon_->senders().lastCommit());
   bool ended = false;
   {
     const Lock lock(mutex_);

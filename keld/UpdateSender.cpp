@@ -11,8 +11,8 @@ constexpr std::size_t kMostItemsAPush = 1000;
 }  // namespace
 
 UpdateSender::UpdateSender(std::weak_ptr<UpdateSenderHost> host,
-                           std::shared_ptr<QVItemNotificationReceiving> receiver)
-    : host_(std::move(host)), receiver_(std::move(receiver)) {}
+                           std::shared_ptr<QVItemNotificationReceiving> receiver, std::uint64_t made)
+    : host_(std::move(host)), receiver_(std::move(receiver)), made_(made) {}
 
 UpdateSender::~UpdateSender() {
   // Nobody can see it end any more but those who wait for the end of their boost.
@@ -33,31 +33,45 @@ void UpdateSender::boostPriority(QVReply block) {
 void UpdateSender::watchItemAtURL(const NSURL &url, std::uint64_t options, QVErrorReply gatherReply) {
   const auto host = host_.lock();
   if (!host) return gatherReply(qvc_error(QVErrorShuttingDown, "the daemon is shutting down"));
+  std::uint64_t since = host->lastCommit();
   {
     const Lock lock(mutex_);
     watch_.reset();
+    since = made_.value_or(since);
   }
-  host->findWatchTarget(url, [self = shared_from_this(), options, url, gatherReply = std::move(gatherReply)](
-                                 std::optional<UpdateWatch> watch, const NSError &error) {
-    if (!watch) return gatherReply(error ? error : qvc_errorNoSuchItem(url.path()));
-    watch->options = options;
-    self->beginWatch(*watch, gatherReply);
-  });
+  host->findWatchTarget(
+      url, [self = shared_from_this(), options, url, since, gatherReply = std::move(gatherReply)](
+               std::optional<UpdateWatch> watch, const NSError &error) {
+        if (!watch) return gatherReply(error ? error : qvc_errorNoSuchItem(url.path()));
+        watch->options = options;
+        gatherReply(self->watchFound(*watch, since));
+      });
 }
 
 // The watch stands before the item is looked at again: a death in between is seen by one or the other.
-void UpdateSender::beginWatch(UpdateWatch watch, const QVErrorReply &gatherReply) {
-  {
-    const Lock lock(mutex_);
-    if (receiver_) watch_ = watch;
-  }
+NSError UpdateSender::watchFound(const UpdateWatch &watch, std::uint64_t since) {
   const auto host = host_.lock();
-  if (host && host->exists(watch.folder)) return gatherReply(NSError());
+  if (!host) return qvc_error(QVErrorShuttingDown, "the daemon is shutting down");
+  if (const NSError error = host->beginWatch(*this, watch, since)) return error;
+  if (host->exists(watch.folder)) return NSError();
+  stopWatching();
+  return qvc_errorNoSuchItem(QVFileObjectID::folderOrAliasID(watch.folder).asString());
+}
+
+void UpdateSender::beginWatch(const UpdateWatch &watch, const std::vector<PendingPush> &missed) {
   {
     const Lock lock(mutex_);
-    watch_.reset();
+    if (!receiver_) return;
+    watch_ = watch;
+    made_.reset();
+    append(missed);
   }
-  gatherReply(qvc_errorNoSuchItem(QVFileObjectID::folderOrAliasID(watch.folder).asString()));
+  pump();
+}
+
+void UpdateSender::stopWatching() {
+  const Lock lock(mutex_);
+  watch_.reset();
 }
 
 void UpdateSender::invalidate() {
@@ -97,16 +111,20 @@ void UpdateSender::enqueue(const std::vector<PendingPush> &pushes, bool last) {
   {
     const Lock lock(mutex_);
     if (!receiver_ || !watch_) return;
-    const bool coalesces = (watch_->options & QVWatchCoalesced) != 0;
-    for (const PendingPush &push : pushes) {
-      if (const auto waiting = places_.find(push.id); coalesces && waiting != places_.end())
-        queue_.erase(waiting->second);
-      places_[push.id] = nextPlace_;
-      queue_.emplace(nextPlace_++, push);
-    }
+    append(pushes);
     if (last) watch_.reset();
   }
   pump();
+}
+
+void UpdateSender::append(const std::vector<PendingPush> &pushes) {
+  const bool coalesces = (watch_->options & QVWatchCoalesced) != 0;
+  for (const PendingPush &push : pushes) {
+    if (const auto waiting = places_.find(push.id); coalesces && waiting != places_.end())
+      queue_.erase(waiting->second);
+    places_[push.id] = nextPlace_;
+    queue_.emplace(nextPlace_++, push);
+  }
 }
 
 void UpdateSender::pump() {

@@ -1,7 +1,10 @@
 #include "keld/UpdateSenders.h"
 
 #include <algorithm>
+#include <unordered_map>
 #include <unordered_set>
+
+#include "tessaly/QVErrors.h"
 
 namespace droxa::keld {
 
@@ -54,48 +57,61 @@ void appendBelow(ItemQueries &queries, ItemNumber folder, std::vector<PendingPus
     key.atStart = false;
     key.name = children.back().name;
     for (const ItemRecord &child : children) {
-      pushes.push_back({child.id, child.facts.kind, false});
+      pushes.push_back({child.id, child.facts.kind, false, false});
       if (child.isFolder()) appendBelow(queries, child.id, pushes);
     }
   }
 }
 
-struct Publication {
-  const std::vector<ItemChange> &changes;
-  const Containers &before;
-  const Containers &after;
-  ItemQueries &queries;
-  Ancestry ancestry;
+// What becomes of the death of the watched item itself.
+enum class OwnDeath : bool {
+  isTheLast,   // it is told, and nothing after it
+  isLookedAt,  // by who begins the watch: the item may be back
 };
 
-void publishTo(UpdateSender &sender, UpdateWatch watch, Publication &publication) {
+// A commit on its way to the watches.
+class Publication {
+ public:
+  Publication(const Commit &commit, ItemQueries &queries)
+      : commit_(commit), queries_(queries), ancestry_(commit.changes, *commit.after, queries) {}
+
+  // Appends what the watch wants to know. True when nothing may follow.
+  bool appendFor(UpdateWatch watch, OwnDeath ownDeath, std::vector<PendingPush> &pushes);
+
+ private:
+  const Commit &commit_;
+  ItemQueries &queries_;
+  Ancestry ancestry_;
+};
+
+bool Publication::appendFor(UpdateWatch watch, OwnDeath ownDeath, std::vector<PendingPush> &pushes) {
+  if (watch.isRoot) watch.folder = commit_.after->root();
   const bool wantsUpdates = (watch.options & QVWatchUpdates) != 0;
   const bool wantsDeaths = (watch.options & QVWatchDeaths) != 0;
   const bool isDeep = (watch.options & QVWatchSubtree) != 0;
-  std::vector<PendingPush> pushes;
-  bool last = false;
-  for (const ItemChange &change : publication.changes) {
+  for (const ItemChange &change : commit_.changes) {
     if (change.id == watch.folder && change.died) {
-      pushes.push_back({change.id, change.kind, true});
-      last = !watch.isRoot;
-      if (last) break;
+      if (ownDeath == OwnDeath::isLookedAt) continue;
+      pushes.push_back({change.id, change.kind, true, false});
+      if (!watch.isRoot) return true;
       continue;
     }
-    const ItemNumber oldParent = shownParent(change, change.oldParent, publication.before);
-    const ItemNumber newParent = change.died ? 0 : shownParent(change, change.newParent, publication.after);
-    const bool was =
-        isDeep ? publication.ancestry.isBelow(oldParent, watch.folder) : oldParent == watch.folder;
-    const bool is =
-        isDeep ? publication.ancestry.isBelow(newParent, watch.folder) : newParent == watch.folder;
+    const ItemNumber oldParent = shownParent(change, change.oldParent, *commit_.before);
+    const ItemNumber newParent = change.died ? 0 : shownParent(change, change.newParent, *commit_.after);
+    const bool was = isDeep ? ancestry_.isBelow(oldParent, watch.folder) : oldParent == watch.folder;
+    const bool is = isDeep ? ancestry_.isBelow(newParent, watch.folder) : newParent == watch.folder;
     if (!is && !was) continue;
-    // One that left is pushed as it is now: its parent tells where it went.
-    if (change.died ? wantsDeaths : wantsUpdates) pushes.push_back({change.id, change.kind, change.died});
+    // One that left is pushed as it is now: its parent tells where it went. Should it die there before its
+    // turn, that death is told to others.
+    const bool hasLeft = was && !is && wantsDeaths;
+    if (change.died ? wantsDeaths : wantsUpdates)
+      pushes.push_back({change.id, change.kind, change.died, hasLeft});
     // A folder that came from elsewhere brought its contents along, which themselves haven't changed.
     const bool isNews = isDeep && is && !was && change.oldParent != 0;
     if (isNews && wantsUpdates && change.kind == NSFileProviderItemKind::folder)
-      appendBelow(publication.queries, change.id, pushes);
+      appendBelow(queries_, change.id, pushes);
   }
-  if (!pushes.empty()) sender.enqueue(pushes, last);
+  return false;
 }
 
 }  // namespace
@@ -123,25 +139,65 @@ std::size_t UpdateSenders::count() const {
   return living().size();
 }
 
-void UpdateSenders::publish(const std::vector<ItemChange> &changes, const Containers &before,
-                            const Containers &after, ItemQueries &queries) {
+std::uint64_t UpdateSenders::lastCommit() const {
+  const Lock lock(mutex_);
+  return journal_.last();
+}
+
+void UpdateSenders::publish(Commit commit, ItemQueries &queries) {
+  std::shared_ptr<const Commit> published;
+  {
+    const Lock lock(mutex_);
+    published = journal_.append(std::move(commit));
+  }
   std::vector<std::shared_ptr<UpdateSender>> senders = living();
   if (senders.empty()) return;
   // Folders that nobody watches are most of them: direct watches are asked for by the folder alone.
   std::unordered_set<ItemNumber> concerned;
-  for (const ItemChange &change : changes) {
-    concerned.insert({change.id, shownParent(change, change.oldParent, before),
-                      shownParent(change, change.newParent, after)});
+  for (const ItemChange &change : published->changes) {
+    concerned.insert({change.id, shownParent(change, change.oldParent, *published->before),
+                      shownParent(change, change.newParent, *published->after)});
   }
   std::stable_partition(senders.begin(), senders.end(),
                         [](const auto &sender) { return sender->isBoosted(); });
-  Publication publication{changes, before, after, queries, Ancestry(changes, after, queries)};
+  Publication publication(*published, queries);
   for (const auto &sender : senders) {
-    auto watch = sender->watch();
-    if (!watch) continue;
-    if (watch->isRoot) watch->folder = after.root();
+    const auto watch = sender->watch();
+    if (!watch || watch->began >= published->number) continue;
     const bool isDeep = (watch->options & QVWatchSubtree) != 0;
-    if (isDeep || concerned.count(watch->folder) != 0) publishTo(*sender, *watch, publication);
+    const ItemNumber folder = watch->isRoot ? published->after->root() : watch->folder;
+    if (!isDeep && concerned.count(folder) == 0) continue;
+    std::vector<PendingPush> pushes;
+    const bool last = publication.appendFor(*watch, OwnDeath::isTheLast, pushes);
+    if (!pushes.empty()) sender->enqueue(pushes, last);
+  }
+}
+
+// What is published while earlier commits are looked at is looked at next; the watch stands once nothing is
+// left.
+NSError UpdateSenders::beginWatch(UpdateSender &sender, UpdateWatch watch, std::uint64_t since,
+                                  const Read &read) {
+  std::vector<PendingPush> missed;
+  watch.began = since;
+  for (;;) {
+    Commits commits;
+    {
+      const Lock lock(mutex_);
+      auto known = journal_.after(watch.began);
+      if (!known)
+        return qvc_error(QVErrorChangeTokenExpired, "too much has changed since the sender was made");
+      if (known->empty()) {
+        sender.beginWatch(watch, missed);
+        return NSError();
+      }
+      commits.swap(*known);
+    }
+    const NSError error = read([&](ItemQueries &queries) {
+      for (const auto &commit : commits)
+        (void)Publication(*commit, queries).appendFor(watch, OwnDeath::isLookedAt, missed);
+    });
+    if (error) return error;
+    watch.began = commits.back()->number;
   }
 }
 

@@ -9,24 +9,6 @@
 
 namespace droxa {
 
-namespace {
-
-bool contains(const std::vector<std::uint64_t> &folders, std::uint64_t folder) {
-  return std::find(folders.begin(), folders.end(), folder) != folders.end();
-}
-
-// Whether a watch of `watched` sees the change.
-bool concerns(const FakeDriveChange &change, std::uint64_t watched, std::uint64_t options) {
-  if (change.item->isDead() && change.item->fileObjectID().number() == watched) return true;
-  if ((options & (change.item->isDead() ? QVWatchDeaths : QVWatchUpdates)) == 0) return false;
-  if (options & QVWatchSubtree)
-    return contains(change.foldersBefore, watched) || contains(change.foldersAfter, watched);
-  return (!change.foldersBefore.empty() && change.foldersBefore.front() == watched) ||
-         (!change.foldersAfter.empty() && change.foldersAfter.front() == watched);
-}
-
-}  // namespace
-
 FakeDaemon::FakeDaemon(std::string replica)
     : drive_(std::move(replica)), account_(QVAccountDescription{"vera", "account-1"}) {}
 
@@ -63,10 +45,11 @@ void FakeDaemon::change(const std::string &what, const Change &change) {
 
 void FakeDaemon::tellSenders(const std::vector<FakeDriveChange> &changes) {
   for (const auto &sender : senders()) {
+    if (sender->keepIfNotWatching(changes)) continue;
     QVQueryItems seen;
     for (const FakeDriveChange &one : changes) {
       const auto watched = sender->watchedNumber();
-      if (!watched || !concerns(one, *watched, sender->watchOptions().value_or(0))) continue;
+      if (!watched || !FakeWatchSees(one, *watched, sender->watchOptions().value_or(0))) continue;
       seen.push_back(one.item);
       if (one.item->isDead() && one.item->fileObjectID().number() == *watched) sender->stopWatching();
     }

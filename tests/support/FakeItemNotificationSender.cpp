@@ -9,6 +9,23 @@
 
 namespace droxa {
 
+namespace {
+
+bool contains(const std::vector<std::uint64_t> &folders, std::uint64_t folder) {
+  return std::find(folders.begin(), folders.end(), folder) != folders.end();
+}
+
+}  // namespace
+
+bool FakeWatchSees(const FakeDriveChange &change, std::uint64_t watched, std::uint64_t options) {
+  if (change.item->isDead() && change.item->fileObjectID().number() == watched) return true;
+  if ((options & (change.item->isDead() ? QVWatchDeaths : QVWatchUpdates)) == 0) return false;
+  if (options & QVWatchSubtree)
+    return contains(change.foldersBefore, watched) || contains(change.foldersAfter, watched);
+  return (!change.foldersBefore.empty() && change.foldersBefore.front() == watched) ||
+         (!change.foldersAfter.empty() && change.foldersAfter.front() == watched);
+}
+
 // A proxy of a sender: passes calls on, or fails them in transport when the test asked for it.
 class FakeSenderProxy final : public QVItemNotificationSender {
  public:
@@ -80,8 +97,14 @@ void FakeItemNotificationSender::watchItemAtURL(const NSURL &url, std::uint64_t 
     const Lock lock(mutex_);
     watched_.reset();
     options_ = options;
-    if (!error && !invalidated_) watched_ = number;
+    if (!error && !invalidated_) {
+      watched_ = number;
+      hasWatched_ = true;
+      for (const FakeDriveChange &one : std::exchange(early_, {}))
+        if (FakeWatchSees(one, number, options)) pending_.push_back(one.item);
+    }
   }
+  replies_->run([self = shared_from_this()] { self->pump(); });
   replies_->give("watchItemAtURL", [gatherReply = std::move(gatherReply), error] { gatherReply(error); });
 }
 
@@ -201,6 +224,13 @@ std::optional<std::uint64_t> FakeItemNotificationSender::watchOptions() const {
 std::optional<std::uint64_t> FakeItemNotificationSender::watchedNumber() const {
   const Lock lock(mutex_);
   return watched_;
+}
+
+bool FakeItemNotificationSender::keepIfNotWatching(const std::vector<FakeDriveChange> &changes) {
+  const Lock lock(mutex_);
+  if (hasWatched_ || invalidated_) return false;
+  early_.insert(early_.end(), changes.begin(), changes.end());
+  return true;
 }
 
 void FakeItemNotificationSender::stopWatching() {

@@ -8,11 +8,15 @@
 #include "platform/foundation/ThreadSafety.h"
 #include "tessaly/QVProtocol.h"
 #include "tests/support/CallLog.h"
+#include "tests/support/FakeDrive.h"
 #include "tests/support/FakeReplies.h"
 
 namespace droxa {
 
 class FakeDaemon;
+
+// Whether a watch of `watched` sees the change.
+bool FakeWatchSees(const FakeDriveChange &change, std::uint64_t watched, std::uint64_t options);
 
 // The fake daemon's side of one receiver. It writes what it is asked into the daemon's log ("sender 1:
 // watchItemAtURL(/replica/…, options 19)"), each proxy made of it too, and pushes one batch at a time, the
@@ -45,6 +49,8 @@ class FakeItemNotificationSender final : public QVItemNotificationSender,
   std::optional<std::uint64_t> watchedNumber() const;  // of the item, in the drive
 
   // For the daemon.
+  // Before the first watch stands the changes are kept for it; false once it does.
+  bool keepIfNotWatching(const std::vector<FakeDriveChange> &changes);
   void stopWatching();
   void drop();  // forgets the receiver, so that no cycle outlives the daemon
 
@@ -63,6 +69,8 @@ class FakeItemNotificationSender final : public QVItemNotificationSender,
   std::vector<NSXPCErrorHandler> handlers_ GUARDED_BY(mutex_);
   std::vector<QVReply> boosts_ GUARDED_BY(mutex_);
   QVQueryItems pending_ GUARDED_BY(mutex_);
+  std::vector<FakeDriveChange> early_ GUARDED_BY(mutex_);  // before the first watch
+  bool hasWatched_ GUARDED_BY(mutex_) = false;
   std::optional<std::uint64_t> watched_ GUARDED_BY(mutex_);
   std::optional<std::uint64_t> options_ GUARDED_BY(mutex_);
   std::size_t progressReplies_ GUARDED_BY(mutex_) = 0;

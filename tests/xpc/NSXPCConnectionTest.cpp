@@ -127,6 +127,104 @@ TEST(NSXPCConnection, thePeersEndInterruptsBeforeItInvalidates) {
   outcomes.expectEachEndedOnce();
 }
 
+// A reply of any size that the server gives before it ends the connection is the call's answer.
+void expectAnsweredBeforeTheEnd(std::size_t size) {
+  for (int round = 0; round < 50; ++round) {
+    ConnectedPair pair;
+    CallOutcomes outcomes;
+    outcomes.follow(pair.client);
+    serveHost(
+        pair, std::make_shared<ScriptedHost>([&](const std::string &,
+                                                 const NSFileProviderErrorCompletion &completion) {
+          completion(NSError(NSPOSIXErrorDomain, 1, {{NSLocalizedDescriptionKey, std::string(size, 'x')}}));
+          pair.server->invalidate();
+        }));
+    outcomes.call(pair.client, "");
+    ASSERT_TRUE(outcomes.waitForLast("invalidation"));
+    ASSERT_TRUE(outcomes.waitForAll());
+    ASSERT_EQ(outcomes.replies(), 1) << "round " << round;
+    outcomes.expectEachEndedOnce();
+  }
+}
+
+TEST(NSXPCConnection, aReplyGivenJustBeforeTheInvalidationArrives) {
+  expectAnsweredBeforeTheEnd(10);
+}
+
+TEST(NSXPCConnection, aReplyLargerThanTheSocketGivenJustBeforeTheInvalidationArrives) {
+  expectAnsweredBeforeTheEnd(4U << 20);
+}
+
+TEST(NSXPCConnection, aCallMadeJustBeforeTheInvalidationIsDeliveredAndFailsOnce) {
+  ConnectedPair pair;
+  const auto host = std::make_shared<SilentHost>();
+  CallOutcomes outcomes;
+  serveHost(pair, host);
+  outcomes.call(pair.client, "");
+  EXPECT_TRUE(eventually([&] { return host->calls() == 1; }));
+  outcomes.call(pair.client, "");
+  pair.client->invalidate();
+  outcomes.call(pair.client, "too late");
+  EXPECT_TRUE(outcomes.waitForAll());
+  EXPECT_EQ(outcomes.codes(), std::vector<std::int64_t>(3, NSXPCConnectionInvalid));
+  outcomes.expectEachEndedOnce();
+}
+
+TEST(NSXPCConnection, aPeerThatDoesntReadHoldsTheEndUpForASecondAtMost) {
+  ConnectedPair pair;
+  CallOutcomes outcomes;
+  outcomes.follow(pair.client);
+  pair.client->setRemoteObjectInterface(NSFileProviderHostInterface());
+  pair.client->resume();  // the server never is: nobody reads
+  outcomes.call(pair.client, std::string(4U << 20, 'x'));
+  pair.client->invalidate();
+  EXPECT_TRUE(outcomes.waitForLast("invalidation"));
+  EXPECT_EQ(outcomes.codes(), std::vector<std::int64_t>{NSXPCConnectionInvalid});
+}
+
+// Exits with a synchronous call under way and one that is made later. Both have to return.
+void exitDuringSynchronousCalls() {
+  static std::shared_ptr<Host> host;
+  static std::thread caller;
+  static std::atomic<int> failures = 0;
+  // Registered before the loop's own handler, hence run after it.
+  std::atexit([] {
+    caller.join();
+    host->signalEnumerator("after the loop's end", [](const NSError &) {});
+    _exit(failures == 2 ? 7 : 1);
+  });
+  ConnectedPair pair;
+  const auto silent = std::make_shared<SilentHost>();
+  serveHost(pair, silent);
+  host = pair.client->synchronousRemoteObjectProxyWithErrorHandler<Host>([](const NSError &error) {
+    if (error.is(NSCocoaErrorDomain, NSXPCConnectionInvalid)) ++failures;
+  });
+  caller = std::thread([] { host->signalEnumerator("under way", [](const NSError &) {}); });
+  if (eventually([&] { return silent->calls() == 1; })) std::exit(0);
+  _exit(2);
+}
+
+TEST(NSXPCConnectionDeathTest, synchronousCallsWhileTheProcessExitsReturn) {
+  GTEST_FLAG_SET(death_test_style, "threadsafe");
+  EXPECT_EXIT(exitDuringSynchronousCalls(), testing::ExitedWithCode(7), "");
+}
+
+// What it holds must not count as lost at the process's exit.
+TEST(NSXPCConnection, aQuietConnectionMayLastUntilTheProcessExits) {
+  int ends[2] = {-1, -1};
+  ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, ends), 0);
+  for (const int end : ends) {
+    const auto connection = NSXPCConnection::connectionWithDescriptor(end);
+    connection->setExportedObject<Host>(NSFileProviderHostInterface(), ScriptedHost::answering());
+    connection->setRemoteObjectInterface(NSFileProviderHostInterface());
+    connection->resume();
+    if (end == ends[0]) continue;
+    Once<NSError> answer("answer");
+    proxy(connection)->signalEnumerator("", answer.completion());
+    EXPECT_EQ(answer.value<0>(), NSError());
+  }
+}
+
 TEST(NSXPCConnection, anInvalidationBeforeTheResumptionIsToldToo) {
   ConnectedPair pair;
   CallOutcomes outcomes;

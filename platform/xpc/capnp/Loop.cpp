@@ -103,17 +103,39 @@ void XPCLoop::drain() {
   std::uint64_t count = 0;
   while (read(wake_, &count, sizeof count) < 0 && errno == EINTR) {
   }
-  std::vector<Task> tasks;
-  {
-    const Lock lock(mutex_);
-    tasks.swap(tasks_);
-  }
+  std::vector<Task> tasks = takeTasks();
+  runTasks(tasks);
+  if (isStopping_) end();
+}
+
+std::vector<XPCLoop::Task> XPCLoop::takeTasks() {
+  const Lock lock(mutex_);
+  return std::exchange(tasks_, {});
+}
+
+void XPCLoop::runTasks(std::vector<Task> &tasks) {
   for (Task &task : tasks) {
     KJ_IF_MAYBE (problem, kj::runCatchingExceptions([&task] { task(); })) {
       os_log_fault(xpcLog(), "[CRIT] Assertion failed: no exception on the loop (%s)",
                    problem->getDescription().cStr());
     }
   }
+}
+
+// Every task that was accepted is run, so that nobody waits for one that isn't.
+void XPCLoop::end() {
+  for (;;) {
+    std::vector<Task> tasks;
+    {
+      const Lock lock(mutex_);
+      over_ = tasks_.empty();
+      if (over_) break;
+      tasks.swap(tasks_);
+    }
+    runTasks(tasks);
+  }
+  for (XPCLoopResident *resident : residents_) resident->loopDidEnd();
+  stopped_->fulfill();
 }
 
 bool XPCLoop::post(Task task) {
@@ -152,9 +174,7 @@ void XPCLoop::run(Task task) {
 }
 
 void XPCLoop::stop() {
-  post([this] { stopped_->fulfill(); });
-  const Lock lock(mutex_);
-  over_ = true;
+  post([this] { isStopping_ = true; });
 }
 
 }  // namespace droxa

@@ -81,6 +81,7 @@ class XPCProxy : public std::conditional_t<std::is_base_of_v<NSXPCProxyCreating<
     using Record = TypedCallRecord<Fill, Completion, Failure>;
     auto record =
         std::make_unique<Record>(remote_, std::move(fill), std::move(completion), std::move(options.failure));
+    Record &waiting = *record;
     std::shared_ptr<CallWaiter> waiter;
     if (remote_.synchronous) {
       if (XPCLoop::shared().isCurrent()) {
@@ -91,12 +92,17 @@ class XPCProxy : public std::conditional_t<std::is_base_of_v<NSXPCProxyCreating<
     }
     std::optional<std::chrono::milliseconds> deadline;
     if (options.hasDeadline) deadline = remote_.session->callDeadline();
-    XPCLoop::shared().post([method, decode, deadline, session = remote_.session,
-                            made = kj::mv(record)]() mutable {
+    const bool posted = XPCLoop::shared().post([method, decode, deadline, session = remote_.session,
+                                                made = kj::mv(record)]() mutable {
       session->call(std::move(made), deadline,
                     [&](Record &sent, std::uint64_t number) { return send(method, sent, number, decode); });
     });
-    if (waiter) waiter->wait();
+    if (!waiter) return;
+    if (posted) {
+      waiter->wait();
+    } else {
+      waiting.fail(Session::invalidError());  // the process exits: the record is left where it is
+    }
   }
 
   // A call without a reply: only its failure is told.

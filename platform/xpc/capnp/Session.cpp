@@ -11,6 +11,9 @@ namespace {
 
 using VatId = capnp::rpc::twoparty::VatId;
 
+// How long a connection that this side ends waits for the peer to read what was written before.
+constexpr kj::Duration EndingTime = 1 * kj::SECONDS;
+
 capnp::ReaderOptions receiveOptions() {
   capnp::ReaderOptions options;
   options.traversalLimitInWords = XPCMaximumMessageWords;
@@ -21,11 +24,11 @@ NSError transportError(std::int64_t code, std::string description) {
   return {NSCocoaErrorDomain, code, {{NSLocalizedDescriptionKey, std::move(description)}}};
 }
 
-NSError invalidError() {
+}  // namespace
+
+NSError Session::invalidError() {
   return transportError(NSXPCConnectionInvalid, "The connection was invalidated");
 }
-
-}  // namespace
 
 std::shared_ptr<Session> Session::create(int socket, std::int32_t peer) {
   std::shared_ptr<Session> session(new Session(socket, peer), XPCLoopDeleter());
@@ -36,10 +39,12 @@ std::shared_ptr<Session> Session::create(int socket, std::int32_t peer) {
 Session::Session(int socket, std::int32_t peer) : peer_(peer), socket_(socket), peerObject_(nullptr) {}
 
 Session::~Session() noexcept(false) {
+  XPCLoop::shared().remove(*this);
   tearDown();
 }
 
 void Session::prepare() {
+  XPCLoop::shared().add(*this);
   tasks_ = kj::heap<kj::TaskSet>(static_cast<kj::TaskSet::ErrorHandler &>(*this));
   auto starting = kj::newPromiseAndFulfiller<capnp::Capability::Client>();
   started_ = kj::mv(starting.fulfiller);
@@ -55,13 +60,28 @@ void Session::start(std::shared_ptr<XPCConnection> connection, Exporter exporter
 
 void Session::end(std::shared_ptr<XPCConnection> connection) {
   XPCLoop::shared().post([self = shared_from_this(), told = std::move(connection)]() mutable {
-    if (!self->over_ && told) self->connection_ = std::move(told);
-    self->endOnLoop(false);
+    if (self->over_) return;
+    if (told) self->connection_ = std::move(told);
+    if (std::exchange(self->isEnding_, true)) return;
+    self->writingEnds_ = XPCLoop::shared().timer().now() + EndingTime;
+    // The library writes an answer only some steps after it was given.
+    Session &session = *self;
+    session.tasks_->add(kj::evalLast([kept = std::move(self)] { kept->endWhenWritten(); }));
   });
 }
 
+void Session::endWhenWritten() {
+  if (over_) return;
+  XPCLoop &loop = XPCLoop::shared();
+  if (!network_ || network_->getCurrentQueueSize() == 0 || loop.timer().now() >= writingEnds_)
+    return endOnLoop(false);
+  tasks_->add(loop.timer().afterDelay(5 * kj::MILLISECONDS).then([kept = shared_from_this()] {
+    kept->endWhenWritten();
+  }));
+}
+
 void Session::startOnLoop(std::shared_ptr<XPCConnection> connection, Exporter exporter) {
-  if (over_) {  // the exported object is a user's
+  if (over_ || isEnding_) {  // the exported object is a user's
     dispatch_async_global([unused = std::make_shared<Exporter>(kj::mv(exporter))] {});
     return;
   }
@@ -116,6 +136,16 @@ void Session::endOnLoop(bool byPeer) {
   gate_->close();
   // The library's objects may be the callers of this.
   XPCLoop::shared().post([self = shared_from_this()] { self->tearDown(); });
+}
+
+// Replies can't come any more. Only who waits for one is told: the process exits, and code that nobody waits
+// for had better not run now.
+void Session::loopDidEnd() {
+  std::vector<std::uint64_t> synchronous;
+  for (const auto &[number, record] : calls_) {
+    if (record->waiter) synchronous.push_back(number);
+  }
+  for (const std::uint64_t number : synchronous) refuse(take(number));
 }
 
 void Session::tearDown() {

@@ -34,7 +34,9 @@ class UnansweredCall {
 //
 // Thread contract: create(), start(), end(), setCallDeadline() and callDeadline() on any thread; everything
 // else on the loop, where the session is destroyed too.
-class Session final : public std::enable_shared_from_this<Session>, private kj::TaskSet::ErrorHandler {
+class Session final : public std::enable_shared_from_this<Session>,
+                      public XPCLoopResident,
+                      private kj::TaskSet::ErrorHandler {
  public:
   using Exporter = kj::Function<capnp::Capability::Client(Session &)>;
 
@@ -44,7 +46,8 @@ class Session final : public std::enable_shared_from_this<Session>, private kj::
 
   // Calls made before the start wait for it. `connection` is kept until the end.
   void start(std::shared_ptr<XPCConnection> connection, Exporter exporter);
-  // Ends the session by this side's wish, which is told to `connection` (null: to nobody).
+  // Ends the session by this side's wish, which is told to `connection` (null: to nobody). What this side has
+  // said before, answers and calls, is still written, as far as the peer reads it soon.
   void end(std::shared_ptr<XPCConnection> connection);
   void setCallDeadline(std::chrono::milliseconds deadline) { callDeadline_ = deadline.count(); }
   std::chrono::milliseconds callDeadline() const { return std::chrono::milliseconds(callDeadline_); }
@@ -57,7 +60,7 @@ class Session final : public std::enable_shared_from_this<Session>, private kj::
   // record.
   template <class Record, class Send>
   void call(std::unique_ptr<Record> record, std::optional<std::chrono::milliseconds> deadline, Send send) {
-    if (over_) return refuse(std::move(record));
+    if (over_ || isEnding_) return refuse(std::move(record));
     const std::uint64_t number = ++lastCall_;
     Record &kept = *record;
     calls_.emplace(number, std::move(record));
@@ -66,6 +69,9 @@ class Session final : public std::enable_shared_from_this<Session>, private kj::
                              }).then([this, number](ReplyBlock &&reply) { answer(number, kj::mv(reply)); });
     track(number, deadline, kj::mv(work));
   }
+
+  // The failure of calls over a connection that this side has ended.
+  static NSError invalidError();
 
   // Whether the call still waits for its answer; else its record is gone.
   bool waits(std::uint64_t number) const { return calls_.contains(number); }
@@ -77,11 +83,14 @@ class Session final : public std::enable_shared_from_this<Session>, private kj::
   void watchQueue();
   void watchQueueSoon();
 
+  void loopDidEnd() override;
+
  private:
   Session(int socket, std::int32_t peer);
   void prepare();
   void startOnLoop(std::shared_ptr<XPCConnection> connection, Exporter exporter);
   void drop(const std::string &why);  // ends the session because of what the peer did, and logs it
+  void endWhenWritten();
   void endOnLoop(bool byPeer);
   void tearDown();
   void track(std::uint64_t number, std::optional<std::chrono::milliseconds> deadline, kj::Promise<void> work);
@@ -110,6 +119,8 @@ class Session final : public std::enable_shared_from_this<Session>, private kj::
   std::unordered_map<std::uint64_t, UnansweredCall *> unanswered_;
   std::uint64_t lastCall_ = 0;
   std::uint64_t lastUnanswered_ = 0;
+  bool isEnding_ = false;  // by this side's wish; over as soon as what waits is written
+  kj::TimePoint writingEnds_ = kj::origin<kj::TimePoint>();
   bool over_ = false;
 };
 

@@ -51,6 +51,71 @@ TEST_P(DaemonConformance, aWatcherIsPushedNewChangedAndRenamedChildren) {
   EXPECT_TRUE(watch.receiver->waitForUpdateOfName("b"));
 }
 
+// A client lists a folder between getting the sender and the watch's acknowledgement.
+TEST_P(DaemonConformance, whatChangesBeforeTheWatchStandsIsPushedWithIt) {
+  folder("f");
+  folder("g");
+  file("f/changed");
+  file("f/dead");
+  file("f/moved");
+  file("f/moved and dead");
+  file("f/untouched");
+  settle();
+  const QVFileObjectID dead = identifier("f/dead");
+  const QVFileObjectID moved = identifier("f/moved");
+  const QVFileObjectID movedAndDead = identifier("f/moved and dead");
+  const std::string g = identifier("g").asString();
+  const ConformanceWatch watch(daemon());
+  file("f/new");
+  world_->changeFile(at("f/changed"), 99, 5'000);
+  remove("f/dead");
+  rename("f/moved", "g/moved");
+  rename("f/moved and dead", "g/moved and dead");
+  file("g/elsewhere");
+  settle();
+  remove("g/moved and dead");
+  settle();
+  ASSERT_EQ(watch.watch(at("f")), NSError());
+  EXPECT_TRUE(watch.receiver->waitForUpdateOfName("new"));
+  EXPECT_TRUE(
+      watch.receiver->waitForItem([](const QVQueryItem &one) { return one.fields().documentSize == 99; }));
+  EXPECT_TRUE(watch.receiver->waitForDeath(dead));
+  EXPECT_TRUE(watch.receiver->waitForItem([&](const QVQueryItem &one) {
+    return one.fileObjectID() == moved && one.fields().parentItemIdentifier == g;
+  }));
+  EXPECT_TRUE(watch.receiver->waitForItem([&](const QVQueryItem &one) {
+    return one.fileObjectID() == movedAndDead && (one.isDead() || one.fields().parentItemIdentifier == g);
+  }));
+  file("f/last");
+  EXPECT_TRUE(watch.receiver->waitForUpdateOfName("last"));
+  EXPECT_FALSE(hasName(watch.receiver->items(), "untouched"));
+  EXPECT_FALSE(hasName(watch.receiver->items(), "elsewhere"));
+}
+
+TEST_P(DaemonConformance, whatChangesInTheRootBeforeTheWatchStandsIsPushedWithIt) {
+  file("dead");
+  settle();
+  const QVFileObjectID dead = identifier("dead");
+  const ConformanceWatch watch(daemon());
+  file("new");
+  remove("dead");
+  settle();
+  ASSERT_EQ(watch.watch(at("")), NSError());
+  EXPECT_TRUE(watch.receiver->waitForUpdateOfName("new"));
+  EXPECT_TRUE(watch.receiver->waitForDeath(dead));
+}
+
+TEST_P(DaemonConformance, whatChangedBeforeTheSenderWasMadeIsNotPushed) {
+  folder("f");
+  file("f/before");
+  settle();
+  const ConformanceWatch watch(daemon());
+  ASSERT_EQ(watch.watch(at("f")), NSError());
+  file("f/after");
+  EXPECT_TRUE(watch.receiver->waitForUpdateOfName("after"));
+  EXPECT_FALSE(hasName(watch.receiver->items(), "before"));
+}
+
 TEST_P(DaemonConformance, aWatcherIsPushedTheDeathsOfChildren) {
   folder("f");
   file("f/a");
