@@ -70,8 +70,8 @@ void ContentsStorage::discardTemporary(const std::string &temporary) const {
 // Marker, date and mode of a finished file, and all of it durable. The mode comes last: attributes can't be
 // set on a file that may not be written.
 int ContentsStorage::completeFile(int file, const DocumentMarker &marker, std::uint32_t mode) const {
-  const int error = WriteMarker(file, marker);
-  if (error != 0 && (capabilities_.extendedAttributes || error == EINVAL)) return error;
+  if (capabilities_.extendedAttributes)
+    if (const int error = WriteMarker(file, marker); error != 0) return error;
   // Some file systems know no such modes; they have no better ones.
   if (::fchmod(file, mode & 07777) != 0 && (errno != EPERM || capabilities_.extendedAttributes)) return errno;
   if (const int dateError = SetModified(file, marker.modified); dateError != 0) return dateError;
@@ -187,8 +187,8 @@ PreparedResult ContentsStorage::prepareFolder(const DocumentMarker &marker, std:
   prepared.kind_ = PreparedFile::Kind::folder;
   const OwnedDescriptor folder = OpenFileIn(temporaries_.get(), prepared.temporary_, O_RDONLY | O_DIRECTORY);
   if (!folder) return failedPreparation(errno);
-  const int error = WriteMarker(folder.get(), marker);
-  if (error != 0 && capabilities_.extendedAttributes) return failedPreparation(error);
+  if (capabilities_.extendedAttributes)
+    if (const int error = WriteMarker(folder.get(), marker); error != 0) return failedPreparation(error);
   if (::fchmod(folder.get(), mode & 07777) != 0 && errno != EPERM) return failedPreparation(errno);
   if (::fsync(folder.get()) != 0 && errno != EINVAL) return failedPreparation(errno);
   prepared.facts_ = ReadFolderFacts(folder.get(), device_).value_or(FileFacts{});
