@@ -175,12 +175,9 @@ ContentsResult ContentsStorage::evictToPromise(int folder, const std::string &na
   const DocumentDates dates{marker.birth, document->facts().modified};
   PreparedResult promise = preparePromise(marker, document->facts().mode, dates);
   const std::string promiseName = PromiseNameFor(name);
-  if (const int error = writePromise(promise.file, name); error != 0)
-    return ContentsResult::failedWith(error);
-  if (::renameat(temporaries_.get(), promise.file.temporary_.c_str(), folder, promiseName.c_str()) != 0)
-    return openProblem(errno);
-  promise.file.storage_ = nullptr;
-  if (const int error = SyncFolder(folder); error != 0) return ContentsResult::failedWith(error);
+  const int error = putPromise(folder, name, promise.file);
+  promise.file.storage_ = nullptr;  // what there was of it is at its place
+  if (error != 0) return error == ENOENT ? openProblem(error) : ContentsResult::failedWith(error);
   call(settings_.hooks.beforePunch);
   std::string temporary;
   ContentsResult result =
@@ -190,7 +187,7 @@ ContentsResult ContentsStorage::evictToPromise(int folder, const std::string &na
     return result;
   }
   call(settings_.hooks.afterPunch);
-  if (const int error = SyncFolder(folder); error != 0) return ContentsResult::failedWith(error);
+  if (const int syncError = SyncFolder(folder); syncError != 0) return ContentsResult::failedWith(syncError);
   if (!document->isUntouched()) {
     result = touched(*document);
     result.hasRescued = putBack(temporary, folder, name).hasRescued;

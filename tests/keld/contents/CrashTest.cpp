@@ -40,7 +40,7 @@ class Worker {
     const auto look = replica_.look(name);
     const bool isPromiseForm = replica_.storage().form() == DatalessForm::promise;
     if (look.kind == DocumentClass::dataless) {
-      materialise(document, look);
+      random_() % 3 != 0 ? materialise(document, look) : replace(document, look);
     } else if (look.kind == DocumentClass::evicting) {
       replica_.storage().finishEviction(replica_.folder(), name);
     } else if (look.kind == DocumentClass::present || (isPromiseForm && look.kind == DocumentClass::plain)) {

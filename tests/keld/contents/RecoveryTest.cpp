@@ -82,6 +82,32 @@ TEST_P(Recovering, afterTheExchangeOfContentsRemovesTheOldOnesOrPutsThemBack) {
   EXPECT_TRUE(rescued_.empty());
 }
 
+TEST_P(Recovering, takesNewerContentsForTheCloudsAfterTheyWerePublished) {
+  ASSERT_TRUE(replica_.publishPlaceholder("a", kBytes).isDone());
+  dieIn(replica_.hooks.afterExchange, [&] { replace(); });
+  EXPECT_EQ(replica_.read("a"), kNewer);
+  EXPECT_EQ(replica_.look("a").kind, DocumentClass::present);
+  EXPECT_EQ(replica_.look("a").marker->contentVersion, "2");
+}
+
+TEST_P(Recovering, doesntPutContentsBackThatANewerPromiseReplaced) {
+  if (hasPlaceholders()) return;
+  replica_.publishPresent("a", kBytes);
+  auto newer = replica_.storage().preparePlaceholder(replica_.markerOf(kNewer, "2"), 0640, {0, 5});
+  const auto promise = PromiseNameFor("a");
+  const auto replace = [&] {
+    replica_.storage().replaceContents(replica_.folder(), "a", newer.file, replica_.look("a").facts);
+  };
+  const auto publish = [&] {
+    PromiseFile file{"a", replica_.markerOf(kNewer, "2"), 0640, 5};
+    replica_.write(promise, EncodePromise(file));
+  };
+  dieIn(replica_.hooks.afterExchange, replace, publish);
+  replica_.expectTidy();
+  EXPECT_EQ(replica_.look("a").kind, DocumentClass::dataless);
+  EXPECT_EQ(replica_.look("a").marker->contentVersion, "2");
+}
+
 TEST_P(Recovering, rescuesWhatAUserPutThere) {
   replica_.publishPresent("a", kBytes);
   replica_.hooks.beforeExchange = [&] {
@@ -168,7 +194,7 @@ TEST_P(Recovering, anEvictionIsEndedWhenTheContentsAreGone) {
   dieIn(replica_.hooks.afterPunch, [&] { evict(); });
   const auto look = replica_.look("a");
   if (!hasPlaceholders()) {
-    EXPECT_EQ(look.kind, DocumentClass::present);  // taken out, and put back
+    EXPECT_EQ(look.kind, DocumentClass::dataless);
     return;
   }
   EXPECT_EQ(look.kind, DocumentClass::evicting);
