@@ -195,7 +195,8 @@ class ContentsStorage {
   int copyPart(PartFile &part, PreparedFile *prepared) const;
   void giveBack(PreparedFile &prepared, PartFile &part) const;
   void discardTemporary(const std::string &temporary) const;
-  int writePromise(const PreparedFile &prepared, const std::string &name) const;
+  int writePromise(const std::string &temporary, const PreparedFile &prepared, const std::string &name) const;
+  int putPromise(int folder, const std::string &name, const PreparedFile &prepared) const;
 
   // Replacing (Replacement.cpp). The file at the name comes out under the prepared file's temporary name.
   ContentsResult replaceOpened(int folder, const std::string &name, PreparedFile &prepared,

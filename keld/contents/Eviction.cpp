@@ -76,6 +76,15 @@ bool isTheContents(const FileFacts &facts, const FileFacts &expected, const Docu
          facts.modified == marker.modified;
 }
 
+// To the end of the last block: one that is punched in part is filled with zeros, not let go of.
+int punch(int file, std::uint64_t size) {
+  constexpr std::uint64_t kStep = 1 << 20;
+  const auto length = static_cast<off_t>((size + kStep - 1) / kStep * kStep);
+  while (::fallocate(file, FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, length) != 0)
+    if (errno != EINTR) return errno;
+  return 0;
+}
+
 ContentsResult touched(const OutgoingDocument &document) {
   return ContentsResult::failed(document.hasChanged() ? ContentsOutcome::changedMeanwhile
                                                       : ContentsOutcome::inUse);
@@ -133,11 +142,11 @@ ContentsResult ContentsStorage::letGo(OutgoingDocument &document, DocumentMarker
   };
   call(settings_.hooks.beforePunch);
   if (!document.isUntouched()) return keep(touched(document));
-  // Beyond the end too: blocks that were allocated ahead are worth nothing either.
-  constexpr std::uint64_t kBlock = 4096;
-  const auto length = static_cast<off_t>((marker.size + kBlock - 1) / kBlock * kBlock);
-  if (::fallocate(file, FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, length) != 0)
-    return keep(ContentsResult::failedWith(errno));
+  if (const int error = punch(file, marker.size); error != 0) {
+    // Anything but a plain refusal may have cost contents already: it stays marked, for finishEviction.
+    const auto failed = ContentsResult::failedWith(error);
+    return error == EOPNOTSUPP || error == EPERM || error == ENOSYS ? keep(failed) : failed;
+  }
   call(settings_.hooks.afterPunch);
   // Without leases somebody may have written by now: their time of writing must stay, because it tells so.
   DataCoverage coverage;
@@ -166,12 +175,9 @@ ContentsResult ContentsStorage::evictToPromise(int folder, const std::string &na
   const DocumentDates dates{marker.birth, document->facts().modified};
   PreparedResult promise = preparePromise(marker, document->facts().mode, dates);
   const std::string promiseName = PromiseNameFor(name);
-  if (const int error = writePromise(promise.file, name); error != 0)
-    return ContentsResult::failedWith(error);
-  if (::renameat(temporaries_.get(), promise.file.temporary_.c_str(), folder, promiseName.c_str()) != 0)
-    return openProblem(errno);
-  promise.file.storage_ = nullptr;
-  if (const int error = SyncFolder(folder); error != 0) return ContentsResult::failedWith(error);
+  const int error = putPromise(folder, name, promise.file);
+  promise.file.storage_ = nullptr;  // what there was of it is at its place
+  if (error != 0) return error == ENOENT ? openProblem(error) : ContentsResult::failedWith(error);
   call(settings_.hooks.beforePunch);
   std::string temporary;
   ContentsResult result =
@@ -181,7 +187,7 @@ ContentsResult ContentsStorage::evictToPromise(int folder, const std::string &na
     return result;
   }
   call(settings_.hooks.afterPunch);
-  if (const int error = SyncFolder(folder); error != 0) return ContentsResult::failedWith(error);
+  if (const int syncError = SyncFolder(folder); syncError != 0) return ContentsResult::failedWith(syncError);
   if (!document->isUntouched()) {
     result = touched(*document);
     result.hasRescued = putBack(temporary, folder, name).hasRescued;

@@ -70,8 +70,8 @@ void ContentsStorage::discardTemporary(const std::string &temporary) const {
 // Marker, date and mode of a finished file, and all of it durable. The mode comes last: attributes can't be
 // set on a file that may not be written.
 int ContentsStorage::completeFile(int file, const DocumentMarker &marker, std::uint32_t mode) const {
-  const int error = WriteMarker(file, marker);
-  if (error != 0 && (capabilities_.extendedAttributes || error == EINVAL)) return error;
+  if (capabilities_.extendedAttributes)
+    if (const int error = WriteMarker(file, marker); error != 0) return error;
   // Some file systems know no such modes; they have no better ones.
   if (::fchmod(file, mode & 07777) != 0 && (errno != EPERM || capabilities_.extendedAttributes)) return errno;
   if (const int dateError = SetModified(file, marker.modified); dateError != 0) return dateError;
@@ -95,6 +95,8 @@ PreparedResult ContentsStorage::prepareEmptyFile(const DocumentMarker &marker, s
   if (!file) return failedPreparation(errno);
   prepared.storage_ = this;
   prepared.kind_ = PreparedFile::Kind::placeholder;
+  prepared.marker_ = marker;
+  prepared.mode_ = mode & 07777;
   if (::ftruncate(file.get(), static_cast<off_t>(marker.size)) != 0) return failedPreparation(errno);
   int error = completeFile(file.get(), marker, mode);
   if (error == 0 && modified != marker.modified) {
@@ -119,10 +121,24 @@ PreparedResult ContentsStorage::preparePromise(const DocumentMarker &marker, std
   return {{}, std::move(prepared)};
 }
 
-int ContentsStorage::writePromise(const PreparedFile &prepared, const std::string &name) const {
-  const PromiseFile promise{name, prepared.marker_, prepared.mode_, prepared.facts_.modified};
-  ::unlinkat(temporaries_.get(), prepared.temporary_.c_str(), 0);  // of a name that was taken
-  return WriteSmallFile(temporaries_.get(), prepared.temporary_, EncodePromise(promise), 0600);
+int ContentsStorage::writePromise(const std::string &temporary, const PreparedFile &prepared,
+                                  const std::string &name) const {
+  PromiseFile promise{name, prepared.marker_, prepared.mode_, prepared.facts_.modified};
+  promise.marker.state = MarkerState::dataless;
+  ::unlinkat(temporaries_.get(), temporary.c_str(), 0);  // of a name that was taken
+  return WriteSmallFile(temporaries_.get(), temporary, EncodePromise(promise), 0600);
+}
+
+// In the place of the document's promise, if there is one.
+int ContentsStorage::putPromise(int folder, const std::string &name, const PreparedFile &prepared) const {
+  const std::string temporary = newTemporary(TemporaryKind::promise);
+  if (const int error = writePromise(temporary, prepared, name); error != 0) return error;
+  const std::string promiseName = PromiseNameFor(name);
+  if (::renameat(temporaries_.get(), temporary.c_str(), folder, promiseName.c_str()) == 0)
+    return SyncFolder(folder);
+  const int error = errno;
+  ::unlinkat(temporaries_.get(), temporary.c_str(), 0);
+  return error;
 }
 
 // The part's file moves, and its lock with it.
@@ -157,6 +173,8 @@ PreparedResult ContentsStorage::prepareContents(PartFile &part, PartUse use, Doc
     return failedPreparation(EINVAL);
   PreparedFile prepared;
   prepared.kind_ = PreparedFile::Kind::contents;
+  prepared.marker_ = marker;
+  prepared.mode_ = mode & 07777;
   int error = use == PartUse::consume ? takePart(part, &prepared) : copyPart(part, &prepared);
   if (error == 0) error = completeFile(prepared.file_.get(), marker, mode);
   if (error == 0) error = SyncFolder(temporaries_.get());
@@ -187,8 +205,8 @@ PreparedResult ContentsStorage::prepareFolder(const DocumentMarker &marker, std:
   prepared.kind_ = PreparedFile::Kind::folder;
   const OwnedDescriptor folder = OpenFileIn(temporaries_.get(), prepared.temporary_, O_RDONLY | O_DIRECTORY);
   if (!folder) return failedPreparation(errno);
-  const int error = WriteMarker(folder.get(), marker);
-  if (error != 0 && capabilities_.extendedAttributes) return failedPreparation(error);
+  if (capabilities_.extendedAttributes)
+    if (const int error = WriteMarker(folder.get(), marker); error != 0) return failedPreparation(error);
   if (::fchmod(folder.get(), mode & 07777) != 0 && errno != EPERM) return failedPreparation(errno);
   if (::fsync(folder.get()) != 0 && errno != EINVAL) return failedPreparation(errno);
   prepared.facts_ = ReadFolderFacts(folder.get(), device_).value_or(FileFacts{});
@@ -207,7 +225,8 @@ ContentsResult ContentsStorage::publishAtFreeName(PreparedFile &prepared, int fo
                                                   const std::string &name) const {
   std::string target = name;
   if (prepared.kind_ == PreparedFile::Kind::promise) {
-    if (const int error = writePromise(prepared, name); error != 0) return ContentsResult::failedWith(error);
+    if (const int error = writePromise(prepared.temporary_, prepared, name); error != 0)
+      return ContentsResult::failedWith(error);
     target = PromiseNameFor(name);
   }
   switch (const int error = RenameIfFree(temporaries_.get(), prepared.temporary_, folder, target)) {

@@ -8,6 +8,7 @@
 #include "keld/contents/ExchangeNote.h"
 #include "keld/contents/FileSteps.h"
 #include "keld/contents/OutgoingDocument.h"
+#include "keld/contents/PromiseFile.h"
 #include "keld/contents/StorageNames.h"
 
 // The part of ContentsStorage that knows whose a file in the storage is. The rule: what may be the user's is
@@ -127,25 +128,27 @@ void ContentsStorage::recoverTemporary(const std::string &temporary) const {
   }
 }
 
+// A document that was taken out goes back, unless its promise (or its successor's) stands already: then it
+// was let go of, and goes back only if somebody wrote into it.
 void ContentsStorage::recoverOutgoing(const std::string &temporary, const ExchangeNote &note) const {
-  if (temporary.front() == static_cast<char>(TemporaryKind::takenOut)) {
-    const OwnedDescriptor folder = openNoted(note);
-    if (folder && RenameIfFree(temporaries_.get(), temporary, folder.get(), note.name) == 0) {
-      SyncFolder(folder.get());
-      removeNote(temporary);
-      return;
-    }
-  }
+  const bool isTakenOut = temporary.front() == static_cast<char>(TemporaryKind::takenOut);
+  const OwnedDescriptor folder = isTakenOut ? openNoted(note) : OwnedDescriptor();
+  const auto putBackIfFree = [&] {
+    if (!folder || RenameIfFree(temporaries_.get(), temporary, folder.get(), note.name) != 0) return false;
+    SyncFolder(folder.get());
+    removeNote(temporary);
+    return true;
+  };
+  if (folder && !ReadPromise(folder.get(), PromiseNameFor(note.name)) && putBackIfFree()) return;
   std::optional<OutgoingDocument> document;
   const OutgoingDocument::Watch watch{FileLease::Against::writers, capabilities_.leases, device_};
   const ContentsResult opened = OutgoingDocument::open(temporaries_.get(), temporary, watch, &document);
-  if (opened.outcome == ContentsOutcome::inUse) return;  // the next recovery will know
   const bool isSame = document && document->facts().inode == note.outgoing.inode;
   const bool isClean =
       isSame && (note.wasDataless ? document->isDataless() : fileOf(document->facts()) == note.outgoing);
   if (isClean)
     dispose(temporary);
-  else
+  else if (!putBackIfFree() && opened.outcome != ContentsOutcome::inUse)  // the next recovery will know
     rescue(temporary);
 }
 

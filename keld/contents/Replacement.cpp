@@ -139,12 +139,14 @@ ContentsResult ContentsStorage::fulfilPromise(int folder, const std::string &nam
   const auto promise = ReadFileFacts(folder, promiseName, device_);
   if (!promise) return ContentsResult::failed(ContentsOutcome::gone);
   if (promise->inode != expected.inode) return ContentsResult::failed(ContentsOutcome::changedMeanwhile);
+  const auto told = ReadPromise(folder, promiseName);
+  DocumentMarker wanted = prepared.marker_;
+  wanted.state = MarkerState::dataless;
+  // A promise of other contents would make the new ones look like the user's, if this ended here.
+  if (!told || told->marker != wanted || prepared.kind_ == PreparedFile::Kind::promise)
+    if (const int error = putPromise(folder, name, prepared); error != 0) return notThere(error);
   if (prepared.kind_ == PreparedFile::Kind::promise) {
-    if (const int error = writePromise(prepared, name); error != 0) return ContentsResult::failedWith(error);
-    if (::renameat(temporaries_.get(), prepared.temporary_.c_str(), folder, promiseName.c_str()) != 0)
-      return notThere(errno);
     prepared.storage_ = nullptr;
-    if (const int error = SyncFolder(folder); error != 0) return ContentsResult::failedWith(error);
     return succeeded(folder, promiseName);
   }
   ContentsResult result = publishAtFreeName(prepared, folder, name);
