@@ -40,6 +40,10 @@ CKOperation::Attempt CKFetchAssetOperation::transfer(const CKCallContext &contex
     // Final, whatever its domain and code.
     return {CKErrorIsTransient(refused) ? NSError() : refused, true};
   }
+  if (!error && endOffset_ < asset.size) {
+    return {CKErrorMake(CKErrorCode::networkFailure, "The transfer ended early: " + asset.description()),
+            endOffset_ > start};
+  }
   return {error, endOffset_ > start};
 }
 
