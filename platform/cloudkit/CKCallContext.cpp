@@ -1,5 +1,7 @@
 #include "platform/cloudkit/CKCallContext.h"
 
+#include <algorithm>
+
 #include "platform/cloudkit/CKError.h"
 
 namespace droxa {
@@ -28,16 +30,21 @@ CKCallContext CKCallContext::withTimeout(std::chrono::milliseconds timeout) {
   return context;
 }
 
+CKCallContext::Clock::time_point CKCallContext::effectiveDeadline() const {
+  return idleDeadline ? std::min(deadline, idleDeadline->time()) : deadline;
+}
+
 NSError CKCallContext::check() const {
   if (isCancelled()) return CKErrorMake(CKErrorCode::operationCancelled, "The call was cancelled");
-  if (deadline != Clock::time_point::max() && Clock::now() >= deadline) {
+  const Clock::time_point last = effectiveDeadline();
+  if (last != Clock::time_point::max() && Clock::now() >= last) {
     return CKErrorMakeTimeout("The call's deadline passed");
   }
   return {};
 }
 
 NSError CKCallContext::waitUntil(Clock::time_point time) const {
-  const Clock::time_point end = time < deadline ? time : deadline;
+  const Clock::time_point end = std::min(time, effectiveDeadline());
   // Without a cancellation of its own the wait uses one that nobody sets.
   if (cancellation) {
     cancellation->waitUntil(end);

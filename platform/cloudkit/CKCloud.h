@@ -158,6 +158,7 @@ class CKCloud {
   // Saves and deletes. File assets are uploaded first, outside of the transaction; the saved records hold
   // references to them. A saved record answers all its fields and its new change tag. Deleting what isn't
   // there succeeds. Records with no error of one call become visible to others at once.
+  // An atomic call that fails has looked at the other records all the same: every conflict is told at once.
   // Per record: serverRecordChanged, unknownItem (a tag was given and the record is gone), zoneNotFound,
   // invalidArguments, limitExceeded (too large), quotaExceeded, assetFileNotFound, assetFileModified; in an
   // atomic call that failed batchRequestFailed for the others. Of the call: limitExceeded, invalidArguments

@@ -33,7 +33,9 @@ class CKFetchAssetOperation final : public CKOperation {
  private:
   NSError perform() override;
   void complete(const NSError &error) override;
+  Attempt transfer(const CKCallContext &context);
   NSError take(std::span<const std::uint8_t> bytes);
+  NSError sinkError_;
   std::uint64_t endOffset_ = 0;
   std::optional<CKDigest> digest_;
 };

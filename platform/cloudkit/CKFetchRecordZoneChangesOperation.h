@@ -26,7 +26,8 @@ class CKFetchRecordZoneChangesOperation final : public CKOperation {
   std::function<void(const CKServerChangeToken &token, bool moreComing, const NSError &error)>
       fetchRecordZoneChangesCompletionBlock;
 
-  const CKServerChangeToken &serverChangeToken() const { return token_; }
+  // Of the last page, or the previous one before there is any.
+  const CKServerChangeToken &serverChangeToken() const { return token(); }
   bool moreComing() const { return moreComing_; }
 
  private:
@@ -34,6 +35,7 @@ class CKFetchRecordZoneChangesOperation final : public CKOperation {
   void complete(const NSError &error) override;
   NSError fetchPage();
   void tell(const CKZoneChanges &page);
+  const CKServerChangeToken &token() const { return token_ ? token_ : previousServerChangeToken; }
   CKServerChangeToken token_;
   bool moreComing_ = true;
 };

@@ -28,6 +28,7 @@ class CKFetchRecordsOperation final : public CKOperation {
  private:
   NSError perform() override;
   void complete(const NSError &error) override;
+  void tell(CKRecordResult result);
   std::vector<CKRecordResult> results_;
 };
 

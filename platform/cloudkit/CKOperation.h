@@ -72,15 +72,19 @@ class CKOperation : public NSOperation {
     NSError error;            // its outcome; transient: tried again if there is time
     bool progressed = false;  // something was got done: the next delay starts small again
   };
+  // A call must end in time; a transfer must keep moving.
+  enum class Timing { call, transfer };
   // Calls `attempt` until it doesn't answer a transient error, it may not be retried, there is no time left
   // or the operation is cancelled. Returns the last error.
-  NSError retrying(const std::function<Attempt(const CKCallContext &context)> &attempt);
+  NSError retrying(Timing timing, const std::function<Attempt(const CKCallContext &context)> &attempt);
   // Says that the transfer of the running attempt moved on, and so may take its time anew.
   void noteProgress();
 
  private:
   friend class CKDatabase;
+  bool attach(std::shared_ptr<CKCloud> cloud);  // false: it was added before
   void main() final;
+  Attempt attemptOnce(Timing timing, const std::function<Attempt(const CKCallContext &context)> &attempt);
   struct State;
   const std::unique_ptr<State> ckState_;
 };

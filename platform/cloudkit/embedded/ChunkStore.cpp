@@ -54,6 +54,8 @@ int ChunkStore::create() const {
   for (const std::string &path : {chunks_, unfinished_, damaged_}) {
     if (const int code = makeFolder(path); code != 0) return code;
   }
+  struct stat last {};  // is made last: where it is, all are
+  if (stat((chunks_ + "/" + folderName(255)).c_str(), &last) == 0) return 0;
   for (unsigned i = 0; i < 256; ++i) {
     if (const int code = makeFolder(chunks_ + "/" + folderName(i)); code != 0) return code;
   }

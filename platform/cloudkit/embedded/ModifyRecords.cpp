@@ -47,7 +47,8 @@ class Modification {
       NSError error = home_.run(Home::Access::write, context_, [this](const Connection &connection) {
         remove(connection);
         save(connection);
-        if (mustGiveUp()) throw CallFailed{};  // rolls back; the results say why
+        // Only now, so that every conflict is told. Rolls back; the results say why.
+        if (mustGiveUp()) throw CallFailed{};
       });
       if (error) return {error, {}, {}};
     }
@@ -90,7 +91,7 @@ class Modification {
   void remove(const Connection &connection) {
     for (std::size_t i = 0; i < reply_.deleted.size(); ++i) {
       NSError &error = reply_.deleted[i].error;
-      if (error || mustGiveUp()) continue;
+      if (error) continue;
       try {
         RecordSaver(home_, connection).remove(request_.recordsToDelete[i]);
       } catch (const CallFailed &failed) {
@@ -102,7 +103,7 @@ class Modification {
   void save(const Connection &connection) {
     for (std::size_t i = 0; i < records_.size(); ++i) {
       CKRecordResult &result = reply_.saved[i];
-      if (result.error || mustGiveUp()) continue;
+      if (result.error) continue;
       try {
         result.record = RecordSaver(home_, connection).save(records_[i], request_.savePolicy);
       } catch (const CallFailed &failed) {

@@ -1,0 +1,30 @@
+#pragma once
+
+#include "platform/cloudkit/EmbeddedCloud.h"
+#include "tests/platform/TemporaryFolder.h"
+
+namespace droxa {
+
+// A cloud in a folder of the test's own.
+class EmbeddedWorld {
+ public:
+  std::shared_ptr<EmbeddedCloud> openEmbedded(const std::string &deviceName) const {
+    NSError error;
+    auto cloud = EmbeddedCloud::open(folder(), "account", deviceName, &error);
+    EXPECT_TRUE(cloud) << error.description();
+    return cloud;
+  }
+  std::shared_ptr<CKCloud> open(const std::string &deviceName) const { return openEmbedded(deviceName); }
+  std::shared_ptr<CKCloud> openAnotherCloud(const std::string &deviceName) const {
+    return EmbeddedCloud::open(folder_.path() + "/another", "account", deviceName, nullptr);
+  }
+  void setQuota(std::optional<std::uint64_t> bytes) const {
+    EXPECT_FALSE(openEmbedded("quota")->setQuota(bytes, {}));
+  }
+  std::string folder() const { return folder_.path() + "/cloud"; }
+
+ private:
+  const TemporaryFolder folder_;
+};
+
+}  // namespace droxa

@@ -1,0 +1,24 @@
+#include "tests/platform/cloudkit/CloudContract.h"
+#include "tests/platform/cloudkit/EmbeddedWorld.h"
+#include "tests/support/FaultyCloud.h"
+
+namespace droxa {
+
+// The decorator without faults.
+class FaultlessWorld {
+ public:
+  std::shared_ptr<CKCloud> open(const std::string &deviceName) const {
+    return std::make_shared<FaultyCloud>(world_.open(deviceName));
+  }
+  std::shared_ptr<CKCloud> openAnotherCloud(const std::string &deviceName) const {
+    return std::make_shared<FaultyCloud>(world_.openAnotherCloud(deviceName));
+  }
+  void setQuota(std::optional<std::uint64_t> bytes) const { world_.setQuota(bytes); }
+
+ private:
+  const EmbeddedWorld world_;
+};
+
+DROXA_CLOUD_CONTRACT(FaultyCloud, FaultlessWorld)
+
+}  // namespace droxa
