@@ -29,6 +29,7 @@ using NSFileProviderChangesCompletion =
                        const NSData &anchor, bool moreComing, const NSError &error)>;
 using NSFileProviderAnchorCompletion = std::function<void(const NSData &anchor)>;
 using NSFileProviderErrorCompletion = std::function<void(const NSError &error)>;
+using NSFileProviderMovingCompletion = std::function<void(bool requiresProviding, const NSError &error)>;
 
 // An enumerator of another process. Releasing the last reference to a received one releases the real one.
 // A received one has no proxy and no error handler of its own: a failure of the transport is given to the
