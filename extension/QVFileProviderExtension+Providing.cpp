@@ -96,23 +96,28 @@ void QVFileProviderExtension::downloadEnded(const std::string &path, std::uint64
   QVLogSectionEnd(section);
 }
 
+std::shared_ptr<NSOperation> QVFileProviderExtension::downloadAtPath(const std::string &path) {
+  const RecursiveLock lock(_lock);
+  const auto found = _downloadOperationByPath.find(path);
+  return found == _downloadOperationByPath.end() ? nullptr : found->second;
+}
+
 void QVFileProviderExtension::stopProvidingItemAtURL(const NSURL &url) {
   const std::string path = url.path();
   os_log_debug(qvc_default_log(), "[DEBUG] stop providing %@", path);
   if (isDownloadForced(url)) return;
-  std::shared_ptr<NSOperation> operation;
-  {
-    const RecursiveLock lock(_lock);
-    const auto found = _downloadOperationByPath.find(path);
-    if (found != _downloadOperationByPath.end()) operation = found->second;
-  }
   // Its completion removes the entry and tells the framework.
-  if (operation) return operation->cancel();
+  if (const auto operation = downloadAtPath(path)) return operation->cancel();
   NSError error;
   if (!NSFileManager::defaultManager()->evictUbiquitousItemAtURL(url, &error)) {
     // The error it is that stands where the text says "url".
     os_log_error(qvc_default_log(), "[ERROR] can't evict item at url: %@", error);
   }
+}
+
+void QVFileProviderExtension::cancelProvidingItemAtURL(const NSURL &url) {
+  if (!downloadAtPath(url.path()) || isDownloadForced(url)) return;
+  if (const auto operation = downloadAtPath(url.path())) operation->cancel();
 }
 
 // Whether a move under way needs the contents at `url`. The list stays locked while the daemon is asked, so

@@ -79,6 +79,7 @@ class QVFileProviderExtension final : public NSFileProviderExtension {
                                NSFileProviderErrorCompletion completion) override;
   void startProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
   void stopProvidingItemAtURL(const NSURL &url) override;
+  void cancelProvidingItemAtURL(const NSURL &url) override;
   void itemChangedAtURL(const NSURL &url) override;
   void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
   void movingItemAtURL_requiresProvidingWithDestinationURL(
@@ -101,6 +102,7 @@ class QVFileProviderExtension final : public NSFileProviderExtension {
   void downloadEnded(const std::string &path, std::uint64_t section, const NSError &error,
                      const NSFileProviderErrorCompletion &completion);
   bool isDownloadForced(const NSURL &url);
+  std::shared_ptr<NSOperation> downloadAtPath(const std::string &path);
 
   RecursiveMutex _lock;                    // the instance's own monitor
   mutable Mutex _itemsForcedDownloadLock;  // never held together with the monitor

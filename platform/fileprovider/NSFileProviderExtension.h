@@ -43,6 +43,9 @@ class NSFileProviderExtension : public NSObject,
   // Nobody needs the contents any more: ends the providing under way, which then completes with an error;
   // where none is, lets go of the contents.
   virtual void stopProvidingItemAtURL(const NSURL &url) = 0;
+  // The first half of that alone: whoever waited no longer does, which is no reason to let go of contents
+  // that have come in between.
+  virtual void cancelProvidingItemAtURL(const NSURL &url) = 0;
   virtual void itemChangedAtURL(const NSURL &url) = 0;
   virtual void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) = 0;
   // Whether the move needs the contents first.

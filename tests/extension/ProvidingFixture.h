@@ -52,6 +52,11 @@ class ProvidingTest : public ExtensionTest {
     })) << line;
     return logged();
   }
+  Lines faults() const {
+    Lines lines = logLines(capture);
+    std::erase_if(lines, [](const std::string &line) { return !line.starts_with("fault: "); });
+    return lines;
+  }
   static std::string starting(const NSURL &url, int section, const std::string &options = "0 (none)") {
     return "debug: [DEBUG] ┣<" + std::to_string(section) + "> start providing " + url.path() +
            " (readingOptions: " + options + ")";

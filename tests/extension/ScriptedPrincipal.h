@@ -45,6 +45,7 @@ class ScriptedPrincipal final : public NSFileProviderExtension {
     startProvidingItemAtURL(asked, 0, std::move(completion));
   }
   void stopProvidingItemAtURL(const NSURL &asked) override { log.add("stop " + asked.path()); }
+  void cancelProvidingItemAtURL(const NSURL &asked) override { log.add("cancel " + asked.path()); }
   void itemChangedAtURL(const NSURL &asked) override { log.add("changed " + asked.path()); }
   void providePlaceholderAtURL(const NSURL &asked, NSFileProviderErrorCompletion completion) override {
     log.add("placeholder " + asked.path());

@@ -5,6 +5,7 @@
 #include <map>
 #include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "fileproviderd/ExtensionConnecting.h"
@@ -73,6 +74,28 @@ class ScriptedEnumerator final : public NSFileProviderRemoteEnumerator {
   Arrivals<EnumeratorCall> calls;
 };
 
+// A providing that the test ends: with an outcome, or by the end of its extension.
+class ScriptedProviding final : public FPDProviding, public NSXPCProxyCreating<FPDProviding> {
+ public:
+  void waitWithReply(NSFileProviderErrorCompletion completion) override { reply_ = std::move(completion); }
+  void cancel() override { ++cancels; }
+  std::shared_ptr<FPDProviding> remoteObjectProxyWithErrorHandler(NSXPCErrorHandler handler) override {
+    handler_ = std::move(handler);
+    return {this, [](FPDProviding *) {}};  // the test keeps it
+  }
+  void end(const NSError &error) { std::exchange(reply_, nullptr)(error); }
+  void cutOff(const NSError &error) {
+    reply_ = nullptr;
+    std::exchange(handler_, nullptr)(error);
+  }
+  bool isWaitedFor() const { return reply_ != nullptr; }
+  int cancels = 0;
+
+ private:
+  NSFileProviderErrorCompletion reply_;
+  NSXPCErrorHandler handler_;
+};
+
 // An extension whose items and URLs the test sets, and whose enumerators it answers itself.
 class ScriptedExtension final : public NSFileProviderExtensionProtocol {
  public:
@@ -81,6 +104,13 @@ class ScriptedExtension final : public NSFileProviderExtensionProtocol {
   void identifierForItemAtURL(const NSURL &url, NSFileProviderIdentifierCompletion completion) override;
   void enumeratorForContainer(const std::string &identifier,
                               NSFileProviderEnumeratorCompletion completion) override;
+  void startProvidingItemAtURL(const NSURL &url, std::uint64_t readingOptions,
+                               FPDProvidingCompletion completion) override;
+  void stopProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
+  void itemChangedAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
+  void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
+  void movingItemAtURL(const NSURL &url, const NSURL &destination,
+                       NSFileProviderMovingCompletion completion) override;
 
   // An item at a path of the disk.
   void add(const std::string &identifier, const std::string &path, const NSFileProviderItemFields &fields);
@@ -92,7 +122,8 @@ class ScriptedExtension final : public NSFileProviderExtensionProtocol {
   Arrivals<std::string> asked;
   Arrivals<std::shared_ptr<ScriptedEnumerator>> enumerators;  // handed out, in order
   Arrivals<std::string> opened;
-  std::deque<NSError> openFailures;  // answers of the next enumerator requests
+  std::vector<std::shared_ptr<ScriptedProviding>> providings;  // handed out, in order
+  std::deque<NSError> openFailures;                            // answers of the next enumerator requests
 };
 
 // Always gives the extension, unless the next calls are to fail in transport.
