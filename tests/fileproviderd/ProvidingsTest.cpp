@@ -2,8 +2,10 @@
 
 #include "fileproviderd/HostServices.h"
 #include "fileproviderd/Providings.h"
+#include "platform/fileprovider/xpc/FileProviderInterfaces.h"
 #include "tests/fileproviderd/ScriptedExtension.h"
 #include "tests/support/Once.h"
+#include "tests/xpc/ConnectedPair.h"
 
 namespace droxa::testing {
 namespace {
@@ -163,6 +165,67 @@ TEST_F(ProvidingsTest, clientsAreGivenTheURLOfWhatTheyNamed) {
   control->startProvidingItemAtPath("/missing", 0, atPath.completion());
   EXPECT_FALSE(atPath.value<0>());
   EXPECT_TRUE(atPath.value<2>());
+}
+
+// A client in another process.
+class ConnectedProvidingsTest : public ProvidingsTest {
+ protected:
+  ConnectedProvidingsTest() {
+    extension->add("d1", "/r/a.txt", {});
+    pair.serve<FPDControlProtocol>(
+        FPDControlInterface(),
+        std::make_shared<ControlService>(calls, std::make_shared<FollowedContainers>(calls), "/r",
+                                         [] { return FPDStatus(); }));
+  }
+  std::shared_ptr<FPDProviding> startOverConnection() {
+    const Once<std::shared_ptr<FPDProviding>, NSURL, NSError> answer("providing");
+    pair.client
+        ->remoteObjectProxyWithErrorHandler<FPDControlProtocol>(
+            [](const NSError &error) { ADD_FAILURE() << error.description(); })
+        ->startProvidingItemWithIdentifier("d1", 1, answer.completion());
+    EXPECT_EQ(answer.value<1>().path(), "/r/a.txt");
+    return answer.value<0>();
+  }
+  ConnectedPair pair;
+};
+
+TEST_F(ConnectedProvidingsTest, aClientIsToldOfTheEnd) {
+  const auto providing = startOverConnection();
+  const Once<NSError> end("end");
+  providing->waitWithReply(end.completion());
+  extensions(0).end(kOffline);
+  EXPECT_EQ(end.value<0>(), kOffline);
+}
+
+TEST_F(ConnectedProvidingsTest, aClientThatDiesEndsWhatItWanted) {
+  const auto providing = startOverConnection();
+  providing->waitWithReply([](const NSError &) { ADD_FAILURE() << "the reply ran"; });
+  pair.client->invalidate();
+  EXPECT_TRUE(eventually([this] { return extensions(0).cancels == 1; }));
+  extensions(0).end({});
+}
+
+TEST_F(ConnectedProvidingsTest, aClientThatLetsGoEndsWhatItWanted) {
+  startOverConnection().reset();
+  EXPECT_TRUE(eventually([this] { return extensions(0).cancels == 1; }));
+  extensions(0).end({});
+  EXPECT_EQ(extension->asked.take(), "url d1");
+  EXPECT_EQ(extension->asked.take(), "start /r/a.txt, 1");
+  EXPECT_EQ(extension->asked.size(), 0U);
+}
+
+TEST_F(ConnectedProvidingsTest, theOtherQuestionsCrossToo) {
+  const auto control = pair.client->remoteObjectProxyWithErrorHandler<FPDControlProtocol>(nullptr);
+  const Once<NSError> stopped("stop");
+  control->stopProvidingItemAtURL(url, stopped.completion());
+  EXPECT_EQ(stopped.value<0>(), NSError());
+  const Once<bool, NSError> moving("move");
+  control->movingItemAtURL(url, NSURL::fileURLWithPath("/r/b"), moving.completion());
+  EXPECT_TRUE(moving.value<0>());
+  const Once<std::shared_ptr<FPDProviding>, NSURL, NSError> missing("missing");
+  control->startProvidingItemAtPath("/missing", 0, missing.completion());
+  EXPECT_FALSE(missing.value<0>());
+  EXPECT_TRUE(missing.value<2>());
 }
 
 }  // namespace

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <atomic>
 #include <condition_variable>
 #include <deque>
 #include <map>
@@ -74,26 +75,46 @@ class ScriptedEnumerator final : public NSFileProviderRemoteEnumerator {
   Arrivals<EnumeratorCall> calls;
 };
 
-// A providing that the test ends: with an outcome, or by the end of its extension.
-class ScriptedProviding final : public FPDProviding, public NSXPCProxyCreating<FPDProviding> {
+// A providing that the test ends: with an outcome, or by the end of its extension. Thread contract: any
+// thread.
+class ScriptedProviding final : public FPDProviding,
+                                public NSXPCProxyCreating<FPDProviding>,
+                                public std::enable_shared_from_this<ScriptedProviding> {
  public:
-  void waitWithReply(NSFileProviderErrorCompletion completion) override { reply_ = std::move(completion); }
+  void waitWithReply(NSFileProviderErrorCompletion completion) override {
+    const Lock held(lock_);
+    reply_ = std::move(completion);
+  }
   void cancel() override { ++cancels; }
   std::shared_ptr<FPDProviding> remoteObjectProxyWithErrorHandler(NSXPCErrorHandler handler) override {
+    const Lock held(lock_);
     handler_ = std::move(handler);
-    return {this, [](FPDProviding *) {}};  // the test keeps it
+    return shared_from_this();
   }
-  void end(const NSError &error) { std::exchange(reply_, nullptr)(error); }
+  void end(const NSError &error) {
+    NSFileProviderErrorCompletion reply;
+    {
+      const Lock held(lock_);
+      reply.swap(reply_);
+    }
+    reply(error);
+  }
   void cutOff(const NSError &error) {
-    reply_ = nullptr;
-    std::exchange(handler_, nullptr)(error);
+    NSXPCErrorHandler handler;
+    NSFileProviderErrorCompletion dropped;
+    {
+      const Lock held(lock_);
+      handler.swap(handler_);
+      dropped.swap(reply_);
+    }
+    handler(error);
   }
-  bool isWaitedFor() const { return reply_ != nullptr; }
-  int cancels = 0;
+  std::atomic<int> cancels{0};
 
  private:
-  NSFileProviderErrorCompletion reply_;
-  NSXPCErrorHandler handler_;
+  Mutex lock_;
+  NSFileProviderErrorCompletion reply_ GUARDED_BY(lock_);
+  NSXPCErrorHandler handler_ GUARDED_BY(lock_);
 };
 
 // An extension whose items and URLs the test sets, and whose enumerators it answers itself.
