@@ -3,6 +3,7 @@
 #include <utility>
 
 #include "extension/HostedEnumerator.h"
+#include "extension/HostedProviding.h"
 #include "platform/fileprovider/NSFileProviderError.h"
 
 namespace droxa {
@@ -41,6 +42,30 @@ void HostedExtension::enumeratorForContainer(const std::string &identifier,
   auto enumerator = principal_->enumeratorForContainerItemIdentifier(identifier, &error);
   if (!enumerator) return completion(nullptr, ErrorOrNoSuchItem(error, identifier));
   completion(std::make_shared<HostedEnumerator>(std::move(enumerator)), {});
+}
+
+void HostedExtension::startProvidingItemAtURL(const NSURL &url, std::uint64_t readingOptions,
+                                              FPDProvidingCompletion completion) {
+  completion(HostedProviding::start(principal_, url, readingOptions), {});
+}
+
+void HostedExtension::stopProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) {
+  principal_->stopProvidingItemAtURL(url);
+  completion({});
+}
+
+void HostedExtension::itemChangedAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) {
+  principal_->itemChangedAtURL(url);
+  completion({});
+}
+
+void HostedExtension::providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) {
+  principal_->providePlaceholderAtURL(url, std::move(completion));
+}
+
+void HostedExtension::movingItemAtURL(const NSURL &url, const NSURL &destination,
+                                      NSFileProviderMovingCompletion completion) {
+  principal_->movingItemAtURL_requiresProvidingWithDestinationURL(url, destination, std::move(completion));
 }
 
 }  // namespace droxa

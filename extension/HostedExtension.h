@@ -8,10 +8,11 @@
 
 namespace droxa {
 
-// The principal object as the host sees it: each request is one of the principal's synchronous operations.
+// The principal object as the host sees it: each request is one of the principal's operations.
 // Thread contract: any thread, several requests at a time. A request blocks its caller, which is the
 // connection's pool, while the principal waits for the daemon; its completion is called exactly once, before
-// the request returns.
+// the request returns (those of the last two, when the principal answers). What is being provided goes on
+// after that, without a thread.
 class HostedExtension final : public NSFileProviderExtensionProtocol {
  public:
   explicit HostedExtension(std::shared_ptr<NSFileProviderExtension> principal);
@@ -23,6 +24,14 @@ class HostedExtension final : public NSFileProviderExtensionProtocol {
   // Without an enumerator there always is an error.
   void enumeratorForContainer(const std::string &identifier,
                               NSFileProviderEnumeratorCompletion completion) override;
+  // Always with a providing, which holds the download: see HostedProviding.
+  void startProvidingItemAtURL(const NSURL &url, std::uint64_t readingOptions,
+                               FPDProvidingCompletion completion) override;
+  void stopProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
+  void itemChangedAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
+  void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
+  void movingItemAtURL(const NSURL &url, const NSURL &destination,
+                       NSFileProviderMovingCompletion completion) override;
 
  private:
   const std::shared_ptr<NSFileProviderExtension> principal_;

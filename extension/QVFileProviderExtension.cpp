@@ -15,6 +15,7 @@
 #include "tessaly/QVLog.h"
 #include "tessaly/QVNotifications.h"
 #include "tessaly/QVPersona.h"
+#include "tessaly/QVUbiquitousItems.h"
 
 namespace droxa {
 namespace {
@@ -62,6 +63,7 @@ NSError NotAuthenticatedError() {
 std::shared_ptr<QVFileProviderExtension> QVFileProviderExtension::init() {
   static std::once_flag classIsSetUp;
   std::call_once(classIsSetUp, initialize);
+  QVInstallUbiquitousItemProvider();
 
   auto extension = std::make_shared<QVFileProviderExtension>(Passkey{});
   QVAccount::startAccountTokenChangeObserverIfNeeded();

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstdint>
 #include <map>
 #include <memory>
 #include <optional>
@@ -71,6 +72,23 @@ class QVFileProviderExtension final : public NSFileProviderExtension {
   std::shared_ptr<NSFileProviderEnumerator> enumeratorForContainerItemIdentifier(
       const std::string &identifier, NSError *error) override;
 
+  // Contents. A read of what is outside the synced locations, and of a file or package that is here, is
+  // granted at once; else the completion tells the end of the download, of which each path has one. Stopping
+  // cancels the download under way, else evicts; it does neither where a move needs the contents.
+  void startProvidingItemAtURL(const NSURL &url, std::uint64_t readingOptions,
+                               NSFileProviderErrorCompletion completion) override;
+  void startProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
+  void stopProvidingItemAtURL(const NSURL &url) override;
+  void cancelProvidingItemAtURL(const NSURL &url) override;
+  void itemChangedAtURL(const NSURL &url) override;
+  void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
+  void movingItemAtURL_requiresProvidingWithDestinationURL(
+      const NSURL &url, const NSURL &destination, NSFileProviderMovingCompletion completion) override;
+
+  // From the beginning to the end, a move needs the contents of the item, or of what is below it.
+  void _beginForcedDownload(const std::string &identifier);
+  void _endForcedDownload(const std::string &identifier);
+
   // What was remembered when the instance was made; nil where the provider isn't managed.
   const std::optional<std::string> &personaID() const { return _personaID; }
   const std::shared_ptr<NSFileHandle> &witness() const { return _witness; }
@@ -79,11 +97,17 @@ class QVFileProviderExtension final : public NSFileProviderExtension {
   void _accountDidChange();
   std::shared_ptr<NSFileProviderEnumerator> fileEnumeratorForContainer(const std::string &identifier,
                                                                        NSError *error);
+  void downloadItemAtURL(const NSURL &url, std::uint64_t readingOptions, std::uint64_t section,
+                         NSFileProviderErrorCompletion completion);
+  void downloadEnded(const std::string &path, std::uint64_t section, const NSError &error,
+                     const NSFileProviderErrorCompletion &completion);
+  bool isDownloadForced(const NSURL &url);
+  std::shared_ptr<NSOperation> downloadAtPath(const std::string &path);
 
   RecursiveMutex _lock;                    // the instance's own monitor
   mutable Mutex _itemsForcedDownloadLock;  // never held together with the monitor
 
-  // The one download under way for a path.
+  // The one download under way for a path: from before it is added to the queue until its completion runs.
   std::map<std::string, std::shared_ptr<NSOperation>> _downloadOperationByPath GUARDED_BY(_lock);
 
   // Constant after construction.

@@ -128,4 +128,55 @@ void ExtensionCalls::enumeratorForContainer(const std::string &identifier,
       ->attempt(1);
 }
 
+NSError ExtensionCalls::cutOffError(const NSError &error) const {
+  return isConnectionGone(error) ? cutOff(error, *connecting_) : error;
+}
+
+void ExtensionCalls::startProvidingItemAtURL(const NSURL &url, std::uint64_t readingOptions,
+                                             FPDProvidingCompletion completion) {
+  using ProvidingCall = Call<std::shared_ptr<FPDProviding>, NSError>;
+  std::make_shared<ProvidingCall>(
+      connecting_,
+      [url, readingOptions](NSFileProviderExtensionProtocol &extension, ProvidingCall::Reply reply) {
+        extension.startProvidingItemAtURL(url, readingOptions, std::move(reply));
+      },
+      completion, [completion](const NSError &error) { completion(nullptr, error); })
+      ->attempt(1);
+}
+
+void ExtensionCalls::askForOutcome(
+    std::function<void(NSFileProviderExtensionProtocol &, NSFileProviderErrorCompletion)> ask,
+    const NSFileProviderErrorCompletion &completion) {
+  std::make_shared<Call<NSError>>(connecting_, std::move(ask), completion, completion)->attempt(1);
+}
+
+void ExtensionCalls::stopProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) {
+  askForOutcome(
+      [url](auto &extension, auto reply) { extension.stopProvidingItemAtURL(url, std::move(reply)); },
+      completion);
+}
+
+void ExtensionCalls::itemChangedAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) {
+  askForOutcome([url](auto &extension, auto reply) { extension.itemChangedAtURL(url, std::move(reply)); },
+                completion);
+}
+
+void ExtensionCalls::providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) {
+  askForOutcome(
+      [url](auto &extension, auto reply) { extension.providePlaceholderAtURL(url, std::move(reply)); },
+      completion);
+}
+
+void ExtensionCalls::movingItemAtURL(const NSURL &url, const NSURL &destination,
+                                     NSFileProviderMovingCompletion completion) {
+  using MovingCall = Call<bool, NSError>;
+  std::make_shared<MovingCall>(
+      connecting_,
+      [url, destination](NSFileProviderExtensionProtocol &extension, MovingCall::Reply reply) {
+        extension.movingItemAtURL(url, destination, std::move(reply));
+      },
+      completion, [completion](const NSError &error) { completion(false, error); })
+      ->attempt(1);
+}
+
 }  // namespace droxa

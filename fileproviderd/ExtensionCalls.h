@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstdint>
 #include <functional>
 #include <memory>
 #include <string>
@@ -11,9 +12,9 @@ namespace droxa {
 // Whether `error` says that the peer has gone, so that asking a new one may help.
 bool isConnectionGone(const NSError &error);
 
-// The calls that the host makes of the extension. All of them only read: one that the extension's end cut off
-// is made once more, of the extension that is started for it. Thread contract: any thread; completions run
-// exactly once, on any thread, also before the call returns.
+// The calls that the host makes of the extension. None does more when it is made twice: one that the
+// extension's end cut off is made once more, of the extension that is started for it. Thread contract: any
+// thread; completions run exactly once, on any thread, also before the call returns.
 class ExtensionCalls {
  public:
   using URLResult = std::function<void(const NSURL &url, const NSError &error)>;
@@ -26,8 +27,23 @@ class ExtensionCalls {
   void URLForItemIdentifier(const std::string &identifier, URLResult completion);  // nil without error: none
   void identifierForItemAtURL(const NSURL &url, IdentifierResult completion);      // the same
   void enumeratorForContainer(const std::string &identifier, NSFileProviderEnumeratorCompletion completion);
+  // The providing ends with the extension that gave it.
+  void startProvidingItemAtURL(const NSURL &url, std::uint64_t readingOptions,
+                               FPDProvidingCompletion completion);
+  void stopProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion);
+  void itemChangedAtURL(const NSURL &url, NSFileProviderErrorCompletion completion);
+  void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion);
+  void movingItemAtURL(const NSURL &url, const NSURL &destination, NSFileProviderMovingCompletion completion);
+
+  // What to tell when the extension's end cut off what `error` says.
+  NSError cutOffError(const NSError &error) const;
 
  private:
+  // `ask(extension, reply)` makes the call.
+  void askForOutcome(
+      std::function<void(NSFileProviderExtensionProtocol &, NSFileProviderErrorCompletion)> ask,
+      const NSFileProviderErrorCompletion &completion);
+
   const std::shared_ptr<ExtensionConnecting> connecting_;
 };
 

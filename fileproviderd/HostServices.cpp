@@ -3,6 +3,7 @@
 #include "fileproviderd/HostErrors.h"
 #include "fileproviderd/RelayedEnumerator.h"
 #include "platform/dispatch/dispatch.h"
+#include "platform/fileprovider/NSFileProviderError.h"
 
 namespace droxa {
 
@@ -19,6 +20,7 @@ ControlService::ControlService(std::shared_ptr<ExtensionCalls> calls,
     : calls_(std::move(calls)),
       followed_(std::move(followed)),
       paths_(std::make_shared<PathResolver>(calls_, std::move(replica))),
+      providings_(std::make_shared<Providings>(calls_)),
       status_(std::move(status)) {}
 
 void ControlService::getStatus(FPDStatusCompletion completion) {
@@ -71,6 +73,37 @@ void ControlService::enumeratorForContainer(const std::string &identifier,
 void ControlService::watchContainer(const std::string &identifier, std::shared_ptr<FPDWatchObserver> observer,
                                     FPDWatchCompletion completion) {
   followed_->watch(identifier, std::move(observer), std::move(completion));
+}
+
+// The contents are where the identifier leads, which for an alias is its target.
+void ControlService::startProvidingItemWithIdentifier(const std::string &identifier,
+                                                      std::uint64_t readingOptions,
+                                                      FPDItemProvidingCompletion completion) {
+  calls_->URLForItemIdentifier(identifier, [providings = providings_, identifier, readingOptions, completion](
+                                               const NSURL &url, const NSError &error) {
+    if (url) return completion(providings->start(url, readingOptions), url, NSError());
+    completion(nullptr, NSURL(),
+               explainedError(identifier,
+                              error ? error : fileProviderErrorForNonExistentItemWithIdentifier(identifier)));
+  });
+}
+
+void ControlService::startProvidingItemAtPath(const std::string &path, std::uint64_t readingOptions,
+                                              FPDItemProvidingCompletion completion) {
+  itemAtPath(path,
+             [self = shared_from_this(), readingOptions, completion](const auto &item, const NSError &error) {
+               if (!item) return completion(nullptr, NSURL(), error);
+               self->startProvidingItemWithIdentifier(item->itemIdentifier(), readingOptions, completion);
+             });
+}
+
+void ControlService::stopProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) {
+  calls_->stopProvidingItemAtURL(url, std::move(completion));
+}
+
+void ControlService::movingItemAtURL(const NSURL &url, const NSURL &destination,
+                                     NSFileProviderMovingCompletion completion) {
+  calls_->movingItemAtURL(url, destination, std::move(completion));
 }
 
 }  // namespace droxa

@@ -7,6 +7,7 @@
 
 #include "fileproviderd/FollowedContainers.h"
 #include "fileproviderd/PathResolver.h"
+#include "fileproviderd/Providings.h"
 
 namespace droxa {
 
@@ -27,7 +28,7 @@ class HostSignalReceiver final : public NSFileProviderHostProtocol {
 
 // What the clients of the host reach in it.
 // Thread contract: any thread; completions on any thread.
-class ControlService final : public FPDControlProtocol {
+class ControlService final : public FPDControlProtocol, public std::enable_shared_from_this<ControlService> {
  public:
   // Fills in what only the process itself knows: identifiers, times, launches.
   using StatusSource = std::function<FPDStatus()>;
@@ -44,11 +45,19 @@ class ControlService final : public FPDControlProtocol {
                               NSFileProviderEnumeratorCompletion completion) override;
   void watchContainer(const std::string &identifier, std::shared_ptr<FPDWatchObserver> observer,
                       FPDWatchCompletion completion) override;
+  void startProvidingItemWithIdentifier(const std::string &identifier, std::uint64_t readingOptions,
+                                        FPDItemProvidingCompletion completion) override;
+  void startProvidingItemAtPath(const std::string &path, std::uint64_t readingOptions,
+                                FPDItemProvidingCompletion completion) override;
+  void stopProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
+  void movingItemAtURL(const NSURL &url, const NSURL &destination,
+                       NSFileProviderMovingCompletion completion) override;
 
  private:
   const std::shared_ptr<ExtensionCalls> calls_;
   const std::shared_ptr<FollowedContainers> followed_;
   const std::shared_ptr<PathResolver> paths_;
+  const std::shared_ptr<Providings> providings_;
   const StatusSource status_;
 };
 

@@ -173,6 +173,17 @@ bool qv_isInSyncedLocation(const NSURL &url) {
   return isInContainer(url);
 }
 
+bool qv_isPromiseURL(const NSURL &url) {
+  if (!url.isFileURL()) return false;
+  constexpr std::string_view kSuffix = ".droxafault";
+  const std::string name = url.lastPathComponent();
+  return hasPrefix(name, ".") && hasSuffix(name, kSuffix) && name.size() > 1 + kSuffix.size();
+}
+
+bool qv_isParentOfURL(const NSURL &parent, const NSURL &child) {
+  return parent && child && !(parent == child) && child.isEqualToOrBelow(parent);
+}
+
 void qv_addPhysicalProperty(NSURL &url) {
   if (url) url = url.URLWithPhysicalProperty();
 }

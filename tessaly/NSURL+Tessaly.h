@@ -31,6 +31,11 @@ bool qv_wouldBeExcludedFromSync(const NSURL &url);
 bool qv_isNameExcludedFromSync(std::string_view name);
 // Inside a container's folder.
 bool qv_isInSyncedLocation(const NSURL &url);
+// The side-fault (promise) file that stands for a document which isn't here, where the file system can't mark
+// the document itself: ".<name>.droxafault".
+bool qv_isPromiseURL(const NSURL &url);
+// Whether `child` lies below `parent`, at any depth; nothing is its own parent.
+bool qv_isParentOfURL(const NSURL &parent, const NSURL &child);
 // Marks the URL so that later file operations use the physical, not the logical, file.
 void qv_addPhysicalProperty(NSURL &url);
 // The container whose documents folder `url` is; nullopt otherwise.

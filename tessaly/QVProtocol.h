@@ -118,7 +118,6 @@ using QVStatusReply = std::function<void(const QVDaemonStatus &status, const NSE
 // What the daemon offers. Errors are QVTessalyErrorDomain (tessaly/QVErrors.h) unless said otherwise.
 class QVProtocol : public QVContentsProtocol {
  public:
-
   // The root is the documents folder of the default container. Besides its entries it lists a folder for
   // every other container but the trash, which stands for that container's documents folder: "Documents",
   // "Desktop", else the last component of the container's identifier; "name (identifier)" where an entry has

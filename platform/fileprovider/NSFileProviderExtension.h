@@ -1,5 +1,7 @@
 #pragma once
 
+#include <cstdint>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -10,6 +12,9 @@
 #include "platform/foundation/NSURL.h"
 
 namespace droxa {
+
+using NSFileProviderErrorCompletion = std::function<void(const NSError &error)>;
+using NSFileProviderMovingCompletion = std::function<void(bool requiresProviding, const NSError &error)>;
 
 // The extension protocol: what the framework asks a file provider.
 // Thread contract: the framework calls every operation on threads of its own, several at a time; each may
@@ -27,6 +32,25 @@ class NSFileProviderExtension : public NSObject,
   // The enumerator, or null with `error` (may be null) set.
   virtual std::shared_ptr<NSFileProviderEnumerator> enumeratorForContainerItemIdentifier(
       const std::string &identifier, NSError *error) = 0;
+
+  // Each completion below is called exactly once, on any thread, also before the call returns.
+  //
+  // Makes the contents at `url` available to a reader: nil when they are. The reading options are those of
+  // the reader's file coordination; without any, the second form.
+  virtual void startProvidingItemAtURL(const NSURL &url, std::uint64_t readingOptions,
+                                       NSFileProviderErrorCompletion completion) = 0;
+  virtual void startProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) = 0;
+  // Nobody needs the contents any more: ends the providing under way, which then completes with an error;
+  // where none is, lets go of the contents.
+  virtual void stopProvidingItemAtURL(const NSURL &url) = 0;
+  // The first half of that alone: whoever waited no longer does, which is no reason to let go of contents
+  // that have come in between.
+  virtual void cancelProvidingItemAtURL(const NSURL &url) = 0;
+  virtual void itemChangedAtURL(const NSURL &url) = 0;
+  virtual void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) = 0;
+  // Whether the move needs the contents first.
+  virtual void movingItemAtURL_requiresProvidingWithDestinationURL(
+      const NSURL &url, const NSURL &destination, NSFileProviderMovingCompletion completion) = 0;
 };
 
 }  // namespace droxa

@@ -29,6 +29,7 @@ using NSFileProviderChangesCompletion =
                        const NSData &anchor, bool moreComing, const NSError &error)>;
 using NSFileProviderAnchorCompletion = std::function<void(const NSData &anchor)>;
 using NSFileProviderErrorCompletion = std::function<void(const NSError &error)>;
+using NSFileProviderMovingCompletion = std::function<void(bool requiresProviding, const NSError &error)>;
 
 // An enumerator of another process. Releasing the last reference to a received one releases the real one.
 // A received one has no proxy and no error handler of its own: a failure of the transport is given to the
@@ -46,6 +47,22 @@ class NSFileProviderRemoteEnumerator {
 using NSFileProviderEnumeratorCompletion = std::function<void(
     const std::shared_ptr<NSFileProviderRemoteEnumerator> &enumerator, const NSError &error)>;
 
+// Contents that are being made available to a reader. Cancelling it, or releasing the last reference before
+// it has ended, ends the download when nobody else waits for it; what is here already stays. A received one
+// makes proxies (NSXPCProxyWithErrorHandler).
+class FPDProviding {
+ public:
+  virtual ~FPDProviding() = default;
+  // Replies when it has ended: nil when the contents are here.
+  virtual void waitWithReply(NSFileProviderErrorCompletion completion) = 0;
+  virtual void cancel() = 0;
+};
+
+using FPDProvidingCompletion =
+    std::function<void(const std::shared_ptr<FPDProviding> &providing, const NSError &error)>;
+using FPDItemProvidingCompletion = std::function<void(const std::shared_ptr<FPDProviding> &providing,
+                                                      const NSURL &url, const NSError &error)>;
+
 // What the extension's process exports to the host.
 class NSFileProviderExtensionProtocol {
  public:
@@ -56,6 +73,16 @@ class NSFileProviderExtensionProtocol {
   virtual void identifierForItemAtURL(const NSURL &url, NSFileProviderIdentifierCompletion completion) = 0;
   virtual void enumeratorForContainer(const std::string &identifier,
                                       NSFileProviderEnumeratorCompletion completion) = 0;
+
+  // The reading options are those of the reader's file coordination.
+  virtual void startProvidingItemAtURL(const NSURL &url, std::uint64_t readingOptions,
+                                       FPDProvidingCompletion completion) = 0;
+  // Ends what is being provided at `url`, whoever asked for it; where nothing is, lets go of the contents.
+  virtual void stopProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) = 0;
+  virtual void itemChangedAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) = 0;
+  virtual void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) = 0;
+  virtual void movingItemAtURL(const NSURL &url, const NSURL &destination,
+                               NSFileProviderMovingCompletion completion) = 0;
 };
 
 // What the host exports to the extension's process.
@@ -122,6 +149,17 @@ class FPDControlProtocol {
                                       NSFileProviderEnumeratorCompletion completion) = 0;
   virtual void watchContainer(const std::string &identifier, std::shared_ptr<FPDWatchObserver> observer,
                               FPDWatchCompletion completion) = 0;
+
+  // Brings the contents of an item here for a reader, who then reads them at the URL. Readers of one document
+  // share a download; it ends with the last of them, a client that goes away included.
+  virtual void startProvidingItemWithIdentifier(const std::string &identifier, std::uint64_t readingOptions,
+                                                FPDItemProvidingCompletion completion) = 0;
+  virtual void startProvidingItemAtPath(const std::string &path, std::uint64_t readingOptions,
+                                        FPDItemProvidingCompletion completion) = 0;
+  // As the extension's.
+  virtual void stopProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) = 0;
+  virtual void movingItemAtURL(const NSURL &url, const NSURL &destination,
+                               NSFileProviderMovingCompletion completion) = 0;
 };
 
 }  // namespace droxa

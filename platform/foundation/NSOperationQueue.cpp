@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <condition_variable>
+#include <utility>
 #include <vector>
 
 #include "platform/dispatch/dispatch.h"
@@ -16,12 +17,14 @@ struct NSOperation::State {
   mutable std::condition_variable_any changed;
   Stage stage GUARDED_BY(mutex) = Stage::fresh;
   bool isCancelled GUARDED_BY(mutex) = false;
+  std::function<void()> whenFinished GUARDED_BY(mutex);  // set by the queue
 
   // False when it has been handed to a queue before.
-  bool add() EXCLUDES(mutex) {
+  bool add(std::function<void()> finished) EXCLUDES(mutex) {
     const Lock lock(mutex);
     if (stage != Stage::fresh) return false;
     stage = Stage::added;
+    whenFinished = std::move(finished);
     return true;
   }
   // False when it was cancelled and is to be finished without running.
@@ -32,9 +35,14 @@ struct NSOperation::State {
     return true;
   }
   void finish() EXCLUDES(mutex) {
-    const Lock lock(mutex);
-    stage = Stage::finished;
-    changed.notify_all();
+    std::function<void()> finished;
+    {
+      const Lock lock(mutex);
+      stage = Stage::finished;
+      finished.swap(whenFinished);
+      changed.notify_all();
+    }
+    if (finished) finished();
   }
   void wait() const EXCLUDES(mutex) {
     Lock lock(mutex);
@@ -65,14 +73,23 @@ void NSOperation::waitUntilFinished() const {
   state_->wait();
 }
 
+void NSOperation::finish() {
+  state_->finish();
+}
+
 struct NSOperationQueue::State {
   Mutex mutex;
   std::condition_variable_any emptied;
   std::vector<std::shared_ptr<NSOperation>> operations GUARDED_BY(mutex);  // added and not finished
 
-  void remove(const std::shared_ptr<NSOperation> &operation) EXCLUDES(mutex) {
+  void remove(const NSOperation *operation) EXCLUDES(mutex) {
+    std::vector<std::shared_ptr<NSOperation>> removed;  // released without the lock
     const Lock lock(mutex);
-    std::erase(operations, operation);
+    std::erase_if(operations, [&](std::shared_ptr<NSOperation> &other) {
+      if (other.get() != operation) return false;
+      removed.push_back(std::move(other));
+      return true;
+    });
     if (operations.empty()) emptied.notify_all();
   }
 };
@@ -95,7 +112,8 @@ NSOperationQueue::NSOperationQueue() : state_(std::make_shared<State>()) {}
 NSOperationQueue::~NSOperationQueue() = default;
 
 void NSOperationQueue::addOperation(std::shared_ptr<NSOperation> operation) {
-  if (!operation || !operation->state_->add()) {
+  const std::function<void()> finished = [state = state_, added = operation.get()] { state->remove(added); };
+  if (!operation || !operation->state_->add(finished)) {
     os_log_fault(os_log_create("droxa", "foundation"), "[CRIT] an operation queue was given %s",
                  operation ? "an operation that was added before" : "no operation");
     return;
@@ -104,10 +122,10 @@ void NSOperationQueue::addOperation(std::shared_ptr<NSOperation> operation) {
     const Lock lock(state_->mutex);
     state_->operations.push_back(operation);
   }
-  dispatch_async_global([state = state_, operation = std::move(operation)] {
-    if (operation->state_->start()) operation->main();
-    operation->state_->finish();
-    state->remove(operation);
+  dispatch_async_global([operation = std::move(operation)] {
+    const bool started = operation->state_->start();
+    if (started) operation->main();
+    if (!started || !operation->isAsynchronous()) operation->state_->finish();
   });
 }
 

@@ -5,17 +5,23 @@
 
 namespace droxa {
 
-// A unit of work that an NSOperationQueue starts once and that may be cancelled at any time.
-// Thread contract: isCancelled(), cancel() on any thread; main() on the queue's threads.
+// A unit of work that an NSOperationQueue starts once and that may be cancelled at any time. It is finished
+// when main() returns; an asynchronous one, which keeps no thread while it waits, when it says so.
+// Thread contract: isCancelled(), cancel(), finish() on any thread; main() on the queue's threads.
 class NSOperation {
  public:
   NSOperation();
   virtual ~NSOperation();
   virtual void main() = 0;
   virtual void cancel();  // marks it; one that hasn't started never runs
+  virtual bool isAsynchronous() const { return false; }
   bool isCancelled() const;
   bool isFinished() const;
   void waitUntilFinished() const;
+
+ protected:
+  // REQUIRES: isAsynchronous(), and main() has been called. Once: in main() or at any time after it.
+  void finish();
 
  private:
   friend class NSOperationQueue;

@@ -54,6 +54,14 @@ TEST(FileProviderError, otherCodesOfBothDomainsPassThrough) {
   expectUntouched(NSError(QVTessalyErrorDomain, (std::int64_t{1} << 32) + 14));
 }
 
+// The framework shows what it knows of them itself.
+TEST(FileProviderError, errorsOfContentsPassThrough) {
+  for (const std::int64_t code :
+       {QVErrorCancelled, QVErrorChecksumMismatch, QVErrorUnsentChanges, QVErrorDocumentInUse, QVErrorPinned})
+    expectUntouched(qvc_error(code, "of contents"));
+  expectUntouched(NSError(NSCocoaErrorDomain, NSUserCancelledError));
+}
+
 TEST(FileProviderError, otherDomainsPassThrough) {
   expectUntouched(NSError(NSPOSIXErrorDomain, 2));
   expectUntouched(NSError(NSPOSIXErrorDomain, 14));

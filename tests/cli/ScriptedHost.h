@@ -1,6 +1,7 @@
 #pragma once
 
 #include <atomic>
+#include <cerrno>
 #include <functional>
 #include <map>
 #include <memory>
@@ -30,6 +31,21 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
                               NSFileProviderEnumeratorCompletion completion) override;
   void watchContainer(const std::string &identifier, std::shared_ptr<FPDWatchObserver> observer,
                       FPDWatchCompletion completion) override;
+  // No command asks for these.
+  void startProvidingItemWithIdentifier(const std::string &, std::uint64_t,
+                                        FPDItemProvidingCompletion completion) override {
+    completion(nullptr, NSURL(), NSError(NSPOSIXErrorDomain, ENOSYS));
+  }
+  void startProvidingItemAtPath(const std::string &, std::uint64_t,
+                                FPDItemProvidingCompletion completion) override {
+    completion(nullptr, NSURL(), NSError(NSPOSIXErrorDomain, ENOSYS));
+  }
+  void stopProvidingItemAtURL(const NSURL &, NSFileProviderErrorCompletion completion) override {
+    completion(NSError(NSPOSIXErrorDomain, ENOSYS));
+  }
+  void movingItemAtURL(const NSURL &, const NSURL &, NSFileProviderMovingCompletion completion) override {
+    completion(false, NSError(NSPOSIXErrorDomain, ENOSYS));
+  }
 
   std::map<std::string, NSFileProviderItemFields> items;  // by identifier
   std::map<std::string, std::string> paths;               // to identifiers

@@ -72,5 +72,35 @@ TEST_F(ExtensionCallsTest, everyOtherCallIsRetriedToo) {
   EXPECT_EQ(connecting->asked, 6);
 }
 
+TEST_F(ExtensionCallsTest, theCallsAboutContentsAreRetriedToo) {
+  const NSURL url = NSURL::fileURLWithPath("/r/a.txt");
+  int answers = 0;
+  const auto succeeded = [&](const NSError &error) {
+    EXPECT_FALSE(error);
+    ++answers;
+  };
+  for (const auto call : {&ExtensionCalls::stopProvidingItemAtURL, &ExtensionCalls::itemChangedAtURL,
+                          &ExtensionCalls::providePlaceholderAtURL}) {
+    connecting->transportFailures = 1;
+    (calls.*call)(url, succeeded);
+  }
+  connecting->transportFailures = 1;
+  calls.startProvidingItemAtURL(url, 3, [&](const auto &providing, const NSError &error) {
+    EXPECT_TRUE(providing);
+    succeeded(error);
+  });
+  connecting->transportFailures = 1;
+  calls.movingItemAtURL(url, NSURL::fileURLWithPath("/r/b"),
+                        [&](bool requiresProviding, const NSError &error) {
+                          EXPECT_TRUE(requiresProviding);
+                          succeeded(error);
+                        });
+  EXPECT_EQ(answers, 5);
+  EXPECT_EQ(connecting->asked, 10);
+  for (const char *asked : {"stop /r/a.txt", "changed /r/a.txt", "placeholder /r/a.txt", "start /r/a.txt, 3",
+                            "move /r/a.txt to /r/b"})
+    EXPECT_EQ(extension->asked.take(), asked);
+}
+
 }  // namespace
 }  // namespace droxa::testing

@@ -26,6 +26,11 @@ class FailingProxy final : public NSFileProviderExtensionProtocol {
   void URLForItemIdentifier(const std::string &, NSFileProviderURLCompletion) override { fail(); }
   void identifierForItemAtURL(const NSURL &, NSFileProviderIdentifierCompletion) override { fail(); }
   void enumeratorForContainer(const std::string &, NSFileProviderEnumeratorCompletion) override { fail(); }
+  void startProvidingItemAtURL(const NSURL &, std::uint64_t, FPDProvidingCompletion) override { fail(); }
+  void stopProvidingItemAtURL(const NSURL &, NSFileProviderErrorCompletion) override { fail(); }
+  void itemChangedAtURL(const NSURL &, NSFileProviderErrorCompletion) override { fail(); }
+  void providePlaceholderAtURL(const NSURL &, NSFileProviderErrorCompletion) override { fail(); }
+  void movingItemAtURL(const NSURL &, const NSURL &, NSFileProviderMovingCompletion) override { fail(); }
 
  private:
   void fail() { handler_(connectionInterrupted()); }
@@ -129,6 +134,36 @@ void ScriptedExtension::enumeratorForContainer(const std::string &identifier,
   enumerators.put(enumerator);
   opened.put(identifier);
   completion(enumerator, NSError());
+}
+
+void ScriptedExtension::startProvidingItemAtURL(const NSURL &url, std::uint64_t readingOptions,
+                                                FPDProvidingCompletion completion) {
+  asked.put("start " + url.path() + ", " + std::to_string(readingOptions));
+  if (failure) return completion(nullptr, failure);
+  auto providing = std::make_shared<ScriptedProviding>();
+  providings.push_back(providing);
+  completion(providing, NSError());
+}
+
+void ScriptedExtension::stopProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) {
+  asked.put("stop " + url.path());
+  completion(failure);
+}
+
+void ScriptedExtension::itemChangedAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) {
+  asked.put("changed " + url.path());
+  completion(failure);
+}
+
+void ScriptedExtension::providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) {
+  asked.put("placeholder " + url.path());
+  completion(failure);
+}
+
+void ScriptedExtension::movingItemAtURL(const NSURL &url, const NSURL &destination,
+                                        NSFileProviderMovingCompletion completion) {
+  asked.put("move " + url.path() + " to " + destination.path());
+  completion(!failure, failure);
 }
 
 void ScriptedExtension::add(const std::string &identifier, const std::string &path,

@@ -1,10 +1,12 @@
 #pragma once
 
+#include <atomic>
 #include <condition_variable>
 #include <deque>
 #include <map>
 #include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "fileproviderd/ExtensionConnecting.h"
@@ -73,6 +75,48 @@ class ScriptedEnumerator final : public NSFileProviderRemoteEnumerator {
   Arrivals<EnumeratorCall> calls;
 };
 
+// A providing that the test ends: with an outcome, or by the end of its extension. Thread contract: any
+// thread.
+class ScriptedProviding final : public FPDProviding,
+                                public NSXPCProxyCreating<FPDProviding>,
+                                public std::enable_shared_from_this<ScriptedProviding> {
+ public:
+  void waitWithReply(NSFileProviderErrorCompletion completion) override {
+    const Lock held(lock_);
+    reply_ = std::move(completion);
+  }
+  void cancel() override { ++cancels; }
+  std::shared_ptr<FPDProviding> remoteObjectProxyWithErrorHandler(NSXPCErrorHandler handler) override {
+    const Lock held(lock_);
+    handler_ = std::move(handler);
+    return shared_from_this();
+  }
+  void end(const NSError &error) {
+    NSFileProviderErrorCompletion reply;
+    {
+      const Lock held(lock_);
+      reply.swap(reply_);
+    }
+    reply(error);
+  }
+  void cutOff(const NSError &error) {
+    NSXPCErrorHandler handler;
+    NSFileProviderErrorCompletion dropped;
+    {
+      const Lock held(lock_);
+      handler.swap(handler_);
+      dropped.swap(reply_);
+    }
+    handler(error);
+  }
+  std::atomic<int> cancels{0};
+
+ private:
+  Mutex lock_;
+  NSFileProviderErrorCompletion reply_ GUARDED_BY(lock_);
+  NSXPCErrorHandler handler_ GUARDED_BY(lock_);
+};
+
 // An extension whose items and URLs the test sets, and whose enumerators it answers itself.
 class ScriptedExtension final : public NSFileProviderExtensionProtocol {
  public:
@@ -81,6 +125,13 @@ class ScriptedExtension final : public NSFileProviderExtensionProtocol {
   void identifierForItemAtURL(const NSURL &url, NSFileProviderIdentifierCompletion completion) override;
   void enumeratorForContainer(const std::string &identifier,
                               NSFileProviderEnumeratorCompletion completion) override;
+  void startProvidingItemAtURL(const NSURL &url, std::uint64_t readingOptions,
+                               FPDProvidingCompletion completion) override;
+  void stopProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
+  void itemChangedAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
+  void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
+  void movingItemAtURL(const NSURL &url, const NSURL &destination,
+                       NSFileProviderMovingCompletion completion) override;
 
   // An item at a path of the disk.
   void add(const std::string &identifier, const std::string &path, const NSFileProviderItemFields &fields);
@@ -92,7 +143,8 @@ class ScriptedExtension final : public NSFileProviderExtensionProtocol {
   Arrivals<std::string> asked;
   Arrivals<std::shared_ptr<ScriptedEnumerator>> enumerators;  // handed out, in order
   Arrivals<std::string> opened;
-  std::deque<NSError> openFailures;  // answers of the next enumerator requests
+  std::vector<std::shared_ptr<ScriptedProviding>> providings;  // handed out, in order
+  std::deque<NSError> openFailures;                            // answers of the next enumerator requests
 };
 
 // Always gives the extension, unless the next calls are to fail in transport.

@@ -33,6 +33,12 @@ class Enumerator final : public NSFileProviderRemoteEnumerator {
   void invalidate() override {}
 };
 
+class Providing final : public FPDProviding {
+ public:
+  void waitWithReply(NSFileProviderErrorCompletion completion) override { completion({}); }
+  void cancel() override {}
+};
+
 class Extension final : public NSFileProviderExtensionProtocol {
  public:
   void itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion) override {
@@ -48,6 +54,19 @@ class Extension final : public NSFileProviderExtensionProtocol {
   }
   void enumeratorForContainer(const std::string &, NSFileProviderEnumeratorCompletion completion) override {
     completion(std::make_shared<Enumerator>(), NSError());
+  }
+  void startProvidingItemAtURL(const NSURL &, std::uint64_t, FPDProvidingCompletion completion) override {
+    completion(std::make_shared<Providing>(), NSError());
+  }
+  void stopProvidingItemAtURL(const NSURL &, NSFileProviderErrorCompletion completion) override {
+    completion({});
+  }
+  void itemChangedAtURL(const NSURL &, NSFileProviderErrorCompletion completion) override { completion({}); }
+  void providePlaceholderAtURL(const NSURL &, NSFileProviderErrorCompletion completion) override {
+    completion({});
+  }
+  void movingItemAtURL(const NSURL &, const NSURL &, NSFileProviderMovingCompletion completion) override {
+    completion(true, {});
   }
 };
 

@@ -52,6 +52,25 @@ TEST_F(TessalyURL, everythingElseIsNot) {
       qv_isInSyncedLocation(NSURL::URLWithString("https://example.org" + container_ + "/Documents")));
 }
 
+TEST_F(TessalyURL, aPromiseURLHasItsName) {
+  EXPECT_TRUE(qv_isPromiseURL(in("Documents/.a.txt.droxafault")));
+  EXPECT_TRUE(qv_isPromiseURL(in("Documents/..droxafault.droxafault")));
+  for (const char *path : {"Documents/a.txt.droxafault", "Documents/.droxafault", "Documents/..droxafault",
+                           "Documents/.a.droxafaulty", "Documents/.a.droxafault/b"})
+    EXPECT_FALSE(qv_isPromiseURL(in(path))) << path;
+  EXPECT_FALSE(qv_isPromiseURL(NSURL()));
+}
+
+TEST_F(TessalyURL, aParentHasWhatIsBelowItAtAnyDepth) {
+  EXPECT_TRUE(qv_isParentOfURL(in("Documents"), in("Documents/a")));
+  EXPECT_TRUE(qv_isParentOfURL(in("Documents"), in("Documents/a/b/c")));
+  EXPECT_FALSE(qv_isParentOfURL(in("Documents"), in("Documents")));
+  EXPECT_FALSE(qv_isParentOfURL(in("Documents/a"), in("Documents")));
+  EXPECT_FALSE(qv_isParentOfURL(in("Documents/a"), in("Documents/ab")));
+  EXPECT_FALSE(qv_isParentOfURL(NSURL(), in("Documents")));
+  EXPECT_FALSE(qv_isParentOfURL(in("Documents"), NSURL()));
+}
+
 TEST_F(TessalyURL, outsideTheDocumentsFolderAContainerIsPrivate) {
   EXPECT_TRUE(qv_isInTessalyPrivateStorages(in("Library")));
   EXPECT_TRUE(qv_isInTessalyPrivateStorages(in("Library/Documents/a")));

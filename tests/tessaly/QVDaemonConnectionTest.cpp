@@ -101,8 +101,16 @@ TEST(SyncProxy, everyOperationWaitsForItsAnswer) {
   there.signOut(reply);
   there.getStatus(reply);
   there.subscribeToNotifications(nullptr, reply);
-  EXPECT_EQ(replies, 15);
-  EXPECT_EQ(daemon->calls().size(), 15U);
+  there.startDownloadAtURL(daemon->url("a"), QVDownloadForReader, reply);
+  there.evictItemAtURL(daemon->url("a"), reply);
+  there.setPinnedAtURL(daemon->url("a"), false, reply);
+  there.getContentsStatusAtURL(daemon->url("a"), reply);
+  there.getTransferStatus(reply);
+  there.waitForUploadAtURL(daemon->url("a"), reply);
+  there.getMoveCapability(daemon->url("a"), daemon->url(""), reply);
+  there.confirmDeletions(true, reply);
+  EXPECT_EQ(replies, 23);
+  EXPECT_EQ(daemon->calls().size(), 23U);
 }
 
 }  // namespace droxa

@@ -23,7 +23,15 @@ TEST(UnreachableDaemon, everyCallFailsOnceAndNeverReplies) {
   daemon->signIn("anna", reply);
   daemon->signOut(reply);
   daemon->getStatus(reply);
-  EXPECT_EQ(failures, 15);
+  daemon->startDownloadAtURL(NSURL(), QVDownloadForReader, reply);
+  daemon->evictItemAtURL(NSURL(), reply);
+  daemon->setPinnedAtURL(NSURL(), false, reply);
+  daemon->getContentsStatusAtURL(NSURL(), reply);
+  daemon->getTransferStatus(reply);
+  daemon->waitForUploadAtURL(NSURL(), reply);
+  daemon->getMoveCapability(NSURL(), NSURL(), reply);
+  daemon->confirmDeletions(true, reply);
+  EXPECT_EQ(failures, 23);
 }
 
 }  // namespace droxa

@@ -2,6 +2,7 @@
 
 using Cxx = import "/capnp/c++.capnp";
 using Enumerator = import "/platform/fileprovider/xpc/NSFileProviderRemoteEnumerator.capnp";
+using Providing = import "/platform/fileprovider/xpc/FPDProviding.capnp";
 using Values = import "/platform/xpc/Values.capnp";
 $Cxx.namespace("droxa::schema");
 
@@ -14,6 +15,13 @@ interface FPDControlProtocol {
   enumeratorForContainer @5 (identifier :Data)
       -> (enumerator :Enumerator.NSFileProviderRemoteEnumerator, error :Values.Error);
   watchContainer @6 (identifier :Data, observer :FPDWatchObserver) -> (watch :FPDWatch, error :Values.Error);
+  startProvidingItemWithIdentifier @7 (identifier :Data, readingOptions :UInt64)
+      -> (providing :Providing.FPDProviding, url :Values.Url, error :Values.Error);
+  startProvidingItemAtPath @8 (path :Data, readingOptions :UInt64)
+      -> (providing :Providing.FPDProviding, url :Values.Url, error :Values.Error);
+  stopProvidingItemAtURL @9 (url :Values.Url) -> (error :Values.Error);
+  movingItemAtURL @10 (url :Values.Url, destination :Values.Url)
+      -> (requiresProviding :Bool, error :Values.Error);
 }
 
 interface FPDWatch {

@@ -2,6 +2,7 @@
 
 #include "platform/fileprovider/NSFileProviderRemote.h"
 #include "platform/fileprovider/xpc/FPDControlProtocol.capnp.h"
+#include "platform/fileprovider/xpc/FPDProvidingAdapter.h"
 #include "platform/fileprovider/xpc/FPDWatchAdapter.h"
 #include "platform/fileprovider/xpc/FileProviderInterfaces.h"
 #include "platform/fileprovider/xpc/RemoteEnumeratorAdapter.h"
@@ -14,6 +15,25 @@ namespace droxa {
 namespace {
 
 using Schema = schema::FPDControlProtocol;
+
+constexpr auto writeOutcome = [](auto results, Session &, const NSError &error) { setError(results, error); };
+constexpr auto writeMoving = [](auto results, Session &, bool requiresProviding, const NSError &error) {
+  results.setRequiresProviding(requiresProviding);
+  setError(results, error);
+};
+constexpr auto readOutcome = [](auto results, const RemoteObject &) { return std::tuple(getError(results)); };
+constexpr auto readMoving = [](auto results, const RemoteObject &) {
+  return std::tuple(static_cast<bool>(results.getRequiresProviding()), getError(results));
+};
+constexpr auto writeProviding = [](auto results, Session &session, const auto &providing, const NSURL &url,
+                                   const NSError &error) {
+  setProviding(results, session, providing);
+  setURL(results, url);
+  setError(results, error);
+};
+constexpr auto readProviding = [](auto results, const RemoteObject &via) {
+  return std::tuple(getProviding(results, via), getURL(results), getError(results));
+};
 
 void writeStatus(schema::FPDStatus::Builder builder, const FPDStatus &status) {
   builder.setProcessIdentifier(status.processIdentifier);
@@ -120,6 +140,38 @@ class ControlServer final : public Schema::Server {
         });
   }
 
+  kj::Promise<void> startProvidingItemWithIdentifier(
+      StartProvidingItemWithIdentifierContext context) override {
+    const auto params = context.getParams();
+    return exported_.serve(context, [identifier = xpcString(params.getIdentifier()),
+                                     options = params.getReadingOptions()](auto &object, auto reply) {
+      object.startProvidingItemWithIdentifier(identifier, options, reply(writeProviding));
+    });
+  }
+
+  kj::Promise<void> startProvidingItemAtPath(StartProvidingItemAtPathContext context) override {
+    const auto params = context.getParams();
+    return exported_.serve(context, [path = xpcString(params.getPath()),
+                                     options = params.getReadingOptions()](auto &object, auto reply) {
+      object.startProvidingItemAtPath(path, options, reply(writeProviding));
+    });
+  }
+
+  kj::Promise<void> stopProvidingItemAtURL(StopProvidingItemAtURLContext context) override {
+    return exported_.serve(context, [url = getURL(context.getParams())](auto &object, auto reply) {
+      object.stopProvidingItemAtURL(url, reply(writeOutcome));
+    });
+  }
+
+  kj::Promise<void> movingItemAtURL(MovingItemAtURLContext context) override {
+    const auto params = context.getParams();
+    return exported_.serve(
+        context,
+        [url = getURL(params),
+         destination = params.hasDestination() ? readURL(params.getDestination()) : NSURL()](
+            auto &object, auto reply) { object.movingItemAtURL(url, destination, reply(writeMoving)); });
+  }
+
  private:
   Exported<FPDControlProtocol> exported_;
 };
@@ -188,6 +240,45 @@ class ControlProxy final : public XPCProxy<Schema, FPDControlProtocol, ControlPr
           return std::tuple(results.hasWatch() ? receivedWatch(via, results.getWatch()) : nullptr,
                             getError(results));
         });
+  }
+
+  void startProvidingItemWithIdentifier(const std::string &identifier, std::uint64_t readingOptions,
+                                        FPDItemProvidingCompletion completion) override {
+    call(
+        &Client::startProvidingItemWithIdentifierRequest,
+        [identifier, readingOptions](auto params, Session &) {
+          params.setIdentifier(xpcBytes(identifier));
+          params.setReadingOptions(readingOptions);
+        },
+        std::move(completion), readProviding);
+  }
+
+  void startProvidingItemAtPath(const std::string &path, std::uint64_t readingOptions,
+                                FPDItemProvidingCompletion completion) override {
+    call(
+        &Client::startProvidingItemAtPathRequest,
+        [path, readingOptions](auto params, Session &) {
+          params.setPath(xpcBytes(path));
+          params.setReadingOptions(readingOptions);
+        },
+        std::move(completion), readProviding);
+  }
+
+  void stopProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override {
+    call(
+        &Client::stopProvidingItemAtURLRequest, [url](auto params, Session &) { setURL(params, url); },
+        std::move(completion), readOutcome);
+  }
+
+  void movingItemAtURL(const NSURL &url, const NSURL &destination,
+                       NSFileProviderMovingCompletion completion) override {
+    call(
+        &Client::movingItemAtURLRequest,
+        [url, destination](auto params, Session &) {
+          setURL(params, url);
+          if (destination) writeURL(params.initDestination(), destination);
+        },
+        std::move(completion), readMoving);
   }
 };
 

@@ -2,6 +2,7 @@
 
 using Cxx = import "/capnp/c++.capnp";
 using Enumerator = import "/platform/fileprovider/xpc/NSFileProviderRemoteEnumerator.capnp";
+using Providing = import "/platform/fileprovider/xpc/FPDProviding.capnp";
 using Values = import "/platform/xpc/Values.capnp";
 $Cxx.namespace("droxa::schema");
 
@@ -11,4 +12,11 @@ interface NSFileProviderExtensionProtocol {
   identifierForItemAtURL @2 (url :Values.Url) -> (identifier :Data);
   enumeratorForContainer @3 (identifier :Data)
       -> (enumerator :Enumerator.NSFileProviderRemoteEnumerator, error :Values.Error);
+  startProvidingItemAtURL @4 (url :Values.Url, readingOptions :UInt64)
+      -> (providing :Providing.FPDProviding, error :Values.Error);
+  stopProvidingItemAtURL @5 (url :Values.Url) -> (error :Values.Error);
+  itemChangedAtURL @6 (url :Values.Url) -> (error :Values.Error);
+  providePlaceholderAtURL @7 (url :Values.Url) -> (error :Values.Error);
+  movingItemAtURL @8 (url :Values.Url, destination :Values.Url)
+      -> (requiresProviding :Bool, error :Values.Error);
 }

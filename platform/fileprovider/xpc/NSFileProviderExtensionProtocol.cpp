@@ -1,6 +1,7 @@
 #include <utility>
 
 #include "platform/fileprovider/NSFileProviderRemote.h"
+#include "platform/fileprovider/xpc/FPDProvidingAdapter.h"
 #include "platform/fileprovider/xpc/FileProviderInterfaces.h"
 #include "platform/fileprovider/xpc/NSFileProviderExtensionProtocol.capnp.h"
 #include "platform/fileprovider/xpc/RemoteEnumeratorAdapter.h"
@@ -13,6 +14,16 @@ namespace droxa {
 namespace {
 
 using Schema = schema::NSFileProviderExtensionProtocol;
+
+constexpr auto writeOutcome = [](auto results, Session &, const NSError &error) { setError(results, error); };
+constexpr auto writeMoving = [](auto results, Session &, bool requiresProviding, const NSError &error) {
+  results.setRequiresProviding(requiresProviding);
+  setError(results, error);
+};
+constexpr auto readOutcome = [](auto results, const RemoteObject &) { return std::tuple(getError(results)); };
+constexpr auto readMoving = [](auto results, const RemoteObject &) {
+  return std::tuple(static_cast<bool>(results.getRequiresProviding()), getError(results));
+};
 
 class ExtensionServer final : public Schema::Server {
  public:
@@ -57,6 +68,46 @@ class ExtensionServer final : public Schema::Server {
     });
   }
 
+  kj::Promise<void> startProvidingItemAtURL(StartProvidingItemAtURLContext context) override {
+    const auto params = context.getParams();
+    return exported_.serve(
+        context, [url = getURL(params), options = params.getReadingOptions()](auto &object, auto reply) {
+          object.startProvidingItemAtURL(
+              url, options,
+              reply([](auto results, Session &session, const auto &providing, const NSError &error) {
+                setProviding(results, session, providing);
+                setError(results, error);
+              }));
+        });
+  }
+
+  kj::Promise<void> stopProvidingItemAtURL(StopProvidingItemAtURLContext context) override {
+    return exported_.serve(context, [url = getURL(context.getParams())](auto &object, auto reply) {
+      object.stopProvidingItemAtURL(url, reply(writeOutcome));
+    });
+  }
+
+  kj::Promise<void> itemChangedAtURL(ItemChangedAtURLContext context) override {
+    return exported_.serve(context, [url = getURL(context.getParams())](auto &object, auto reply) {
+      object.itemChangedAtURL(url, reply(writeOutcome));
+    });
+  }
+
+  kj::Promise<void> providePlaceholderAtURL(ProvidePlaceholderAtURLContext context) override {
+    return exported_.serve(context, [url = getURL(context.getParams())](auto &object, auto reply) {
+      object.providePlaceholderAtURL(url, reply(writeOutcome));
+    });
+  }
+
+  kj::Promise<void> movingItemAtURL(MovingItemAtURLContext context) override {
+    const auto params = context.getParams();
+    return exported_.serve(
+        context,
+        [url = getURL(params),
+         destination = params.hasDestination() ? readURL(params.getDestination()) : NSURL()](
+            auto &object, auto reply) { object.movingItemAtURL(url, destination, reply(writeMoving)); });
+  }
+
  private:
   Exported<NSFileProviderExtensionProtocol> exported_;
 };
@@ -97,6 +148,49 @@ class ExtensionProxy final : public XPCProxy<Schema, NSFileProviderExtensionProt
         [](auto results, const RemoteObject &via) {
           return std::tuple(getEnumerator(results, via), getError(results));
         });
+  }
+
+  void startProvidingItemAtURL(const NSURL &url, std::uint64_t readingOptions,
+                               FPDProvidingCompletion completion) override {
+    call(
+        &Client::startProvidingItemAtURLRequest,
+        [url, readingOptions](auto params, Session &) {
+          setURL(params, url);
+          params.setReadingOptions(readingOptions);
+        },
+        std::move(completion),
+        [](auto results, const RemoteObject &via) {
+          return std::tuple(getProviding(results, via), getError(results));
+        });
+  }
+
+  void stopProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override {
+    call(
+        &Client::stopProvidingItemAtURLRequest, [url](auto params, Session &) { setURL(params, url); },
+        std::move(completion), readOutcome);
+  }
+
+  void itemChangedAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override {
+    call(
+        &Client::itemChangedAtURLRequest, [url](auto params, Session &) { setURL(params, url); },
+        std::move(completion), readOutcome);
+  }
+
+  void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override {
+    call(
+        &Client::providePlaceholderAtURLRequest, [url](auto params, Session &) { setURL(params, url); },
+        std::move(completion), readOutcome);
+  }
+
+  void movingItemAtURL(const NSURL &url, const NSURL &destination,
+                       NSFileProviderMovingCompletion completion) override {
+    call(
+        &Client::movingItemAtURLRequest,
+        [url, destination](auto params, Session &) {
+          setURL(params, url);
+          if (destination) writeURL(params.initDestination(), destination);
+        },
+        std::move(completion), readMoving);
   }
 };
 

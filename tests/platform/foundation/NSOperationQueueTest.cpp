@@ -26,6 +26,38 @@ class Patient : public NSOperation {
   std::promise<void> started;
 };
 
+// Finishes when it is told, long after main().
+class Asynchronous : public NSOperation {
+ public:
+  bool isAsynchronous() const override { return true; }
+  void main() override { ++runs; }
+  void end() { finish(); }
+  std::atomic<int> runs = 0;
+};
+
+TEST(NSOperationQueue, anAsynchronousOperationIsFinishedWhenItSaysSo) {
+  NSOperationQueue queue;
+  const auto operation = std::make_shared<Asynchronous>();
+  queue.addOperation(operation);
+  EXPECT_TRUE(eventually([&] { return operation->runs == 1; }));
+  EXPECT_FALSE(operation->isFinished());
+  EXPECT_EQ(queue.operationCount(), 1U);
+  operation->end();
+  queue.waitUntilAllOperationsAreFinished();
+  operation->waitUntilFinished();
+  EXPECT_TRUE(operation->isFinished());
+}
+
+TEST(NSOperationQueue, anAsynchronousOperationThatNeverStartedIsFinished) {
+  NSOperationQueue queue;
+  const auto operation = std::make_shared<Asynchronous>();
+  operation->cancel();
+  queue.addOperation(operation);
+  operation->waitUntilFinished();
+  queue.waitUntilAllOperationsAreFinished();
+  EXPECT_EQ(operation->runs, 0);
+}
+
 TEST(NSOperationQueue, runsEachOperationOnce) {
   NSOperationQueue queue;
   std::vector<std::shared_ptr<Counted>> operations;

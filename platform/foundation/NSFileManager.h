@@ -1,0 +1,44 @@
+#pragma once
+
+#include <memory>
+
+#include "platform/foundation/NSError.h"
+#include "platform/foundation/NSURL.h"
+
+namespace droxa {
+
+inline constexpr std::int64_t NSFeatureUnsupportedError = 3328;
+
+// What a sync service's client library knows of documents whose contents may be elsewhere.
+// Thread contract: any thread; evict() may block on the service's daemon.
+class NSUbiquitousItemProviding {
+ public:
+  virtual ~NSUbiquitousItemProviding() = default;
+  // Lets go of the local contents; an error when they must stay.
+  virtual NSError evictItemAtURL(const NSURL &url) = 0;
+  // Whether there is a document at `url` whose contents aren't here. Asks the file system alone.
+  virtual bool isDataless(const NSURL &url) = 0;
+};
+
+// Thread contract: any thread.
+class NSFileManager {
+ public:
+  static NSFileManager *defaultManager();
+
+  // The sync service of this process; null: none. The library installs it.
+  void setUbiquitousItemProvider(std::shared_ptr<NSUbiquitousItemProviding> provider);
+  std::shared_ptr<NSUbiquitousItemProviding> ubiquitousItemProvider() const;
+
+  // Whether the local contents were let go of; otherwise `error` (may be null) is set: the service's, or
+  // NSFeatureUnsupportedError (NSCocoaErrorDomain) without a service. Blocks on the service's daemon.
+  bool evictUbiquitousItemAtURL(const NSURL &url, NSError *error) const;
+
+  NSFileManager();
+  ~NSFileManager();
+
+ private:
+  struct State;
+  const std::unique_ptr<State> state_;
+};
+
+}  // namespace droxa

@@ -1,0 +1,48 @@
+#include "tessaly/QVUbiquitousItems.h"
+
+#include <array>
+#include <memory>
+#include <string_view>
+#include <sys/xattr.h>
+
+#include "platform/foundation/NSFileManager.h"
+#include "tessaly/QVDaemonConnection.h"
+
+namespace droxa {
+
+namespace {
+
+constexpr char kDocumentAttribute[] = "user.droxa.document";
+constexpr std::size_t kLongestAttribute = 1024;
+
+class DaemonItems final : public NSUbiquitousItemProviding {
+ public:
+  // A document's refusal is the call's error; what was refused below a folder stays, which is no failure.
+  NSError evictItemAtURL(const NSURL &url) override {
+    const auto daemon = QVDaemonConnection::defaultConnection()->newSyncProxy();
+    (*daemon)->evictItemAtURL(url, [&](const QVContentsResult & /*result*/, const NSError &error) {
+      daemon->setObjResult({}, error);
+    });
+    return daemon->error();
+  }
+  bool isDataless(const NSURL &url) override { return qv_isDataless(url); }
+};
+
+}  // namespace
+
+bool qv_isDataless(const NSURL &url) {
+  if (!url.isFileURL()) return false;
+  std::array<char, kLongestAttribute> bytes{};
+  const ssize_t length = lgetxattr(url.path().c_str(), kDocumentAttribute, bytes.data(), bytes.size());
+  if (length <= 0) return false;
+  const std::string_view marker(bytes.data(), static_cast<std::size_t>(length));
+  const std::string_view state = marker.substr(0, 4);
+  return state == "1 d " || state == "1 e ";
+}
+
+void QVInstallUbiquitousItemProvider() {
+  static const auto &provider = *new std::shared_ptr<NSUbiquitousItemProviding>(new DaemonItems);
+  NSFileManager::defaultManager()->setUbiquitousItemProvider(provider);
+}
+
+}  // namespace droxa

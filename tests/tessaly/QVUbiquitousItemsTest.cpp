@@ -1,0 +1,78 @@
+#include <gtest/gtest.h>
+#include <sys/xattr.h>
+
+#include "platform/foundation/NSFileManager.h"
+#include "platform/foundation/NSURLResources.h"
+#include "tessaly/QVUbiquitousItems.h"
+#include "tests/support/FakeDaemonConnection.h"
+#include "tests/support/ScratchHome.h"
+
+namespace droxa {
+
+namespace {
+
+class UbiquitousItems : public testing::Test {
+ protected:
+  UbiquitousItems() { QVInstallUbiquitousItemProvider(); }
+  ~UbiquitousItems() override { NSFileManager::defaultManager()->setUbiquitousItemProvider(nullptr); }
+
+  // Marks the file as the daemon does; false where the file system has no such attributes.
+  bool mark(const std::string &state) const {
+    const std::string marker = "1 " + state + " 8 0 0 0123 v1 record";
+    return setxattr(file_.path().c_str(), "user.droxa.document", marker.data(), marker.size(), 0) == 0;
+  }
+  NSURL makeFile() const {
+    home_.write("replica/org.example.Box/Documents/a", "contents");
+    return NSURL::fileURLWithPath(home_.replica() + "/org.example.Box/Documents/a");
+  }
+
+  const ScratchHome home_;
+  const FakeDaemonScope fake_;
+  const NSURL file_ = makeFile();
+};
+
+}  // namespace
+
+TEST_F(UbiquitousItems, areEvictedByTheDaemon) {
+  fake_.daemon->addDocument("a");
+  NSError error;
+  EXPECT_TRUE(NSFileManager::defaultManager()->evictUbiquitousItemAtURL(fake_.daemon->url("a"), &error));
+  EXPECT_EQ(error, NSError());
+  EXPECT_FALSE(fake_.daemon->item("a")->fields().isDownloaded);
+}
+
+TEST_F(UbiquitousItems, aRefusedEvictionIsTheDaemonsError) {
+  fake_.daemon->addDocument("a");
+  fake_.daemon->setUnsent("a", true);
+  NSError error;
+  EXPECT_FALSE(NSFileManager::defaultManager()->evictUbiquitousItemAtURL(fake_.daemon->url("a"), &error));
+  EXPECT_TRUE(error.is(QVTessalyErrorDomain, QVErrorUnsentChanges));
+  EXPECT_FALSE(NSFileManager::defaultManager()->evictUbiquitousItemAtURL(fake_.daemon->url("a"), nullptr));
+}
+
+TEST_F(UbiquitousItems, aDatalessDocumentIsNotReachable) {
+  if (!mark("d")) GTEST_SKIP() << "no extended attributes here";
+  EXPECT_TRUE(qv_isDataless(file_));
+  NSError error;
+  EXPECT_FALSE(checkResourceIsReachableAndReturnError(file_, &error));
+  EXPECT_TRUE(error.is(NSCocoaErrorDomain, NSFileReadNoSuchFileError));
+  mark("e");
+  EXPECT_FALSE(checkResourceIsReachableAndReturnError(file_, nullptr));
+}
+
+TEST_F(UbiquitousItems, aPresentOrUnmarkedDocumentIsReachable) {
+  EXPECT_TRUE(checkResourceIsReachableAndReturnError(file_, nullptr));
+  if (!mark("p")) GTEST_SKIP() << "no extended attributes here";
+  EXPECT_FALSE(qv_isDataless(file_));
+  EXPECT_TRUE(checkResourceIsReachableAndReturnError(file_, nullptr));
+}
+
+TEST_F(UbiquitousItems, anAttributeOfAnotherKindSaysNothing) {
+  if (!mark("d")) GTEST_SKIP() << "no extended attributes here";
+  setxattr(file_.path().c_str(), "user.droxa.document", "2 d x", 5, 0);
+  EXPECT_FALSE(qv_isDataless(file_));
+  setxattr(file_.path().c_str(), "user.droxa.document", "1 d", 3, 0);
+  EXPECT_FALSE(qv_isDataless(file_));
+}
+
+}  // namespace droxa
