@@ -19,13 +19,14 @@ std::shared_ptr<Host> Host::create(const std::string &extensionProgram) {
   });
   auto calls = std::make_shared<ExtensionCalls>(host->launcher_);
   host->followed_ = std::make_shared<FollowedContainers>(calls);
-  host->signals_ = std::make_shared<HostSignalReceiver>(host->followed_);
+  const auto listings = std::make_shared<OpenListings>();
+  host->signals_ = std::make_shared<HostSignalReceiver>(host->followed_, listings);
   host->launcher_->setHost(host->signals_);
-  host->control_ = std::make_shared<ControlService>(calls, host->followed_, DroxaProcessHome().replica(),
-                                                    [weak = std::weak_ptr<Host>(host)] {
-                                                      const auto self = weak.lock();
-                                                      return self ? self->status() : FPDStatus();
-                                                    });
+  host->control_ = std::make_shared<ControlService>(
+      calls, host->followed_, listings, DroxaProcessHome().replica(), [weak = std::weak_ptr<Host>(host)] {
+        const auto self = weak.lock();
+        return self ? self->status() : FPDStatus();
+      });
   return host;
 }
 

@@ -1,7 +1,6 @@
 #include "fileproviderd/HostServices.h"
 
 #include "fileproviderd/HostErrors.h"
-#include "fileproviderd/RelayedEnumerator.h"
 #include "platform/dispatch/dispatch.h"
 #include "platform/fileprovider/NSFileProviderError.h"
 
@@ -10,15 +9,18 @@ namespace droxa {
 void HostSignalReceiver::signalEnumerator(const std::string &containerIdentifier,
                                           NSFileProviderErrorCompletion completion) {
   ++signals_;
+  listings_->signal(containerIdentifier);
   followed_->signal(containerIdentifier);
   completion(NSError());
 }
 
 ControlService::ControlService(std::shared_ptr<ExtensionCalls> calls,
-                               std::shared_ptr<FollowedContainers> followed, std::string replica,
+                               std::shared_ptr<FollowedContainers> followed,
+                               std::shared_ptr<OpenListings> listings, std::string replica,
                                StatusSource status)
     : calls_(std::move(calls)),
       followed_(std::move(followed)),
+      listings_(std::move(listings)),
       paths_(std::make_shared<PathResolver>(calls_, std::move(replica))),
       providings_(std::make_shared<Providings>(calls_)),
       status_(std::move(status)) {}
@@ -63,10 +65,14 @@ void ControlService::enumeratorForContainer(const std::string &identifier,
                                             NSFileProviderEnumeratorCompletion completion) {
   calls_->enumeratorForContainer(
       identifier,
-      [calls = calls_, identifier, completion](
+      [calls = calls_, listings = listings_, identifier, completion](
           const std::shared_ptr<NSFileProviderRemoteEnumerator> &enumerator, const NSError &error) {
-        completion(enumerator ? std::make_shared<RelayedEnumerator>(calls, identifier, enumerator) : nullptr,
-                   explainedError(identifier, error));
+        std::shared_ptr<RelayedEnumerator> relayed;
+        if (enumerator) {
+          relayed = std::make_shared<RelayedEnumerator>(calls, identifier, enumerator);
+          listings->add(identifier, relayed);
+        }
+        completion(relayed, explainedError(identifier, error));
       });
 }
 

@@ -6,6 +6,7 @@
 #include <string>
 
 #include "fileproviderd/FollowedContainers.h"
+#include "fileproviderd/OpenListings.h"
 #include "fileproviderd/PathResolver.h"
 #include "fileproviderd/Providings.h"
 
@@ -15,14 +16,15 @@ namespace droxa {
 // Thread contract: any thread.
 class HostSignalReceiver final : public NSFileProviderHostProtocol {
  public:
-  explicit HostSignalReceiver(std::shared_ptr<FollowedContainers> followed)
-      : followed_(std::move(followed)) {}
+  HostSignalReceiver(std::shared_ptr<FollowedContainers> followed, std::shared_ptr<OpenListings> listings)
+      : followed_(std::move(followed)), listings_(std::move(listings)) {}
   void signalEnumerator(const std::string &containerIdentifier,
                         NSFileProviderErrorCompletion completion) override;
   std::uint64_t signals() const { return signals_.load(); }
 
  private:
   const std::shared_ptr<FollowedContainers> followed_;
+  const std::shared_ptr<OpenListings> listings_;
   std::atomic<std::uint64_t> signals_{0};
 };
 
@@ -34,7 +36,7 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   using StatusSource = std::function<FPDStatus()>;
 
   ControlService(std::shared_ptr<ExtensionCalls> calls, std::shared_ptr<FollowedContainers> followed,
-                 std::string replica, StatusSource status);
+                 std::shared_ptr<OpenListings> listings, std::string replica, StatusSource status);
 
   void getStatus(FPDStatusCompletion completion) override;
   void itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion) override;
@@ -56,6 +58,7 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
  private:
   const std::shared_ptr<ExtensionCalls> calls_;
   const std::shared_ptr<FollowedContainers> followed_;
+  const std::shared_ptr<OpenListings> listings_;
   const std::shared_ptr<PathResolver> paths_;
   const std::shared_ptr<Providings> providings_;
   const StatusSource status_;

@@ -60,6 +60,8 @@ class NSXPCConnection {
   // interface gives the call one of its own. Default: 30 s.
   virtual void setCallDeadline(std::chrono::milliseconds deadline) = 0;
   virtual void resume() = 0;
+  // Replies given and calls made before still reach a peer that reads them within a second; the calls fail
+  // all the same.
   virtual void invalidate() = 0;
 
   // The peer's exported object. `Protocol` is what the remote object interface describes.

@@ -13,15 +13,17 @@ class HostServicesTest : public ::testing::Test {
   std::shared_ptr<ExtensionCalls> calls =
       std::make_shared<ExtensionCalls>(std::make_shared<ScriptedConnecting>(extension));
   std::shared_ptr<FollowedContainers> followed = std::make_shared<FollowedContainers>(calls);
-  std::shared_ptr<ControlService> control = std::make_shared<ControlService>(calls, followed, "/r", [] {
-    FPDStatus status;
-    status.processIdentifier = 7;
-    return status;
-  });
+  std::shared_ptr<OpenListings> listings = std::make_shared<OpenListings>();
+  std::shared_ptr<ControlService> control =
+      std::make_shared<ControlService>(calls, followed, listings, "/r", [] {
+        FPDStatus status;
+        status.processIdentifier = 7;
+        return status;
+      });
 };
 
 TEST_F(HostServicesTest, aSignalIsCountedAndAnswered) {
-  HostSignalReceiver receiver(followed);
+  HostSignalReceiver receiver(followed, listings);
   int answers = 0;
   receiver.signalEnumerator("i1", [&](const NSError &error) {
     EXPECT_FALSE(error);
@@ -29,6 +31,34 @@ TEST_F(HostServicesTest, aSignalIsCountedAndAnswered) {
   });
   EXPECT_EQ(answers, 1);
   EXPECT_EQ(receiver.signals(), 1U);
+}
+
+TEST_F(HostServicesTest, aSignalReachesTheListingsOfItsContainer) {
+  HostSignalReceiver receiver(followed, listings);
+  std::shared_ptr<NSFileProviderRemoteEnumerator> listing;
+  control->enumeratorForContainer("i1",
+                                  [&](const auto &enumerator, const NSError &) { listing = enumerator; });
+  const auto asked = extension->enumerators.take();
+  ASSERT_TRUE(listing && asked);
+  std::vector<std::string> pages;
+  const auto ask = [&](const std::string &page) {
+    listing->enumerateItems(NSData::dataWithString(page),
+                            [&](const auto &items, const NSData &, const NSError &) {
+                              pages.push_back(std::to_string(items.size()));
+                            });
+  };
+  ask("p");
+  asked->answerPage("p", {}, "q");
+  asked->answerPage("q", {document(1, "old")});
+  receiver.signalEnumerator("another", [](const NSError &) {});
+  ask("q");
+  ask("p");
+  asked->answerPage("p", {}, "q");
+  asked->answerPage("q", {document(1, "old")});
+  receiver.signalEnumerator("i1", [](const NSError &) {});
+  ask("q");
+  asked->answerPage("q", {document(1, "new"), document(2, "newer")});
+  EXPECT_EQ(pages, (std::vector<std::string>{"0", "1", "0", "2"}));
 }
 
 TEST_F(HostServicesTest, theStatusHasTheProcessAndTheCounts) {

@@ -40,6 +40,104 @@ TEST_F(RelayedEnumeratorTest, aListingGoesOnInANewExtension) {
   EXPECT_EQ(pageResult, "0 items");
 }
 
+// The page ahead: asked for when the one before is given, answered when the client asks for it.
+
+TEST_F(RelayedEnumeratorTest, theNextPageIsAskedForWhileTheClientWorks) {
+  askForPage("p");
+  first->answerPage("p", {document(1, "a")}, "q");
+  first->answerPage("q", {document(2, "b"), document(3, "c")}, "r");
+  EXPECT_EQ(pageResult, "1 items");
+  EXPECT_EQ(first->calls.size(), 0U);  // one page ahead, not two
+  askForPage("q");
+  EXPECT_EQ(pageResult, "2 items");
+  first->answerPage("r", {});
+  askForPage("r");
+  EXPECT_EQ(pageResult, "0 items");
+  EXPECT_EQ(first->calls.size(), 0U);
+}
+
+TEST_F(RelayedEnumeratorTest, aPageOnItsWayIsAwaited) {
+  askForPage("p");
+  first->answerPage("p", {}, "q");
+  askForPage("q");
+  EXPECT_EQ(pageResult, "0 items");
+  first->answerPage("q", {document(1, "a")});
+  EXPECT_EQ(pageResult, "1 items");
+  EXPECT_EQ(first->calls.size(), 0U);
+}
+
+TEST_F(RelayedEnumeratorTest, aSignalDropsThePageAhead) {
+  askForPage("p");
+  first->answerPage("p", {}, "q");
+  first->answerPage("q", {document(1, "old")});
+  relayed->containerWasSignalled();
+  askForPage("q");
+  first->answerPage("q", {document(1, "new"), document(2, "newer")});
+  EXPECT_EQ(pageResult, "2 items");
+}
+
+TEST_F(RelayedEnumeratorTest, aPageThatIsAwaitedDuringASignalIsAskedForAnew) {
+  askForPage("p");
+  first->answerPage("p", {}, "q");
+  askForPage("q");
+  relayed->containerWasSignalled();
+  first->answerPage("q", {document(1, "old")});
+  EXPECT_EQ(pageResult, "0 items");
+  first->answerPage("q", {document(1, "new"), document(2, "newer")});
+  EXPECT_EQ(pageResult, "2 items");
+}
+
+TEST_F(RelayedEnumeratorTest, aPageAheadThatFailsIsAskedForAnew) {
+  askForPage("p");
+  first->answerPage("p", {}, "q");
+  first->failPage("q", NSError::errorWithPOSIXCode(5, "broken"));
+  askForPage("q");
+  first->answerPage("q", {document(1, "a")});
+  EXPECT_EQ(pageResult, "1 items");
+}
+
+TEST_F(RelayedEnumeratorTest, anAwaitedPageGoesOnInANewExtension) {
+  askForPage("p");
+  first->answerPage("p", {}, "q");
+  askForPage("q");
+  first->failPage("q", connectionInterrupted());
+  first->failPage("q", connectionInterrupted());
+  auto second = extension->enumerators.take();
+  ASSERT_TRUE(second);
+  second->answerPage("q", {document(1, "a")});
+  EXPECT_EQ(pageResult, "1 items");
+}
+
+TEST_F(RelayedEnumeratorTest, anotherPageThanTheNextIsAskedFor) {
+  askForPage("p");
+  first->answerPage("p", {}, "q");
+  first->answerPage("q", {document(1, "a")});
+  askForPage("p");
+  first->answerPage("p", {document(1, "a"), document(2, "b")});
+  EXPECT_EQ(pageResult, "2 items");
+}
+
+TEST_F(RelayedEnumeratorTest, aClientThatGoesLeavesThePageAheadBehind) {
+  askForPage("p");
+  first->answerPage("p", {}, "q");
+  const std::weak_ptr<RelayedEnumerator> weak = relayed;
+  relayed.reset();
+  EXPECT_TRUE(weak.expired());
+  first->answerPage("q", {document(1, "a")});
+  EXPECT_EQ(pageResult, "0 items");
+}
+
+TEST_F(RelayedEnumeratorTest, aClientThatGoesIsStillAnswered) {
+  askForPage("p");
+  first->answerPage("p", {}, "q");
+  askForPage("q");
+  const std::weak_ptr<RelayedEnumerator> weak = relayed;
+  relayed.reset();
+  first->answerPage("q", {document(1, "a")});
+  EXPECT_EQ(pageResult, "1 items");
+  EXPECT_TRUE(weak.expired());
+}
+
 TEST_F(RelayedEnumeratorTest, anotherErrorIsPassedOn) {
   askForPage("p");
   first->failPage("p", NSError::errorWithPOSIXCode(5, "broken"));
