@@ -1,5 +1,6 @@
 #include "keld/Placement.h"
 
+#include "keld/contents/PromiseFile.h"
 #include "tessaly/NSURL+Tessaly.h"
 #include "tessaly/QVContainer.h"
 
@@ -34,6 +35,7 @@ std::optional<std::uint32_t> Placement::flags(ItemNumber parent, std::string_vie
     return static_cast<std::uint32_t>(zone);
   }
   if (!record_) return std::nullopt;
+  if (!isFolder && IsPromiseName(name)) return std::nullopt;  // stands for a document, and is none
   if (isContainer_) {
     if (!isFolder || name != kDocumentsName) zone = Zone::privateStorage;
   } else if (record_->zone() == Zone::structure) {

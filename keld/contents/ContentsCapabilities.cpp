@@ -26,7 +26,7 @@ bool hasHoles(int file, std::uint64_t size) {
   const std::string bytes(size, 'x');
   if (::pwrite(file, bytes.data(), bytes.size(), 0) != length || ::fsync(file) != 0) return false;
   if (ReadDataCoverage(file, size, &coverage) != 0 || coverage != DataCoverage::all) return false;
-  if (::fallocate(file, FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, length) != 0) return false;
+  if (PunchOut(file, size) != 0) return false;
   return ReadDataCoverage(file, size, &coverage) == 0 && coverage == DataCoverage::none;
 }
 

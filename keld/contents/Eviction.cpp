@@ -76,15 +76,6 @@ bool isTheContents(const FileFacts &facts, const FileFacts &expected, const Docu
          facts.modified == marker.modified;
 }
 
-// To the end of the last block: one that is punched in part is filled with zeros, not let go of.
-int punch(int file, std::uint64_t size) {
-  constexpr std::uint64_t kStep = 1 << 20;
-  const auto length = static_cast<off_t>((size + kStep - 1) / kStep * kStep);
-  while (::fallocate(file, FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, length) != 0)
-    if (errno != EINTR) return errno;
-  return 0;
-}
-
 ContentsResult touched(const OutgoingDocument &document) {
   return ContentsResult::failed(document.hasChanged() ? ContentsOutcome::changedMeanwhile
                                                       : ContentsOutcome::inUse);
@@ -142,7 +133,7 @@ ContentsResult ContentsStorage::letGo(OutgoingDocument &document, DocumentMarker
   };
   call(settings_.hooks.beforePunch);
   if (!document.isUntouched()) return keep(touched(document));
-  if (const int error = punch(file, marker.size); error != 0) {
+  if (const int error = PunchOut(file, marker.size); error != 0) {
     // Anything but a plain refusal may have cost contents already: it stays marked, for finishEviction.
     const auto failed = ContentsResult::failedWith(error);
     return error == EOPNOTSUPP || error == EPERM || error == ENOSYS ? keep(failed) : failed;

@@ -146,6 +146,15 @@ int ReadDataCoverage(int descriptor, std::uint64_t size, DataCoverage *coverage)
   return 0;
 }
 
+// To the end of the last block: one that is punched in part is filled with zeros, not let go of.
+int PunchOut(int file, std::uint64_t size) {
+  constexpr std::uint64_t kStep = 1 << 20;
+  const auto length = static_cast<off_t>((size + kStep - 1) / kStep * kStep);
+  while (::fallocate(file, FALLOC_FL_PUNCH_HOLE | FALLOC_FL_KEEP_SIZE, 0, length) != 0)
+    if (errno != EINTR) return errno;
+  return 0;
+}
+
 bool BeginsWithZeros(int descriptor, std::uint64_t length) {
   std::array<char, kBlockBytes> bytes;
   const std::size_t wanted = static_cast<std::size_t>(std::min<std::uint64_t>(length, bytes.size()));

@@ -31,6 +31,9 @@ int CopyContents(int from, int to, std::uint64_t size);
 void CopyForeignAttributes(int from, int to);
 void RemoveAttributes(int descriptor);
 
+// Gives back all of a file's blocks; its size stays. 0 or an errno.
+int PunchOut(int file, std::uint64_t size);
+
 // How much of an open file somebody has written.
 enum class DataCoverage { none, some, all };
 int ReadDataCoverage(int descriptor, std::uint64_t size, DataCoverage *coverage);

@@ -19,6 +19,7 @@
 #include "tests/support/Once.h"
 #include "tests/support/RecordingReceivers.h"
 #include "tests/support/ScratchHome.h"
+#include "tests/support/UnreachableCloud.h"
 
 namespace droxa::keld {
 
@@ -28,6 +29,9 @@ namespace droxa::keld {
 class KeldFixture {
  public:
   explicit KeldFixture(KeldOptions options = {}, bool starts = true) : options_(std::move(options)) {
+    // What isn't about the sync isn't to see its traces.
+    if (!options_.sync.cloud && options_.sync.cloudFolder.empty())
+      options_.sync.cloud = std::make_shared<UnreachableCloud>();
     std::filesystem::create_directories(at(""));
     if (starts) start();
   }
