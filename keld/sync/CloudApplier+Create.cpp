@@ -29,7 +29,7 @@ void CloudApplier::create(const DocumentRecord &document, const Place &place, Sy
   row.name = document.name;
   row.kind = document.kind;
   row.content = document.content;
-  row.isDataless = document.kind == NSFileProviderItemKind::document;
+  row.isDataless = document.kind == NSFileProviderItemKind::document && document.content.size > 0;
   bool made = false;
   if (document.kind == NSFileProviderItemKind::folder)
     made = createFolder(document, place, &row);

@@ -45,7 +45,11 @@ void ContentsService::find(const NSURL &url, Found found) {
   if (!path) return found(nullptr, qvc_errorNoSuchItem(url.path()));
   NSError error;
   const auto item = known(*path, &error);
-  if (item || error) return found(item ? &*item : nullptr, error);
+  if (error) return found(nullptr, error);
+  // Another file may have come to that path a moment ago.
+  struct stat status = {};
+  const bool isThere = ::lstat(engine_->files().absolute(*path).c_str(), &status) == 0;
+  if (item && isThere && status.st_ino == item->facts.inode) return found(&*item, NSError());
   host_.keeper().lookAt(*path, [self = shared_from_this(), path = *path, url, found = std::move(found)] {
     NSError problem;
     const auto seen = self->known(path, &problem);
