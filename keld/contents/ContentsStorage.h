@@ -148,8 +148,9 @@ class ContentsStorage {
   // ---- documents in the replica ----
 
   // Fills a dataless document: done; gone (the part stays), changedMeanwhile, inUse (somebody has the
-  // placeholder open for writing), noSpace or error; unless done, the part stays as it was. `expected` are
-  // the facts of the placeholder that is to be filled (of the promise in the promise form); its inode counts.
+  // placeholder open for writing), noSpace or error. Unless done, the part stays as it was (when something
+  // was rescued it may have to be opened again). `expected` are the facts of the placeholder that is to be
+  // filled (of the promise in the promise form); its inode counts.
   ContentsResult materialise(int folder, const std::string &name, PartFile &part, PartUse use,
                              const DocumentMarker &marker, std::uint32_t mode,
                              const FileFacts &expected) const;

@@ -76,11 +76,6 @@ bool isTheContents(const FileFacts &facts, const FileFacts &expected, const Docu
          facts.modified == marker.modified;
 }
 
-ContentsResult touched(const OutgoingDocument &document) {
-  return ContentsResult::failed(document.hasChanged() ? ContentsOutcome::changedMeanwhile
-                                                      : ContentsOutcome::inUse);
-}
-
 }  // namespace
 
 ContentsResult ContentsStorage::evict(int folder, const std::string &name, const FileFacts &expected,
@@ -122,7 +117,7 @@ ContentsResult ContentsStorage::finishEviction(int folder, const std::string &na
 // Marked durably before the first byte goes: whatever is left after a crash is never taken for contents.
 ContentsResult ContentsStorage::letGo(OutgoingDocument &document, DocumentMarker marker) const {
   const int file = document.descriptor();
-  const auto before = document.marker();
+  const auto &before = document.marker();  // what it bore when it was opened
   marker.state = MarkerState::evicting;
   if (const int error = WriteMarker(file, marker); error != 0) return ContentsResult::failedWith(error);
   if (::fsync(file) != 0) return ContentsResult::failedWith(errno);
@@ -132,7 +127,7 @@ ContentsResult ContentsStorage::letGo(OutgoingDocument &document, DocumentMarker
     return why;
   };
   call(settings_.hooks.beforePunch);
-  if (!document.isUntouched()) return keep(touched(document));
+  if (!document.isUntouched()) return keep(document.touchedResult());
   if (const int error = PunchOut(file, marker.size); error != 0) {
     // Anything but a plain refusal may have cost contents already: it stays marked, for finishEviction.
     const auto failed = ContentsResult::failedWith(error);
@@ -172,7 +167,7 @@ ContentsResult ContentsStorage::evictToPromise(int folder, const std::string &na
   call(settings_.hooks.beforePunch);
   std::string temporary;
   ContentsResult result =
-      document->isUntouched() ? takeOut(folder, name, *document, &temporary) : touched(*document);
+      document->isUntouched() ? takeOut(folder, name, *document, &temporary) : document->touchedResult();
   if (!result.isDone()) {
     removePromise(folder, name);
     return result;
@@ -180,7 +175,7 @@ ContentsResult ContentsStorage::evictToPromise(int folder, const std::string &na
   call(settings_.hooks.afterPunch);
   if (const int syncError = SyncFolder(folder); syncError != 0) return ContentsResult::failedWith(syncError);
   if (!document->isUntouched()) {
-    result = touched(*document);
+    result = document->touchedResult();
     result.hasRescued = putBack(temporary, folder, name).hasRescued;
     removePromise(folder, name);
     return result;

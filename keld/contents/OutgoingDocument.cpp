@@ -46,6 +46,10 @@ bool OutgoingDocument::hasChanged() const {
   return now.facts.size != facts().size || now.facts.modified != facts().modified;
 }
 
+ContentsResult OutgoingDocument::touchedResult() const {
+  return ContentsResult::failed(hasChanged() ? ContentsOutcome::changedMeanwhile : ContentsOutcome::inUse);
+}
+
 bool OutgoingDocument::isAt(int folder, const std::string &name) const {
   const auto there = ReadFileFacts(folder, name, ownDevice_);
   return there && there->inode == facts().inode && there->device == facts().device;

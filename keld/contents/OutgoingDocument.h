@@ -37,6 +37,8 @@ class OutgoingDocument {
   // may be touched as long as nothing is in it.
   bool isUntouched() const { return !hasChanged() && lease_->isUnbroken(); }
   bool hasChanged() const;
+  // What to answer when it isn't untouched: changedMeanwhile or inUse.
+  ContentsResult touchedResult() const;
   bool isAt(int folder, const std::string &name) const;
   void release() { lease_->release(); }
 

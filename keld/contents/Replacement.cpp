@@ -22,11 +22,6 @@ ContentsResult notThere(int error) {
   return ContentsResult::failedWith(error);
 }
 
-ContentsResult touched(const OutgoingDocument &outgoing) {
-  return ContentsResult::failed(outgoing.hasChanged() ? ContentsOutcome::changedMeanwhile
-                                                      : ContentsOutcome::inUse);
-}
-
 }  // namespace
 
 ContentsResult ContentsStorage::materialise(int folder, const std::string &name, PartFile &part, PartUse use,
@@ -114,7 +109,7 @@ ContentsResult ContentsStorage::undoExchange(int folder, const std::string &name
                                              const OutgoingDocument &outgoing) const {
   const bool wasOther = !outgoing.isAt(temporaries_.get(), prepared.temporary_);
   ContentsResult result =
-      wasOther ? ContentsResult::failed(ContentsOutcome::changedMeanwhile) : touched(outgoing);
+      wasOther ? ContentsResult::failed(ContentsOutcome::changedMeanwhile) : outgoing.touchedResult();
   const int error = ExchangeNames(temporaries_.get(), prepared.temporary_, folder, name);
   if (error == 0 && isAsPrepared(prepared)) {
     SyncFolder(folder);
@@ -184,7 +179,7 @@ ContentsResult ContentsStorage::takeOut(int folder, const std::string &name, con
   if (outgoing.isAt(temporaries_.get(), *temporary) && outgoing.isUntouched()) return {};
   const bool wasOther = !outgoing.isAt(temporaries_.get(), *temporary);
   ContentsResult result =
-      wasOther ? ContentsResult::failed(ContentsOutcome::changedMeanwhile) : touched(outgoing);
+      wasOther ? ContentsResult::failed(ContentsOutcome::changedMeanwhile) : outgoing.touchedResult();
   result.hasRescued = putBack(*temporary, folder, name).hasRescued;
   return result;
 }

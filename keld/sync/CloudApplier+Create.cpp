@@ -208,7 +208,7 @@ CloudApplier::Taken CloudApplier::freeName(const FileLocation &there, const std:
   if (isInCloud && other->record < record) return Taken::useOtherName;
   if (!isInCloud) {
     std::string copy;
-    const NSError problem = conflicts_.setAside(there, {}, &copy);
+    const NSError problem = conflicts_.setAside(there, &copy);
     if (problem) return Taken::useOtherName;
     if (other) context_.store.erase(other->record);
     touch(there.path);

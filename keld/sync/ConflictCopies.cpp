@@ -3,6 +3,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <fcntl.h>
+#include <unistd.h>
 
 #include "keld/sync/ConflictName.h"
 #include "platform/foundation/NSDate.h"
@@ -15,30 +16,52 @@ namespace {
 constexpr unsigned kMostNumbers = 10000;
 }  // namespace
 
-NSError ConflictCopies::setAside(const FileLocation &location, const LocalFile &, std::string *newName) {
+// A document of its own doesn't bear another one's mark.
+void ConflictCopies::becomeOwnDocument(const FileLocation &location, const std::string &newName) {
+  ++made_;
+  const OwnedDescriptor file(
+      ::openat(location.folder.get(), newName.c_str(), O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK));
+  if (file) RemoveMarker(file.get());
+  if (auto row = context_.store.byItem(location.item.id)) {
+    row->item = 0;
+    row->local = {};
+    context_.store.put(*row);
+  }
+  os_log(qvc_default_log(), "[WARNING] %s was changed here and elsewhere: what was written here is now %s",
+         location.path, newName);
+}
+
+NSError ConflictCopies::setAside(const FileLocation &location, std::string *newName) {
   const std::int64_t now = NSDate::now().nanosecondsSince1970();
+  const int folder = location.folder.get();
   for (unsigned number = 1; number < kMostNumbers; ++number) {
     *newName = ConflictName(location.name, context_.device, now, number);
-    if (::renameat2(location.folder.get(), location.name.c_str(), location.folder.get(), newName->c_str(),
-                    RENAME_NOREPLACE) == 0) {
-      ++made_;
-      // A document of its own doesn't bear another one's mark.
-      const OwnedDescriptor file(
-          ::openat(location.folder.get(), newName->c_str(), O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK));
-      if (file) RemoveMarker(file.get());
-      if (auto row = context_.store.byItem(location.item.id)) {
-        row->item = 0;
-        row->local = {};
-        context_.store.put(*row);
-      }
-      os_log(qvc_default_log(),
-             "[WARNING] %s was changed here and elsewhere: what was written here is now %s", location.path,
-             *newName);
+    if (::renameat2(folder, location.name.c_str(), folder, newName->c_str(), RENAME_NOREPLACE) == 0) {
+      becomeOwnDocument(location, *newName);
       return NSError();
     }
     if (errno != EEXIST) break;
   }
   return NSError::errorWithPOSIXCode(errno, context_.files.absolute(location.path));
+}
+
+NSError ConflictCopies::nameAside(const FileLocation &location, std::string *newName) {
+  const std::int64_t now = NSDate::now().nanosecondsSince1970();
+  const int folder = location.folder.get();
+  for (unsigned number = 1; number < kMostNumbers; ++number) {
+    *newName = ConflictName(location.name, context_.device, now, number);
+    if (::linkat(folder, location.name.c_str(), folder, newName->c_str(), 0) == 0) return NSError();
+    if (errno != EEXIST) break;
+  }
+  return NSError::errorWithPOSIXCode(errno, context_.files.absolute(location.path));
+}
+
+void ConflictCopies::nameAsideOver(const FileLocation &location, const std::string &newName,
+                                   bool hasHappened) {
+  if (hasHappened)
+    becomeOwnDocument(location, newName);
+  else
+    ::unlinkat(location.folder.get(), newName.c_str(), 0);
 }
 
 void ConflictCopies::placeRescuedFiles() {

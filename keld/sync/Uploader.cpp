@@ -253,7 +253,7 @@ Uploader::Prepared Uploader::restorePartlyWritten(const FileLocation &location, 
                                                   Plan *plan) {
   SyncRow row = plan->row;
   std::string copy;
-  const NSError problem = conflicts_.setAside(location, plan->file, &copy);
+  const NSError problem = conflicts_.setAside(location, &copy);
   if (problem) return laterWith(plan, problem);
   context_.store.uploaded(plan->entry);
   DocumentMarker marker = *look.marker;

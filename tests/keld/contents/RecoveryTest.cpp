@@ -93,9 +93,9 @@ TEST_P(Recovering, takesNewerContentsForTheCloudsAfterTheyWerePublished) {
 TEST_P(Recovering, doesntPutContentsBackThatANewerPromiseReplaced) {
   if (hasPlaceholders()) return;
   replica_.publishPresent("a", kBytes);
-  auto newer = replica_.storage().preparePlaceholder(replica_.markerOf(kNewer, "2"), 0640, {0, 5});
   const auto promise = PromiseNameFor("a");
   const auto replace = [&] {
+    auto newer = replica_.storage().preparePlaceholder(replica_.markerOf(kNewer, "2"), 0640, {0, 5});
     replica_.storage().replaceContents(replica_.folder(), "a", newer.file, replica_.look("a").facts);
   };
   const auto publish = [&] {
