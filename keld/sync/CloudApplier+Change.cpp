@@ -43,7 +43,7 @@ void CloudApplier::change(const DocumentRecord &document, const Place &place, Sy
     touch(location->path);
     return;
   }
-  changeContents(document, place, std::move(row), *location);
+  changeContents(document, std::move(row), *location);
 }
 
 bool CloudApplier::move(const DocumentRecord &document, const Place &place, FileLocation *location) {
@@ -67,8 +67,7 @@ bool CloudApplier::move(const DocumentRecord &document, const Place &place, File
   return false;
 }
 
-void CloudApplier::changeContents(const DocumentRecord &document, const Place &place, SyncRow row,
-                                  const FileLocation &location) {
+void CloudApplier::changeContents(const DocumentRecord &document, SyncRow row, const FileLocation &location) {
   const DocumentLook look = context_.storage.classify(location.folder.get(), location.name);
   const bool isSameVersion = document.content.digest == row.content.digest;
   if (look.kind == DocumentClass::dataless || look.kind == DocumentClass::evicting) {
@@ -120,49 +119,12 @@ void CloudApplier::changeContents(const DocumentRecord &document, const Place &p
       return;
     }
   }
-  keepBoth(document, place, std::move(row), location);
-}
-
-// What was written here gets a name of its own, and the cloud's version takes the document's: by one step
-// where the file system can, so that nobody finds the name empty.
-void CloudApplier::keepBoth(const DocumentRecord &document, const Place &place, SyncRow row,
-                            const FileLocation &location) {
-  const std::string folder = location.path.substr(0, location.path.size() - location.name.size());
-  const ItemNumber item = row.item;
-  std::string copy;
-  row.newerTag.clear();
-  if (!conflicts_.nameAside(location, &copy)) {
-    PreparedResult prepared = context_.storage.preparePlaceholder(
-        markerOf(document), document.content.mode & 0777U, {0, document.content.modified});
-    const DocumentLook look = context_.storage.classify(location.folder.get(), location.name);
-    ContentsResult result = prepared.result;
-    if (result.isDone())
-      result =
-          context_.storage.replaceContents(location.folder.get(), location.name, prepared.file, look.facts);
-    conflicts_.nameAsideOver(location, copy, result.isDone());
-    if (result.isDone()) {
-      row.item = 0;
-      row.tag = document.tag;
-      row.content = document.content;
-      row.local = LocalFileOf(result.facts);
-      row.isDataless = document.content.size > 0;
-      context_.store.put(row);
-      context_.store.enqueue(item, false, false);
-      touch(location.path);
-      touch(folder + copy);
-      return;
-    }
-  }
-  const NSError problem = conflicts_.setAside(location, &copy);
-  if (problem) {
-    os_log_error(qvc_default_log(), "[ERROR] can't keep what was written at %s: %@", location.path, problem);
-    return;
-  }
-  touch(folder + copy);
-  context_.store.enqueue(item, false, false);
-  row.item = 0;
-  row.local = {};
-  create(document, place, std::move(row));
+  // The cloud's version is fetched first; then both are there at once, each under a name.
+  row.newerTag = document.tag;
+  row.newer = document.content;
+  context_.store.put(row);
+  if (look.kind != DocumentClass::partlyWritten) return;
+  context_.store.enqueue(row.item, false, false);  // which keeps what was written
 }
 
 void CloudApplier::replacePlaceholder(const DocumentRecord &document, SyncRow row,

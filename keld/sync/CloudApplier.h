@@ -53,10 +53,7 @@ class CloudApplier {
 
   void change(const DocumentRecord &document, const Place &place, SyncRow row, const ItemRecord &item);
   bool move(const DocumentRecord &document, const Place &place, FileLocation *location);
-  void changeContents(const DocumentRecord &document, const Place &place, SyncRow row,
-                      const FileLocation &location);
-  void keepBoth(const DocumentRecord &document, const Place &place, SyncRow row,
-                const FileLocation &location);
+  void changeContents(const DocumentRecord &document, SyncRow row, const FileLocation &location);
   void replacePlaceholder(const DocumentRecord &document, SyncRow row, const FileLocation &location,
                           const DocumentLook &look);
 

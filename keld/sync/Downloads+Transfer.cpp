@@ -77,7 +77,6 @@ Downloads::Try Downloads::attempt(std::uint64_t number, ItemNumber item,
       return Try::wait;
     case DocumentClass::edited:
     case DocumentClass::overwritten:
-      return Try::ended;
     case DocumentClass::plain:
     case DocumentClass::present:
       if (!row || !row->hasNewer()) return Try::ended;
@@ -100,34 +99,53 @@ Downloads::Try Downloads::attempt(std::uint64_t number, ItemNumber item,
     *error = qvc_error(QVErrorDatabase, location->path + ": nothing says which contents it has");
     return Try::ended;
   }
-  const bool isPresent = look.kind == DocumentClass::present || look.kind == DocumentClass::plain;
-  if (isNewer && isPresent && !IsSameContents(LocalFileOf(look.facts), row->local)) {
-    // Written here meanwhile: the sync keeps both.
-    store_.enqueue(item, false, false);
-    return Try::ended;
-  }
+  const bool isDataless = look.kind == DocumentClass::dataless;
+  const bool isConflict = isNewer && !isDataless && !IsSameContents(LocalFileOf(look.facts), row->local) &&
+                          look.kind != DocumentClass::present;
   const auto publish = [&](PartFile &part, PartUse use) {
-    if (!isPresent && !isNewer)
+    if (isDataless && !isNewer)
       return storage_.materialise(folder, name, part, use, wanted, mode, look.facts);
     PreparedResult prepared = storage_.prepareContents(part, use, wanted, mode);
     if (!prepared.result.isDone()) return prepared.result;
+    if (isConflict) return publishBeside(*location, prepared.file);
     return storage_.replaceContents(folder, name, prepared.file, look.facts);
   };
   const Try outcome = fill(number, *location, wanted, publish, cancellation, error);
-  if (outcome == Try::ended && !*error && isNewer) {
-    // What it was replaced by is what the cloud has.
-    store_.transaction([&] {
-      auto now = store_.byItem(item);
-      if (!now || now->newerTag != row->newerTag) return;
-      now->tag = now->newerTag;
-      now->content = now->newer;
-      now->newerTag.clear();
-      now->newer = {};
-      now->isDataless = false;
-      store_.put(*now);
-    });
-  }
+  if (outcome == Try::ended && !*error && isNewer) becameNewer(item, row->newerTag, isConflict);
   return outcome;
+}
+
+ContentsResult Downloads::publishBeside(const FileLocation &location, PreparedFile &prepared) {
+  std::string copy;
+  if (conflicts_.nameAside(location, &copy)) {
+    // No second names here: for a moment nothing has the document's.
+    if (conflicts_.setAside(location, &copy))
+      return ContentsResult::failed(ContentsOutcome::changedMeanwhile);
+    return storage_.publishNew(prepared, location.folder.get(), location.name);
+  }
+  const DocumentLook look = storage_.classify(location.folder.get(), location.name);
+  const ContentsResult result =
+      storage_.replaceContents(location.folder.get(), location.name, prepared, look.facts);
+  conflicts_.nameAsideOver(location, copy, result.isDone());
+  const std::string folder = location.path.substr(0, location.path.size() - location.name.size());
+  if (result.isDone()) states_.lookAt({location.path, folder + copy});
+  return result;
+}
+
+// What it was replaced by is what the cloud has.
+void Downloads::becameNewer(ItemNumber item, const std::string &tag, bool isConflict) {
+  store_.transaction([&] {
+    auto row = store_.byNewerTag(tag);
+    if (!row) return;
+    row->tag = row->newerTag;
+    row->content = row->newer;
+    row->newerTag.clear();
+    row->newer = {};
+    row->isDataless = false;
+    row->local = {};  // found out of the file when it is looked at
+    store_.put(*row);
+    if (isConflict) store_.enqueue(item, false, false);
+  });
 }
 
 Downloads::Try Downloads::fill(std::uint64_t number, const FileLocation &location,
@@ -177,7 +195,7 @@ Downloads::Try Downloads::fill(std::uint64_t number, const FileLocation &locatio
   const ContentsResult result = publish(*opened.part, isShared ? PartUse::keep : PartUse::consume);
   switch (result.outcome) {
     case ContentsOutcome::done:
-      published(location.item.id, location, result);
+      states_.show({location.item.id, false, true, LocalFileOf(result.facts), true});
       return Try::ended;
     case ContentsOutcome::gone:
     case ContentsOutcome::folderGone:
@@ -226,11 +244,6 @@ NSError Downloads::receive(std::uint64_t number, const CKAssetReference &asset, 
     const bool moved = part.length() > before;
     if (!CKErrorIsTimeout(error) || !moved) return error;
   }
-}
-
-void Downloads::published(ItemNumber item, const FileLocation &location, const ContentsResult &result) {
-  (void)location;
-  states_.show({item, false, true, LocalFileOf(result.facts), true});
 }
 
 }  // namespace droxa::keld

@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "keld/contents/ContentsStorage.h"
+#include "keld/sync/ConflictCopies.h"
 #include "keld/sync/ItemStates.h"
 #include "keld/sync/ReplicaFiles.h"
 #include "keld/sync/SyncStore.h"
@@ -38,7 +39,8 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
   using Ended = std::function<void(const NSError &error)>;
 
   Downloads(std::shared_ptr<CKCloud> cloud, SyncStore &store, ReplicaFiles &files,
-            const ContentsStorage &storage, ItemStates &states, DownloadOptions options);
+            const ContentsStorage &storage, ItemStates &states, ConflictCopies &conflicts,
+            DownloadOptions options);
 
   // One who wants the document here. The transfer is cancelled when the last of them has gone.
   class Interest {
@@ -96,13 +98,16 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
            const std::shared_ptr<CKCancellation> &cancellation, NSError *error);
   NSError receive(std::uint64_t number, const CKAssetReference &asset, PartFile &part,
                   const std::shared_ptr<CKCancellation> &cancellation);
-  void published(ItemNumber item, const FileLocation &location, const ContentsResult &result);
+  // Puts the cloud's version over what was written here, which gets a name of its own by that.
+  ContentsResult publishBeside(const FileLocation &location, PreparedFile &prepared);
+  void becameNewer(ItemNumber item, const std::string &tag, bool isConflict);
 
   const std::shared_ptr<CKCloud> cloud_;
   SyncStore &store_;
   ReplicaFiles &files_;
   const ContentsStorage &storage_;
   ItemStates &states_;
+  ConflictCopies &conflicts_;
   const DownloadOptions options_;
 
   mutable Mutex mutex_;

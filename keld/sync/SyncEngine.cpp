@@ -47,8 +47,9 @@ SyncEngine::SyncEngine(const std::string &replicaPath, const std::string &databa
                                                store_.retryNow(item);
                                                itemsChanged();
                                              })),
-      downloads_(std::make_shared<Downloads>(cloud_, store_, files_, *storage_, states_, options_.downloads)),
       conflicts_(context_),
+      downloads_(std::make_shared<Downloads>(cloud_, store_, files_, *storage_, states_, conflicts_,
+                                             options_.downloads)),
       uploader_(context_, *assets_, conflicts_),
       applier_(context_, conflicts_),
       examiner_(store_, files_, *storage_, states_, read, options_.deletionGuard) {

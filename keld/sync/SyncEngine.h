@@ -101,8 +101,8 @@ class SyncEngine {
   ItemStates states_;
   SyncContext context_;
   std::shared_ptr<AssetUploads> assets_;
-  std::shared_ptr<Downloads> downloads_;
   ConflictCopies conflicts_;
+  std::shared_ptr<Downloads> downloads_;
   Uploader uploader_;
   CloudApplier applier_;
   LocalExaminer examiner_;

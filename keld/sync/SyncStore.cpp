@@ -163,6 +163,14 @@ std::vector<SyncRow> SyncStore::childrenOf(const std::string &parent, std::uint6
   return all(asked);
 }
 
+std::optional<SyncRow> SyncStore::byNewerTag(const std::string &tag) {
+  if (tag.empty()) return std::nullopt;
+  const RecursiveLock lock(mutex_);
+  SqlStatement &asked = statement("SELECT " ROW_COLUMNS " FROM rows WHERE newerTag = ? AND newerTag <> ''");
+  asked.bindText(1, tag);
+  return one(asked);
+}
+
 std::vector<SyncRow> SyncStore::withNewerVersion(std::uint64_t limit) {
   const RecursiveLock lock(mutex_);
   SqlStatement &asked = statement("SELECT " ROW_COLUMNS " FROM rows WHERE newerTag <> '' LIMIT ?");

@@ -210,6 +210,8 @@ Uploader::Prepared Uploader::prepareDocument(const FileLocation &location, Plan 
   plan->isDataless = false;
   const bool isKnown = !row.content.digest.empty() && !row.tag.empty();
   if (isKnown && !row.isDataless && IsSameContents(plan->file, row.local)) return Prepared::save;
+  // Written here and elsewhere: the other version is on its way here, and then both are kept.
+  if (row.hasNewer()) return laterWith(plan, NSError());
   plan->hasContent = true;
   plan->changesMarker = true;
   return sendContents(location, plan, call);
