@@ -107,33 +107,16 @@ Downloads::Try Downloads::attempt(std::uint64_t number, ItemNumber item,
       return storage_.materialise(folder, name, part, use, wanted, mode, look.facts);
     PreparedResult prepared = storage_.prepareContents(part, use, wanted, mode);
     if (!prepared.result.isDone()) return prepared.result;
-    if (isConflict) return publishBeside(*location, prepared.file);
+    if (isConflict) return keepBoth_(*location, prepared.file);
     return storage_.replaceContents(folder, name, prepared.file, look.facts);
   };
   const Try outcome = fill(number, *location, wanted, publish, cancellation, error);
-  if (outcome == Try::ended && !*error && isNewer) becameNewer(item, row->newerTag, isConflict);
+  if (outcome == Try::ended && !*error && isNewer) becameNewer(row->newerTag);
   return outcome;
 }
 
-ContentsResult Downloads::publishBeside(const FileLocation &location, PreparedFile &prepared) {
-  std::string copy;
-  if (conflicts_.nameAside(location, &copy)) {
-    // No second names here: for a moment nothing has the document's.
-    if (conflicts_.setAside(location, &copy))
-      return ContentsResult::failed(ContentsOutcome::changedMeanwhile);
-    return storage_.publishNew(prepared, location.folder.get(), location.name);
-  }
-  const DocumentLook look = storage_.classify(location.folder.get(), location.name);
-  const ContentsResult result =
-      storage_.replaceContents(location.folder.get(), location.name, prepared, look.facts);
-  conflicts_.nameAsideOver(location, copy, result.isDone());
-  const std::string folder = location.path.substr(0, location.path.size() - location.name.size());
-  if (result.isDone()) states_.lookAt({location.path, folder + copy});
-  return result;
-}
-
 // What it was replaced by is what the cloud has.
-void Downloads::becameNewer(ItemNumber item, const std::string &tag, bool isConflict) {
+void Downloads::becameNewer(const std::string &tag) {
   store_.transaction([&] {
     auto row = store_.byNewerTag(tag);
     if (!row) return;
@@ -144,7 +127,6 @@ void Downloads::becameNewer(ItemNumber item, const std::string &tag, bool isConf
     row->isDataless = false;
     row->local = {};  // found out of the file when it is looked at
     store_.put(*row);
-    if (isConflict) store_.enqueue(item, false, false);
   });
 }
 

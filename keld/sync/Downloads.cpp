@@ -22,14 +22,12 @@ NSError cancelledError() {
 }  // namespace
 
 Downloads::Downloads(std::shared_ptr<CKCloud> cloud, SyncStore &store, ReplicaFiles &files,
-                     const ContentsStorage &storage, ItemStates &states, ConflictCopies &conflicts,
-                     DownloadOptions options)
+                     const ContentsStorage &storage, ItemStates &states, DownloadOptions options)
     : cloud_(std::move(cloud)),
       store_(store),
       files_(files),
       storage_(storage),
       states_(states),
-      conflicts_(conflicts),
       options_(options) {}
 
 // --- Who wants what.

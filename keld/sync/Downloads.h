@@ -12,7 +12,6 @@
 #include <vector>
 
 #include "keld/contents/ContentsStorage.h"
-#include "keld/sync/ConflictCopies.h"
 #include "keld/sync/ItemStates.h"
 #include "keld/sync/ReplicaFiles.h"
 #include "keld/sync/SyncStore.h"
@@ -39,8 +38,12 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
   using Ended = std::function<void(const NSError &error)>;
 
   Downloads(std::shared_ptr<CKCloud> cloud, SyncStore &store, ReplicaFiles &files,
-            const ContentsStorage &storage, ItemStates &states, ConflictCopies &conflicts,
-            DownloadOptions options);
+            const ContentsStorage &storage, ItemStates &states, DownloadOptions options);
+
+  // Puts what was prepared where a document is that was changed here, and keeps both. Blocks. Set once,
+  // before anything is wanted.
+  using ConflictHandler = std::function<ContentsResult(const FileLocation &location, PreparedFile &prepared)>;
+  void setConflictHandler(ConflictHandler handler) { keepBoth_ = std::move(handler); }
 
   // One who wants the document here. The transfer is cancelled when the last of them has gone.
   class Interest {
@@ -98,17 +101,15 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
            const std::shared_ptr<CKCancellation> &cancellation, NSError *error);
   NSError receive(std::uint64_t number, const CKAssetReference &asset, PartFile &part,
                   const std::shared_ptr<CKCancellation> &cancellation);
-  // Puts the cloud's version over what was written here, which gets a name of its own by that.
-  ContentsResult publishBeside(const FileLocation &location, PreparedFile &prepared);
-  void becameNewer(ItemNumber item, const std::string &tag, bool isConflict);
+  void becameNewer(const std::string &tag);
 
   const std::shared_ptr<CKCloud> cloud_;
   SyncStore &store_;
   ReplicaFiles &files_;
   const ContentsStorage &storage_;
   ItemStates &states_;
-  ConflictCopies &conflicts_;
   const DownloadOptions options_;
+  ConflictHandler keepBoth_;
 
   mutable Mutex mutex_;
   std::map<std::uint64_t, Transfer> transfers_ GUARDED_BY(mutex_);  // by their numbers

@@ -173,6 +173,7 @@ bool LocalExaminer::hasSyncedContents(const ItemRecord &item, SyncRow &row) {
   if (!location) return false;
   const DocumentLook look = storage_.classify(location->folder.get(), location->name);
   const bool isIntact = look.kind == DocumentClass::present || look.kind == DocumentClass::dataless;
+  if (look.facts.inode != item.facts.inode) return false;
   if (!isIntact || !look.marker || look.marker->recordName != row.record) return false;
   if (look.marker->digest != row.content.digest || look.marker->size != row.content.size) return false;
   row.local = LocalFileOf(look.facts);
@@ -192,6 +193,8 @@ bool LocalExaminer::bind(const ItemRecord &item, const std::string &parent) {
   }
   const auto location = files_.locate(item.id, nullptr);
   if (!location) return false;
+  const auto facts = ReadFileFacts(location->folder.get(), location->name, 0);
+  if (!facts || facts->inode != item.facts.inode) return false;  // another file by now; it is told of yet
   const auto marker = ReadMarker(location->folder.get(), location->name);
   if (!marker) return false;
   auto row = store_.byRecord(marker->recordName);
@@ -205,6 +208,14 @@ bool LocalExaminer::bind(const ItemRecord &item, const std::string &parent) {
   states_.show({item.id, row->isDataless, true, LocalFileOf(item.facts), true});
   if (bound_) bound_(item.id, *row);
   return true;
+}
+
+void LocalExaminer::bindTo(const std::string &record, ItemNumber item) {
+  auto row = store_.byRecord(record);
+  if (!row) return;
+  row->item = item;
+  store_.put(*row);
+  examineItem(item);
 }
 
 bool LocalExaminer::bindLink(const ItemRecord &item, SyncRow row) {

@@ -33,6 +33,11 @@ class LocalExaminer {
   // Examines one item now, whatever the feed says.
   void examineItem(ItemNumber item);
 
+  // Whether the cloud has the item as it is here, by what the row says of the cloud; learns the file that
+  // stands for the contents.
+  bool isClean(const ItemRecord &item, SyncRow &row, const std::string &parent);
+  // Has `item` stand for the record, whatever stood for it before.
+  void bindTo(const std::string &record, ItemNumber item);
   // Called, on the examining thread, for each file that was found to stand for a record.
   void setBoundHandler(std::function<void(ItemNumber item, const SyncRow &row)> handler) {
     bound_ = std::move(handler);
@@ -52,7 +57,6 @@ class LocalExaminer {
   void examineDeath(ItemNumber item);
   bool bind(const ItemRecord &item, const std::string &parent);
   bool bindLink(const ItemRecord &item, SyncRow row);
-  bool isClean(const ItemRecord &item, SyncRow &row, const std::string &parent);
   bool hasSyncedContents(const ItemRecord &item, SyncRow &row);
   void guardAgainstSpree(const std::vector<Change> &changes);
   void queue(ItemNumber item, bool isDeletion);

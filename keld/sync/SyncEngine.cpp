@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <future>
 #include <system_error>
 #include <utility>
 
@@ -48,11 +49,15 @@ SyncEngine::SyncEngine(const std::string &replicaPath, const std::string &databa
                                                itemsChanged();
                                              })),
       conflicts_(context_),
-      downloads_(std::make_shared<Downloads>(cloud_, store_, files_, *storage_, states_, conflicts_,
-                                             options_.downloads)),
-      uploader_(context_, *assets_, conflicts_),
-      applier_(context_, conflicts_),
-      examiner_(store_, files_, *storage_, states_, read, options_.deletionGuard) {
+      downloads_(std::make_shared<Downloads>(cloud_, store_, files_, *storage_, states_, options_.downloads)),
+      examiner_(store_, files_, *storage_, states_, read, options_.deletionGuard),
+      uploader_(context_, *assets_, conflicts_, examiner_),
+      applier_(context_, conflicts_) {
+  downloads_->setConflictHandler([this](const FileLocation &location, PreparedFile &prepared) {
+    ContentsResult result = ContentsResult::failed(ContentsOutcome::changedMeanwhile);
+    performAndWait([&] { result = keepBoth(location, prepared); });
+    return result;
+  });
   examiner_.setBoundHandler([this](ItemNumber item, const SyncRow &row) {
     if (row.isDataless && isPinnedOrBelowPin(item)) downloads_->fetchInBackground(item, row.content.size);
   });
@@ -76,9 +81,15 @@ void SyncEngine::stop() {
     wake_.notify_all();
   }
   stopping_->cancel();
-  if (assets_) assets_->stop();
-  if (downloads_) downloads_->stop();
   if (thread_.joinable()) thread_.join();
+  {
+    // Whoever waits for it is told by that.
+    std::vector<std::function<void()>> never;
+    const Lock lock(mutex_);
+    never.swap(work_);
+  }
+  assets_->stop();
+  downloads_->stop();
   subscription_.reset();
   std::vector<Waiter> waiters;
   std::vector<std::function<void(const NSError &)>> fetchers;
@@ -117,11 +128,58 @@ void SyncEngine::setSignedIn(bool isSignedIn) {
   wake_.notify_all();
 }
 
-void SyncEngine::perform(std::function<void()> work) {
+bool SyncEngine::perform(std::function<void()> work) {
   const Lock lock(mutex_);
-  if (stop_) return;
+  if (stop_) return false;
   work_.push_back(std::move(work));
   wake_.notify_all();
+  return true;
+}
+
+bool SyncEngine::performAndWait(std::function<void()> work) {
+  auto done = std::make_shared<std::promise<void>>();
+  std::future<void> future = done->get_future();
+  const bool isTaken = perform([done = std::move(done), work = std::move(work)] {
+    work();
+    done->set_value();
+  });
+  if (!isTaken) return false;
+  future.wait();  // work that is dropped breaks its promise
+  try {
+    future.get();
+    return true;
+  } catch (const std::future_error &) {
+    return false;
+  }
+}
+
+// What was written here gets a name of its own, and the cloud's version takes the document's, by one step.
+// All of it happens between two looks of the sync at what changed, and the items are told apart before the
+// next.
+ContentsResult SyncEngine::keepBoth(const FileLocation &location, PreparedFile &prepared) {
+  const std::string folder = location.path.substr(0, location.path.size() - location.name.size());
+  const auto row = store_.byItem(location.item.id);
+  if (!row) return ContentsResult::failed(ContentsOutcome::changedMeanwhile);
+  std::string copy;
+  ContentsResult result;
+  if (!conflicts_.nameAside(location, &copy)) {
+    const DocumentLook look = storage_->classify(location.folder.get(), location.name);
+    result = storage_->replaceContents(location.folder.get(), location.name, prepared, look.facts);
+    conflicts_.nameAsideOver(location, copy, result.isDone());
+  } else if (!conflicts_.setAside(location, &copy)) {
+    // No second names here: for a moment nothing has the document's.
+    result = storage_->publishNew(prepared, location.folder.get(), location.name);
+  } else {
+    result = ContentsResult::failed(ContentsOutcome::changedMeanwhile);
+  }
+  if (!result.isDone()) return result;
+  auto looked = std::make_shared<std::promise<void>>();
+  states_.lookAt({location.path, folder + copy}, [looked] { looked->set_value(); });
+  looked->get_future().wait();
+  ItemRecord item;
+  if (files_.itemAtPath(location.path, &item)) examiner_.bindTo(row->record, item.id);
+  if (files_.itemAtPath(folder + copy, &item)) examiner_.examineItem(item.id);
+  return result;
 }
 
 void SyncEngine::fetchNow(std::function<void(const NSError &)> done) {

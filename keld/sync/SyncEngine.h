@@ -57,8 +57,11 @@ class SyncEngine {
   AssetUploads &assetUploads() { return *assets_; }
   const std::string &device() const { return context_.device; }
 
-  // Runs `work` on the sync's thread, after everything that has changed here so far was examined.
-  void perform(std::function<void()> work);
+  // Runs `work` on the sync's thread, after everything that has changed here so far was examined. False, and
+  // never, once the engine stops.
+  bool perform(std::function<void()> work);
+  // The same, and returns when it was run; false when it wasn't. Not to be called on the sync's thread.
+  bool performAndWait(std::function<void()> work);
   // Fetches what the cloud has now; `done` comes when it is applied, or couldn't be.
   void fetchNow(std::function<void(const NSError &error)> done);
   // Calls `done` (on the pool) when nothing of `items` (empty: nothing at all) waits to be sent any more, or
@@ -84,6 +87,7 @@ class SyncEngine {
 
   void run();
   bool prepareCloud();
+  ContentsResult keepBoth(const FileLocation &location, PreparedFile &prepared);
   void bindAnew(const std::string &itemDatabase);
   void round();
   void fetch();
@@ -103,9 +107,9 @@ class SyncEngine {
   std::shared_ptr<AssetUploads> assets_;
   ConflictCopies conflicts_;
   std::shared_ptr<Downloads> downloads_;
+  LocalExaminer examiner_;
   Uploader uploader_;
   CloudApplier applier_;
-  LocalExaminer examiner_;
   const std::shared_ptr<CKCancellation> stopping_ = std::make_shared<CKCancellation>();
   std::unique_ptr<CKSubscription> subscription_;
 

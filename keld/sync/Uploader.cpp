@@ -37,8 +37,9 @@ OwnedDescriptor openFile(const FileLocation &location) {
 
 }  // namespace
 
-Uploader::Uploader(const SyncContext &context, AssetUploads &assets, ConflictCopies &conflicts)
-    : context_(context), assets_(assets), conflicts_(conflicts) {}
+Uploader::Uploader(const SyncContext &context, AssetUploads &assets, ConflictCopies &conflicts,
+                   LocalExaminer &examiner)
+    : context_(context), assets_(assets), conflicts_(conflicts), examiner_(examiner) {}
 
 Uploader::Totals Uploader::totals() const {
   const Lock lock(mutex_);
@@ -139,6 +140,12 @@ Uploader::Prepared Uploader::prepareSave(const ItemRecord &item, Plan *plan, con
     return laterWith(plan, NSError());
   }
   SyncRow &row = plan->row;
+  if (!row.record.empty() && examiner_.isClean(location->item, row, parent)) {
+    context_.store.uploaded(plan->entry);
+    const bool hasFile = row.kind == NSFileProviderItemKind::document;
+    context_.states.show({item.id, row.isDataless, true, LocalFileOf(location->item.facts), hasFile});
+    return Prepared::nothing;
+  }
   if (row.record.empty()) {
     // Written down before it is sent, so that a lost reply doesn't make a second record.
     row.record = NewRecordName();
@@ -178,6 +185,12 @@ Uploader::Prepared Uploader::prepareDocument(const FileLocation &location, Plan 
                                              const CKCallContext &call) {
   const DocumentLook look = context_.storage.classify(location.folder.get(), location.name);
   SyncRow &row = plan->row;
+  const bool isKnownFile = look.facts.inode == location.item.facts.inode;
+  if (!isKnownFile && look.kind != DocumentClass::missing) {
+    // Another file than the item's: the keeper has to find out which items they are.
+    context_.states.lookAt({location.path});
+    return laterWith(plan, NSError());
+  }
   switch (look.kind) {
     case DocumentClass::missing:
     case DocumentClass::notADocument:

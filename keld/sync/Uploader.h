@@ -10,6 +10,7 @@
 #include "keld/sync/AssetUploads.h"
 #include "keld/sync/ConflictCopies.h"
 #include "keld/sync/DocumentRecord.h"
+#include "keld/sync/LocalExaminer.h"
 #include "keld/sync/SyncContext.h"
 
 namespace droxa::keld {
@@ -25,7 +26,8 @@ class Uploader {
     NSError cloudProblem;                // the cloud couldn't be reached at all
   };
 
-  Uploader(const SyncContext &context, AssetUploads &assets, ConflictCopies &conflicts);
+  Uploader(const SyncContext &context, AssetUploads &assets, ConflictCopies &conflicts,
+           LocalExaminer &examiner);
 
   // Sends a batch of what is due.
   Round sendDue(const CKCallContext &call);
@@ -66,6 +68,7 @@ class Uploader {
   const SyncContext &context_;
   AssetUploads &assets_;
   ConflictCopies &conflicts_;
+  LocalExaminer &examiner_;
   std::uint64_t inlineBytes_ = 0;  // sent by this round on this thread
   NSError cloudProblem_;
   mutable Mutex mutex_;
