@@ -153,7 +153,16 @@ class Upload {
     name.update(chunk);
     digest_.update(chunk);
     pieces_.push_back({start, chunk.size(), name.hex()});
-    return writer_.add(pieces_.back().chunk, chunk);
+    return writer_.add(pieces_.back().chunk, chunk,
+                       [this](const std::string &digest) { return isKept(digest); });
+  }
+
+  // A manifest is committed after its chunks were made safe. Any error counts as no.
+  bool isKept(const std::string &chunk) {
+    bool found = false;
+    home_.run(Home::Access::read, context_,
+              [&](const Connection &connection) { found = NamesChunk(connection, chunk); });
+    return found;
   }
 
   static NSError unstorable(int code) {
