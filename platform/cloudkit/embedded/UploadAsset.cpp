@@ -95,6 +95,7 @@ class Upload {
     if (NSError error = storeChunks()) return {error, {}};
     if (NSError error = file_.verify(digest_)) return {error, {}};
     if (const int code = writer_.finish(); code != 0) return {unstorable(code), {}};
+    if (progress_) progress_(size_, size_);  // waiting for the disk is no standstill
     const CKAssetReference asset{size_, digest_.hex()};
     const NSError error = home_.run(Home::Access::write, context_, [&](const Connection &connection) {
       // Inside the transaction, so that none is collected before the manifest says that it is needed.
