@@ -70,9 +70,12 @@ class ChunkWriter {
   };
   int write(const std::string &digest, std::span<const std::uint8_t> bytes);
   int flush();
+  int syncFiles();
   int syncFolders();
+  int syncAll();
   const ChunkStore &store_;
   const std::string prefix_;
+  const int root_;  // the folder of all chunks
   std::uint64_t count_ = 0;
   std::vector<Pending> pending_;
   std::set<std::string> folders_;  // with names that may not be there for good yet

@@ -9,13 +9,11 @@
 namespace droxa::embedded {
 namespace {
 
-// So many files are written before the first of them is waited for: the disk gets them together.
-constexpr std::size_t kFilesAtOnce = 32;
-
-// Each wait for a folder costs a turn of the disk; beyond so many the whole file system is waited for once.
-// For files it is the other way round: measured, one wait for each of many that are being written costs no
-// more than a plain copy of the same bytes.
-constexpr std::size_t kFoldersOneByOne = 4;
+// So many files are written before they are waited for: the disk gets them together.
+constexpr std::size_t kFilesAtOnce = 64;
+// Each wait for a file or a folder costs a turn of the disk. Beyond so many the file system is waited for
+// once, which, measured with chunks of 1 MiB, takes a third of the time.
+constexpr std::size_t kOneByOne = 4;
 
 int writeWhole(int file, std::span<const std::uint8_t> bytes) {
   while (!bytes.empty()) {
@@ -38,9 +36,12 @@ int syncFolder(const std::string &path) {
 }  // namespace
 
 ChunkWriter::ChunkWriter(const ChunkStore &store)
-    : store_(store), prefix_(store.unfinished_ + "/" + UUID::generate().description() + "-") {}
+    : store_(store),
+      prefix_(store.unfinished_ + "/" + UUID::generate().description() + "-"),
+      root_(open(store.chunks_.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)) {}
 
 ChunkWriter::~ChunkWriter() {
+  if (root_ >= 0) close(root_);
   for (const Pending &pending : pending_) {
     close(pending.file);
     unlink(pending.temporary.c_str());
@@ -72,15 +73,27 @@ int ChunkWriter::write(const std::string &digest, std::span<const std::uint8_t> 
 }
 
 int ChunkWriter::flush() {
-  for (const Pending &pending : pending_) {
-    if (fdatasync(pending.file) != 0) return errno;
-  }
+  if (const int code = syncFiles(); code != 0) return code;
   for (const Pending &pending : pending_) {
     if (rename(pending.temporary.c_str(), store_.path(pending.digest).c_str()) != 0) return errno;
   }
   for (const Pending &pending : pending_) close(pending.file);
   pending_.clear();
   return 0;
+}
+
+int ChunkWriter::syncFiles() {
+  if (pending_.size() > kOneByOne) return syncAll();
+  for (const Pending &pending : pending_) {
+    if (fdatasync(pending.file) != 0) return errno;
+  }
+  return 0;
+}
+
+// The descriptor is older than what is written, so failures to write it are reported through it.
+int ChunkWriter::syncAll() {
+  if (root_ < 0) return EBADF;
+  return syncfs(root_) == 0 ? 0 : errno;
 }
 
 int ChunkWriter::finish() {
@@ -91,13 +104,7 @@ int ChunkWriter::finish() {
 }
 
 int ChunkWriter::syncFolders() {
-  if (folders_.size() > kFoldersOneByOne) {
-    const int folder = open(store_.chunks_.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    if (folder < 0) return errno;
-    const int code = syncfs(folder) == 0 ? 0 : errno;
-    close(folder);
-    return code;
-  }
+  if (folders_.size() > kOneByOne) return syncAll();
   for (const std::string &folder : folders_) {
     if (const int code = syncFolder(folder); code != 0) return code;
   }
