@@ -87,7 +87,7 @@ struct CKZoneChanges {
   std::vector<CKRecord> changedRecords;         // the latest state of each, the oldest change first
   std::vector<CKDeletedRecord> deletedRecords;  // the oldest first; never one of changedRecords
   CKServerChangeToken token;                    // what follows these changes
-  bool moreComing = false;                      // the limit was reached: ask again with the token
+  bool moreComing = false;                      // there are more: ask again with the token
 };
 
 struct CKZoneList {
@@ -166,8 +166,8 @@ class CKCloud {
   virtual CKModifyReply modifyRecords(const CKModifyRequest &request, const CKCallContext &context) = 0;
 
   // What changed since the token (nil: all records that there are, no deletions), at most `limit` records and
-  // deletions (1 to CKMostRecordsPerCall). The caller's own changes are among them.
-  // changeTokenExpired: the token is of another cloud, of an earlier zone of that name, or unreadable.
+  // deletions (1 to CKMostRecordsPerCall; fewer where records are large). The caller's own changes are among
+  // them. changeTokenExpired: the token is of another cloud, of an earlier zone of that name, or unreadable.
   // zoneNotFound. A record that changes while pages are fetched comes (again) on a later page.
   virtual CKZoneChanges fetchZoneChanges(const CKRecordZoneID &zone, const CKServerChangeToken &token,
                                          const CKDesiredKeys &desiredKeys, std::size_t limit,

@@ -4,44 +4,45 @@
 
 namespace droxa {
 
-// `left` are the records without a final outcome. Those whose error is transient stay in it for another try;
-// what they answered last is their outcome when there is none.
 NSError CKFetchRecordsOperation::perform() {
-  std::vector<CKRecordID> left = recordIDs;
-  std::vector<CKRecordResult> failedLast;
-  const NSError error = retrying(Timing::call, [&](const CKCallContext &context) -> Attempt {
-    Attempt attempt;
-    std::vector<CKRecordID> again;
-    failedLast.clear();
-    while (!left.empty()) {
-      const std::size_t count = std::min(left.size(), CKMostRecordsPerCall);
-      const std::vector<CKRecordID> some(left.begin(), left.begin() + static_cast<std::ptrdiff_t>(count));
-      CKFetchReply reply = cloud().fetchRecords(some, desiredKeys, context);
-      if (reply.error && !CKErrorIs(reply.error, CKErrorCode::partialFailure)) {
-        left.insert(left.end(), again.begin(), again.end());
-        return {reply.error, attempt.progressed};
-      }
-      left.erase(left.begin(), left.begin() + static_cast<std::ptrdiff_t>(count));
-      for (CKRecordResult &result : reply.results) {
-        if (CKErrorIsTransient(result.error)) {
-          attempt.error = result.error;
-          again.push_back(result.recordID);
-          failedLast.push_back(std::move(result));
-        } else {
-          attempt.progressed = true;
-          tell(std::move(result));
-        }
-      }
-    }
-    left = std::move(again);
-    return attempt;
-  });
-  const bool isWhole = left.size() == failedLast.size() && !CKErrorIs(error, CKErrorCode::operationCancelled);
-  if (!isWhole) return error;
-  for (CKRecordResult &result : failedLast) tell(std::move(result));
+  left_ = recordIDs;
+  const NSError error =
+      retrying(Timing::call, [this](const CKCallContext &context) { return attempt(context); });
+  const bool isWhole = left_.size() == failedLast_.size();
+  if (!isWhole || CKErrorIs(error, CKErrorCode::operationCancelled)) return error;
+  for (CKRecordResult &result : failedLast_) tell(std::move(result));
   const bool isPartial = std::any_of(results_.begin(), results_.end(),
                                      [](const CKRecordResult &result) { return bool{result.error}; });
   return isPartial ? CKErrorMake(CKErrorCode::partialFailure, "Some records weren't fetched") : NSError();
+}
+
+// Records whose error is transient stay for another try; what they answered last is their outcome when there
+// is none.
+CKOperation::Attempt CKFetchRecordsOperation::attempt(const CKCallContext &context) {
+  Attempt attempt;
+  std::vector<CKRecordID> again;
+  failedLast_.clear();
+  while (!left_.empty()) {
+    const auto count = static_cast<std::ptrdiff_t>(std::min(left_.size(), CKMostRecordsPerCall));
+    CKFetchReply reply = cloud().fetchRecords({left_.begin(), left_.begin() + count}, desiredKeys, context);
+    if (reply.error && !CKErrorIs(reply.error, CKErrorCode::partialFailure)) {
+      left_.insert(left_.end(), again.begin(), again.end());
+      return {reply.error, attempt.progressed};
+    }
+    left_.erase(left_.begin(), left_.begin() + count);
+    for (CKRecordResult &result : reply.results) {
+      if (CKErrorIsTransient(result.error)) {
+        attempt.error = result.error;
+        again.push_back(result.recordID);
+        failedLast_.push_back(std::move(result));
+      } else {
+        attempt.progressed = true;
+        tell(std::move(result));
+      }
+    }
+  }
+  left_ = std::move(again);
+  return attempt;
 }
 
 void CKFetchRecordsOperation::tell(CKRecordResult result) {

@@ -28,7 +28,10 @@ class CKFetchRecordsOperation final : public CKOperation {
  private:
   NSError perform() override;
   void complete(const NSError &error) override;
+  Attempt attempt(const CKCallContext &context);
   void tell(CKRecordResult result);
+  std::vector<CKRecordID> left_;            // without a final outcome
+  std::vector<CKRecordResult> failedLast_;  // of them, what those answered that were asked for last
   std::vector<CKRecordResult> results_;
 };
 

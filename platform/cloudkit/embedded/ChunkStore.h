@@ -56,7 +56,10 @@ class ChunkWriter {
   ChunkWriter(const ChunkWriter &) = delete;
   ChunkWriter &operator=(const ChunkWriter &) = delete;
 
-  int add(const std::string &digest, std::span<const std::uint8_t> bytes);  // an errno value
+  // An errno value. `isKept` tells, of a chunk that is there already, whether something that is on the disk
+  // for good names it: only then is its name there for good, too.
+  int add(const std::string &digest, std::span<const std::uint8_t> bytes,
+          const std::function<bool(const std::string &digest)> &isKept);
   int finish();
 
  private:
@@ -67,11 +70,15 @@ class ChunkWriter {
   };
   int write(const std::string &digest, std::span<const std::uint8_t> bytes);
   int flush();
+  int syncFiles();
+  int syncFolders();
+  int syncAll();
   const ChunkStore &store_;
   const std::string prefix_;
+  const int root_;  // the folder of all chunks
   std::uint64_t count_ = 0;
   std::vector<Pending> pending_;
-  std::set<std::string> folders_;  // that names were put into, or found in
+  std::set<std::string> folders_;  // with names that may not be there for good yet
 };
 
 }  // namespace droxa::embedded

@@ -1,4 +1,7 @@
+#include <algorithm>
+
 #include "platform/cloudkit/embedded/Calls.h"
+#include "platform/cloudkit/embedded/Manifest.h"
 #include "platform/cloudkit/embedded/StoredRecord.h"
 
 namespace droxa::embedded {
@@ -69,17 +72,12 @@ class Collection {
     if (chunks.empty()) return {};
     return home_.run(Home::Access::read, context_, [&](const Connection &connection) {
       std::erase_if(chunks,
-                    [&](const ChunkStore::Found &chunk) { return isNeeded(connection, chunk.digest); });
+                    [&](const ChunkStore::Found &chunk) { return NamesChunk(connection, chunk.digest); });
     });
   }
 
-  static bool isNeeded(const Connection &connection, const std::string &digest) {
-    SqlUse row = connection.use("SELECT 1 FROM pieces WHERE chunk = ? LIMIT 1");
-    return row.bind(digest).step();
-  }
-
   void removeChunk(const Connection &connection, const ChunkStore::Found &chunk) {
-    if (isNeeded(connection, chunk.digest)) return;
+    if (NamesChunk(connection, chunk.digest)) return;
     if (!home_.chunks().removeUnlessNeeded(chunk.digest, before_)) return;
     ++garbage_.chunks;
     garbage_.bytes += chunk.size;

@@ -5,6 +5,9 @@
 namespace droxa::embedded {
 namespace {
 
+// A page is not to fill the memory, whatever its records hold.
+constexpr std::size_t kMostBytesOfAPage = 8 * 1024 * 1024;
+
 std::int64_t lastChange(const Connection &connection, std::int64_t zone) {
   SqlUse row = connection.use("SELECT seq FROM zones WHERE id = ?");
   return row.bind(zone).step() ? row.integer(0) : 0;
@@ -33,13 +36,15 @@ void fetchPage(const Connection &connection, const CKRecordZoneID &zone, const C
   row.bind(number).bind(start).bind(token ? 1 : 0).bind(static_cast<std::int64_t>(limit) + 1);
   ChangeToken reached{connection.cloud, number, last};
   std::int64_t told = start;
+  std::size_t bytes = 0;
   while (row.step()) {
-    if (page.changedRecords.size() + page.deletedRecords.size() == limit) {
+    if (page.changedRecords.size() + page.deletedRecords.size() == limit || bytes > kMostBytesOfAPage) {
       page.moreComing = true;
       reached.seq = told;
       break;
     }
     told = row.integer(6);
+    bytes += row.bytes(5).size();
     if (row.integer(7) != 0) {
       page.deletedRecords.push_back({{row.text(0), zone}, row.text(1), row.text(4)});
     } else {

@@ -47,9 +47,10 @@ void makeAccount(SqlDatabase &database, const std::string &name) {
 
 void checkFormat(SqlDatabase &database, const std::string &path) {
   SqlUse version = database.use("PRAGMA user_version");
-  if (!version.step() || version.integer(0) != kFormat) {
-    Fail(CKErrorCode::internalError, "Not a cloud of this version: " + path);
-  }
+  const std::int64_t format = version.step() ? version.integer(0) : 0;
+  if (format == kFormat) return;
+  if (format == 0) Fail(CKErrorCode::serviceUnavailable, "The cloud is being made: " + path);
+  Fail(CKErrorCode::internalError, "Not a cloud of this version: " + path);
 }
 
 UUID cloudUUID(SqlDatabase &database) {
@@ -107,7 +108,8 @@ std::unique_ptr<Connection> Home::connect(bool mayCreate) const {
 
 NSError Home::create() {
   std::error_code error;
-  std::filesystem::create_directories(folder_, error);
+  const bool isNew = std::filesystem::create_directories(folder_, error);
+  if (isNew && !error) std::filesystem::permissions(folder_, std::filesystem::perms::owner_all, error);
   if (error) return unusable(folder_, error.value()).error;
   if (const int code = chunks_.create(); code != 0) return unusable(folder_, code).error;
   const int watched = open(watchedFile().c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600);

@@ -23,6 +23,11 @@ std::vector<Piece> PiecesFrom(const Connection &connection, const CKAssetReferen
   return pieces;
 }
 
+bool NamesChunk(const Connection &connection, const std::string &chunk) {
+  SqlUse row = connection.use("SELECT 1 FROM pieces WHERE chunk = ? LIMIT 1");
+  return row.bind(chunk).step();
+}
+
 void WriteManifest(const Connection &connection, const CKAssetReference &asset,
                    const std::vector<Piece> &pieces) {
   // Written anew in any case: chunks that were damaged may have been cut differently before.

@@ -20,6 +20,8 @@ bool KnowsAsset(const Connection &connection, const CKAssetReference &asset);
 // The pieces that end after `offset`, in order, at most `limit`.
 std::vector<Piece> PiecesFrom(const Connection &connection, const CKAssetReference &asset,
                               std::uint64_t offset, std::size_t limit);
+// Whether any asset has such a piece.
+bool NamesChunk(const Connection &connection, const std::string &chunk);
 // Keeps an asset's manifest, in the place of an earlier one, and that it was needed now.
 void WriteManifest(const Connection &connection, const CKAssetReference &asset,
                    const std::vector<Piece> &pieces);

@@ -6,7 +6,7 @@
 
 namespace droxa::embedded {
 
-// The columns that ReadRecord reads, in its order, from the tables' row of a record.
+// The columns of a record's row that ReadRecord reads, in its order.
 #define DROXA_RECORD_COLUMNS "name, type, tag, time, device, fields"
 
 // The record of the row, which must begin with DROXA_RECORD_COLUMNS. Throws CallFailed: internalError when

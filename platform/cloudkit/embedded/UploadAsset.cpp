@@ -95,6 +95,7 @@ class Upload {
     if (NSError error = storeChunks()) return {error, {}};
     if (NSError error = file_.verify(digest_)) return {error, {}};
     if (const int code = writer_.finish(); code != 0) return {unstorable(code), {}};
+    if (progress_) progress_(size_, size_);  // waiting for the disk is no standstill
     const CKAssetReference asset{size_, digest_.hex()};
     const NSError error = home_.run(Home::Access::write, context_, [&](const Connection &connection) {
       // Inside the transaction, so that none is collected before the manifest says that it is needed.
@@ -153,7 +154,16 @@ class Upload {
     name.update(chunk);
     digest_.update(chunk);
     pieces_.push_back({start, chunk.size(), name.hex()});
-    return writer_.add(pieces_.back().chunk, chunk);
+    return writer_.add(pieces_.back().chunk, chunk,
+                       [this](const std::string &digest) { return isKept(digest); });
+  }
+
+  // A manifest is committed after its chunks were made safe. Any error counts as no.
+  bool isKept(const std::string &chunk) {
+    bool found = false;
+    home_.run(Home::Access::read, context_,
+              [&](const Connection &connection) { found = NamesChunk(connection, chunk); });
+    return found;
   }
 
   static NSError unstorable(int code) {

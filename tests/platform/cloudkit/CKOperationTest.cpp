@@ -154,7 +154,7 @@ TEST_F(CKOperationTest, oneIsRunOnceHoweverOftenItIsAdded) {
   operation->waitUntilFinished();
   database.waitUntilAllOperationsAreFinished();
   EXPECT_EQ(completions, 1);
-  EXPECT_TRUE(log.contains("added before"));
+  EXPECT_TRUE(log.contains("[CRIT] a database was given an operation that was added before"));
 }
 
 TEST_F(CKOperationTest, theSharedDatabaseHasNoZonesAndTakesNone) {

@@ -63,7 +63,7 @@ std::vector<std::string> linesUntilKilled(std::size_t count, const std::function
 }
 
 TEST(EmbeddedCloud, whatAKilledProcessSavedIsThere) {
-  const EmbeddedWorld world;
+  EmbeddedWorld world;
   EXPECT_OK(world.open("one")->saveZone(kZone, patiently()));
   for (std::size_t round = 1; round <= 4; ++round) {
     const std::string prefix = std::to_string(round) + "-";
@@ -92,7 +92,7 @@ TEST(EmbeddedCloud, whatAKilledProcessSavedIsThere) {
 }
 
 TEST(EmbeddedCloud, whatAKilledUploadLeftIsCollected) {
-  const EmbeddedWorld world;
+  EmbeddedWorld world;
   const auto cloud = world.openEmbedded("one");
   linesUntilKilled(1, [&](int pipe) {
     const auto device = world.open("child");
@@ -110,7 +110,7 @@ TEST(EmbeddedCloud, whatAKilledUploadLeftIsCollected) {
 }
 
 TEST(EmbeddedCloud, aCallThatWaitsForALockIsCancelledSoon) {
-  const EmbeddedWorld world;
+  EmbeddedWorld world;
   const auto cloud = world.openEmbedded("one");
   const HeldLock lock(world.folder());
   CKCallContext context;
@@ -126,7 +126,7 @@ TEST(EmbeddedCloud, aCallThatWaitsForALockIsCancelledSoon) {
 }
 
 TEST(EmbeddedCloud, aCallThatWaitsForALockEndsAtItsDeadline) {
-  const EmbeddedWorld world;
+  EmbeddedWorld world;
   const auto cloud = world.openEmbedded("one");
   const HeldLock lock(world.folder());
   const auto start = std::chrono::steady_clock::now();
@@ -136,7 +136,7 @@ TEST(EmbeddedCloud, aCallThatWaitsForALockEndsAtItsDeadline) {
 }
 
 TEST(EmbeddedCloud, aFolderThatGoesAwayIsUnavailableAndOneThatComesInItsPlaceIsAnotherCloud) {
-  const EmbeddedWorld world;
+  EmbeddedWorld world;
   const auto cloud = world.openEmbedded("one");
   EXPECT_OK(cloud->saveZone(kZone, patiently()));
   save(*cloud, item("a"));
@@ -160,7 +160,7 @@ TEST(EmbeddedCloud, aFolderThatGoesAwayIsUnavailableAndOneThatComesInItsPlaceIsA
 }
 
 TEST(EmbeddedCloud, accountsOfOneFolderDontSeeEachOther) {
-  const EmbeddedWorld world;
+  EmbeddedWorld world;
   const auto one = world.open("one");
   const auto stranger = EmbeddedCloud::open(world.folder(), "somebody else", "one", nullptr);
   ASSERT_TRUE(stranger);
@@ -184,7 +184,7 @@ TEST(EmbeddedCloud, whatIsNoCloudIsNotOpened) {
 }
 
 TEST(EmbeddedCloud, usageFollowsRecordsAndZones) {
-  const EmbeddedWorld world;
+  EmbeddedWorld world;
   const auto cloud = world.openEmbedded("one");
   EXPECT_OK(cloud->saveZone(kZone, patiently()));
   CKRecord record = item("a");
@@ -201,7 +201,7 @@ TEST(EmbeddedCloud, usageFollowsRecordsAndZones) {
 }
 
 TEST(EmbeddedCloud, manyProcessesMayMakeOneCloudAtOnce) {
-  const EmbeddedWorld world;
+  EmbeddedWorld world;
   std::vector<pid_t> children;
   for (int i = 0; i < 6; ++i) {
     const pid_t child = fork();

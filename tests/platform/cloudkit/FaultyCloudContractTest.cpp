@@ -16,7 +16,7 @@ class FaultlessWorld {
   void setQuota(std::optional<std::uint64_t> bytes) const { world_.setQuota(bytes); }
 
  private:
-  const EmbeddedWorld world_;
+  EmbeddedWorld world_;
 };
 
 DROXA_CLOUD_CONTRACT(FaultyCloud, FaultlessWorld)

@@ -33,7 +33,7 @@ class OperationTest : public testing::Test {
     return fault;
   }
 
-  const EmbeddedWorld world;
+  EmbeddedWorld world;
   const std::shared_ptr<FaultyCloud> cloud = std::make_shared<FaultyCloud>(world.open("one"));
   CKDatabase database{cloud};
 };

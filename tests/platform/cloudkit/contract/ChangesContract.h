@@ -104,6 +104,21 @@ TYPED_TEST_P(CloudChanges, pagesMeetWithoutGapOrOverlap) {
   EXPECT_FALSE(page.moreComing);
 }
 
+TYPED_TEST_P(CloudChanges, largeRecordsAllComeHoweverPagesAreCut) {
+  constexpr std::size_t kCount = 20;
+  for (std::size_t i = 0; i < kCount; ++i) {
+    save(*this->cloud, item(std::to_string(i), std::string(900 * 1024, 'x')));
+  }
+  EXPECT_EQ(this->follow(*this->other, kCount).size(), kCount);
+  CKZoneChanges page = changes(*this->other);
+  std::size_t told = page.changedRecords.size();
+  while (page.moreComing) {
+    page = changes(*this->other, page.token);
+    told += page.changedRecords.size();
+  }
+  EXPECT_EQ(told, kCount);
+}
+
 TYPED_TEST_P(CloudChanges, changesHoldDesiredKeysOnly) {
   save(*this->cloud, item("a"));
   const CKZoneChanges page =
@@ -241,8 +256,9 @@ TYPED_TEST_P(CloudChanges, aSubscriptionMayBeEndedInItsOwnHandler) {
 REGISTER_TYPED_TEST_SUITE_P(CloudChanges, theFeedTellsTheLatestStatesTheOldestChangeFirst,
                             deletionsAreToldWithTheirTypesToThoseWhoHaveAToken,
                             aRecordThatCameBackIsChangedAndNotDeleted, pagesMeetWithoutGapOrOverlap,
-                            changesHoldDesiredKeysOnly, tokensOfAnotherCloudZoneOrOriginHaveExpired,
-                            limitsThatCantBeAreRefused, twoDevicesAtOnceLoseNothingAndAFollowerSeesAll,
+                            changesHoldDesiredKeysOnly, largeRecordsAllComeHoweverPagesAreCut,
+                            tokensOfAnotherCloudZoneOrOriginHaveExpired, limitsThatCantBeAreRefused,
+                            twoDevicesAtOnceLoseNothingAndAFollowerSeesAll,
                             twoProcessesAtOnceLoseNothingAndAFollowerSeesAll,
                             aSubscriberIsSoonToldOfTheChangesOfOthers,
                             aSubscriberIsToldOfZonesThatOthersMakeAndDelete, anEndedSubscriptionIsSilent,

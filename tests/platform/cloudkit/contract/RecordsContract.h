@@ -193,8 +193,8 @@ REGISTER_TYPED_TEST_SUITE_P(CloudRecords, everyKindOfValueComesBackAsItWasSaved,
                             aStaleTagIsAConflictThatCarriesTheServersRecord,
                             otherPoliciesOverwriteWhateverTheTag, savingADeletedRecordByItsTagIsToldSo,
                             aDeletionWithAStaleTagIsAConflictAndOneOfNothingSucceeds,
-                            anAtomicCallWithAConflictChangesNothing, anAtomicCallTellsEveryConflict, aCallThatIsNotAtomicChangesWhatItCan,
-                            callsThatCantBeAreRefusedAsAWhole, namesTypesKeysAndSizesAreChecked,
-                            aRecordKeepsItsType);
+                            anAtomicCallWithAConflictChangesNothing, anAtomicCallTellsEveryConflict,
+                            aCallThatIsNotAtomicChangesWhatItCan, callsThatCantBeAreRefusedAsAWhole,
+                            namesTypesKeysAndSizesAreChecked, aRecordKeepsItsType);
 
 }  // namespace droxa::contract
