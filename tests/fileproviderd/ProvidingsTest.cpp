@@ -14,6 +14,9 @@ const NSError kOffline(NSFileProviderErrorDomain, NSFileProviderErrorServerUnrea
 
 class ProvidingsTest : public ::testing::Test {
  protected:
+  ~ProvidingsTest() override {
+    for (const auto &providing : extension->providings) providing->drop();
+  }
   std::shared_ptr<FPDProviding> start(std::uint64_t options = 0) { return providings->start(url, options); }
   static bool isCancelled(const NSError &error) { return error.is(NSCocoaErrorDomain, NSUserCancelledError); }
   ScriptedProviding &extensions(std::size_t index) { return *extension->providings.at(index); }
@@ -199,8 +202,11 @@ TEST_F(ConnectedProvidingsTest, aClientIsToldOfTheEnd) {
 
 TEST_F(ConnectedProvidingsTest, aClientThatDiesEndsWhatItWanted) {
   const auto providing = startOverConnection();
-  providing->waitWithReply([](const NSError &) { ADD_FAILURE() << "the reply ran"; });
+  const Once<NSError> failure("error handler");
+  NSXPCProxyWithErrorHandler<FPDProviding>(providing, failure.completion())
+      ->waitWithReply([](const NSError &) { ADD_FAILURE() << "the reply ran"; });
   pair.client->invalidate();
+  EXPECT_EQ(failure.value<0>().domain(), NSCocoaErrorDomain);
   EXPECT_TRUE(eventually([this] { return extensions(0).cancels == 1; }));
   extensions(0).end({});
 }

@@ -93,11 +93,21 @@ class ScriptedProviding final : public FPDProviding,
   }
   void end(const NSError &error) {
     NSFileProviderErrorCompletion reply;
+    NSXPCErrorHandler dropped;
     {
       const Lock held(lock_);
       reply.swap(reply_);
+      dropped.swap(handler_);
     }
     reply(error);
+  }
+  // Forgets who waits, who may hold what holds this.
+  void drop() {
+    NSFileProviderErrorCompletion reply;
+    NSXPCErrorHandler handler;
+    const Lock held(lock_);
+    reply.swap(reply_);
+    handler.swap(handler_);
   }
   void cutOff(const NSError &error) {
     NSXPCErrorHandler handler;

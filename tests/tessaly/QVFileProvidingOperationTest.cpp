@@ -100,7 +100,8 @@ TEST_F(StartedProvidingOperation, aDaemonThatIsNotThereIsTheConnectionsError) {
 
 TEST_F(StartedProvidingOperation, aDaemonThatGoesWhileItStartsIsTheConnectionsError) {
   daemon_.replies().hold("startDownloadAtURL");
-  addAndWaitUntil("startDownloadAtURL");
+  add();
+  ASSERT_TRUE(eventually([this] { return daemon_.replies().heldCount("startDownloadAtURL") == 1; }));
   fake_.connection->loseDaemon(kBroken);
   EXPECT_EQ(done_.value<0>(), kBroken);
   daemon_.replies().release("startDownloadAtURL");
@@ -128,7 +129,8 @@ TEST_F(StartedProvidingOperation, cancelledAndNeverAddedItCompletesAllTheSame) {
 
 TEST_F(StartedProvidingOperation, cancelledWhileItStartsItGivesTheTransferUp) {
   daemon_.replies().hold("startDownloadAtURL");
-  addAndWaitUntil("startDownloadAtURL");
+  add();
+  ASSERT_TRUE(eventually([this] { return daemon_.replies().heldCount("startDownloadAtURL") == 1; }));
   operation_->cancel();
   expectCancelled();
   EXPECT_TRUE(daemon_.isDownloading("a"));
