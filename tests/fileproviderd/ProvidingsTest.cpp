@@ -1,6 +1,7 @@
 #include <gtest/gtest.h>
 
 #include "fileproviderd/HostServices.h"
+#include "fileproviderd/OpenListings.h"
 #include "fileproviderd/Providings.h"
 #include "platform/fileprovider/xpc/FileProviderInterfaces.h"
 #include "tests/fileproviderd/ScriptedExtension.h"
@@ -148,8 +149,9 @@ TEST_F(ProvidingsTest, anExtensionThatCantBeStartedIsTold) {
 
 TEST_F(ProvidingsTest, clientsAreGivenTheURLOfWhatTheyNamed) {
   extension->add("d1", "/r/a.txt", {});
-  const auto control = std::make_shared<ControlService>(calls, std::make_shared<FollowedContainers>(calls),
-                                                        "/r", [] { return FPDStatus(); });
+  const auto control =
+      std::make_shared<ControlService>(calls, std::make_shared<FollowedContainers>(calls),
+                                       std::make_shared<OpenListings>(), "/r", [] { return FPDStatus(); });
   const Once<std::shared_ptr<FPDProviding>, NSURL, NSError> found("found"), missing("missing");
   control->startProvidingItemWithIdentifier("d1", 0x20000, found.completion());
   EXPECT_TRUE(found.value<0>());
@@ -177,8 +179,8 @@ class ConnectedProvidingsTest : public ProvidingsTest {
     extension->add("d1", "/r/a.txt", {});
     pair.serve<FPDControlProtocol>(
         FPDControlInterface(),
-        std::make_shared<ControlService>(calls, std::make_shared<FollowedContainers>(calls), "/r",
-                                         [] { return FPDStatus(); }));
+        std::make_shared<ControlService>(calls, std::make_shared<FollowedContainers>(calls),
+                                         std::make_shared<OpenListings>(), "/r", [] { return FPDStatus(); }));
   }
   std::shared_ptr<FPDProviding> startOverConnection() {
     const Once<std::shared_ptr<FPDProviding>, NSURL, NSError> answer("providing");
