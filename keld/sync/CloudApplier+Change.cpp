@@ -162,7 +162,7 @@ bool CloudApplier::isBasedOn(const DocumentRecord &document, const SyncRow &row,
     return look.marker->digest == document.content.digest &&
            (look.kind == DocumentClass::edited || look.kind == DocumentClass::overwritten);
   return document.device == context_.cloud.deviceName() &&
-         context_.store.sentDigest(document.record) == document.content.digest;
+         context_.store.wasSent(document.record, document.content.digest);
 }
 
 // Another target is another link: the item of that is found by its name.

@@ -36,7 +36,11 @@ CREATE INDEX IF NOT EXISTS rows_name ON rows(parent, name);
 CREATE INDEX IF NOT EXISTS rows_newer ON rows(newerTag) WHERE newerTag <> '';
 CREATE TABLE IF NOT EXISTS orphans(record TEXT PRIMARY KEY, parent TEXT NOT NULL) WITHOUT ROWID;
 CREATE INDEX IF NOT EXISTS orphans_parent ON orphans(parent);
-CREATE TABLE IF NOT EXISTS sent(record TEXT PRIMARY KEY, digest TEXT NOT NULL) WITHOUT ROWID;
+CREATE TABLE IF NOT EXISTS sent(
+  record TEXT NOT NULL,
+  digest TEXT NOT NULL,
+  PRIMARY KEY(record, digest)
+) WITHOUT ROWID;
 CREATE TABLE IF NOT EXISTS uploads(
   sequence INTEGER PRIMARY KEY AUTOINCREMENT,
   item INTEGER NOT NULL UNIQUE,
@@ -261,14 +265,13 @@ void SyncStore::forgetSent(const std::string &record) {
   statement("DELETE FROM sent WHERE record = ?").bindText(1, record).run();
 }
 
-std::optional<std::string> SyncStore::sentDigest(const std::string &record) {
+bool SyncStore::wasSent(const std::string &record, const std::string &digest) {
   const RecursiveLock lock(mutex_);
-  SqlStatement &asked = statement("SELECT digest FROM sent WHERE record = ?");
-  asked.bindText(1, record);
-  std::optional<std::string> digest;
-  if (asked.step()) digest = std::string(asked.bytes(0));
+  SqlStatement &asked = statement("SELECT 1 FROM sent WHERE record = ? AND digest = ?");
+  asked.bindText(1, record).bindText(2, digest);
+  const bool found = asked.step();
   asked.reset();
-  return digest;
+  return found;
 }
 
 // --- Orphans.

@@ -107,7 +107,7 @@ class SyncStore {
   // Contents whose save was begun, and may have been carried out without this device being told.
   void noteSent(const std::string &record, const std::string &digest);
   void forgetSent(const std::string &record);
-  std::optional<std::string> sentDigest(const std::string &record);
+  bool wasSent(const std::string &record, const std::string &digest);
 
   // The queue of uploads, in the order of the changes.
   void enqueue(ItemNumber item, bool isDeletion, bool isHeld, std::int64_t notBeforeMilliseconds = 0);

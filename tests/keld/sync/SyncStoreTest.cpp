@@ -235,12 +235,15 @@ TEST_F(SyncStoreTest, pinsFollowTheirRecordsToOtherItems) {
 }
 
 TEST_F(SyncStoreTest, savesOfUnknownOutcomeAreRemembered) {
-  EXPECT_FALSE(store.sentDigest("r"));
+  EXPECT_FALSE(store.wasSent("r", "one"));
+  store.noteSent("r", "one");
   store.noteSent("r", "one");
   store.noteSent("r", "two");
-  EXPECT_EQ(store.sentDigest("r"), "two");
+  EXPECT_TRUE(store.wasSent("r", "one"));
+  EXPECT_TRUE(store.wasSent("r", "two"));
+  EXPECT_FALSE(store.wasSent("other", "two"));
   store.forgetSent("r");
-  EXPECT_FALSE(store.sentDigest("r"));
+  EXPECT_FALSE(store.wasSent("r", "one"));
 }
 
 TEST_F(SyncStoreTest, aTransactionThatThrowsLeavesNothing) {
