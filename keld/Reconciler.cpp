@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cerrno>
 
+#include "keld/contents/DocumentMarker.h"
 #include "tessaly/NSURL+Tessaly.h"
 #include "tessaly/QVContainer.h"
 #include "tessaly/QVLog.h"
@@ -185,10 +186,20 @@ void Reconciler::insertNew(const Observation &observation, std::uint32_t flags, 
   record.name = observation.name;
   record.flags = flags;
   record.facts = *observation.facts;
+  if (isDataless(record.parent, record.name, record.facts)) record.flags |= kDatalessFlag;
   edits_.insert(record);
   changes_.push_back({record.id, record.facts.kind, 0, record.parent, false});
   touched_.push_back(record.parent);
   if (id != 0 && record.isFolder()) foldersToScan_.push_back(id);
+}
+
+// A placeholder is never shown as a document whose contents are here, not even before the sync has seen it.
+bool Reconciler::isDataless(ItemNumber folder, const std::string &name, const FileFacts &facts) {
+  if (facts.kind != NSFileProviderItemKind::document || facts.size == 0) return false;
+  int error = 0;
+  const auto descriptor = opener_.open(folder, &error);
+  const auto marker = descriptor ? ReadMarker(descriptor->get(), name) : std::nullopt;
+  return marker && marker->state == MarkerState::dataless && marker->size == facts.size;
 }
 
 Reconciler::Origin Reconciler::originOf(const ItemRecord &record) const {
@@ -236,6 +247,10 @@ void Reconciler::refresh(ItemRecord record, const FileFacts &facts) {
       !record.isFolder() && (record.facts.size != facts.size || record.facts.modified != facts.modified ||
                              record.facts.inode != facts.inode);
   if (isWritten) record.flags &= ~kUploadedFlag;
+  if (record.facts.inode != facts.inode && !record.isFolder()) {
+    record.flags &= ~kDatalessFlag;
+    if (isDataless(record.parent, record.name, facts)) record.flags |= kDatalessFlag;
+  }
   record.facts = facts;
   if (looksTheSame || isUnlistedStructure(record)) return edits_.updateSilently(record);
   edits_.update(record);

@@ -88,6 +88,7 @@ class Reconciler {
   bool leavesItsName(const ItemRecord &record, const Observation &observation);
   bool takeBackFromBackup(const Observation &observation, std::uint32_t flags);
   void insertNew(const Observation &observation, std::uint32_t flags, ItemNumber id);
+  bool isDataless(ItemNumber folder, const std::string &name, const FileFacts &facts);
   void move(ItemRecord record, const Observation &observation, std::uint32_t flags);
   void refresh(ItemRecord record, const FileFacts &facts);
   void reflagChildren(const ItemRecord &folder);

@@ -22,8 +22,17 @@ AssetUploads::Finished SendContents(CKCloud &cloud, int descriptor, const LocalF
   return {NSError(), reply.asset.reference().sha256};
 }
 
-AssetUploads::AssetUploads(std::shared_ptr<CKCloud> cloud, std::function<void(ItemNumber)> ended)
-    : cloud_(std::move(cloud)), ended_(std::move(ended)) {}
+AssetUploads::AssetUploads(std::shared_ptr<CKCloud> cloud, std::chrono::milliseconds stallTimeout,
+                           std::function<void(ItemNumber)> ended)
+    : cloud_(std::move(cloud)), stallTimeout_(stallTimeout), ended_(std::move(ended)) {}
+
+void AssetUploads::forget(ItemNumber item) {
+  const Lock lock(mutex_);
+  const auto known = uploads_.find(item);
+  if (known == uploads_.end()) return;
+  known->second.cancellation->cancel();
+  uploads_.erase(known);
+}
 
 std::optional<AssetUploads::Finished> AssetUploads::take(ItemNumber item, const LocalFile &file,
                                                          int descriptor) {
@@ -61,7 +70,11 @@ void AssetUploads::run(ItemNumber item, std::uint64_t number, const LocalFile &f
   CKCallContext context;
   context.cancellation = cancellation;
   context.qualityOfService = CKQualityOfService::utility;
+  const auto deadline = std::make_shared<CKMovingDeadline>();
+  deadline->moveTo(CKCallContext::Clock::now() + stallTimeout_);
+  context.idleDeadline = deadline;
   const auto progress = [&](std::uint64_t done, std::uint64_t) {
+    deadline->moveTo(CKCallContext::Clock::now() + stallTimeout_);
     const Lock lock(mutex_);
     const auto known = uploads_.find(item);
     if (known != uploads_.end() && known->second.number == number) known->second.done = done;

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <chrono>
 #include <condition_variable>
 #include <cstdint>
 #include <functional>
@@ -29,12 +30,15 @@ class AssetUploads : public std::enable_shared_from_this<AssetUploads> {
     std::uint64_t done = 0, total = 0;
   };
 
-  // `ended` is called on the pool after each upload.
-  AssetUploads(std::shared_ptr<CKCloud> cloud, std::function<void(ItemNumber item)> ended);
+  // `ended` is called on the pool after each upload. One that doesn't move for `stallTimeout` has failed.
+  AssetUploads(std::shared_ptr<CKCloud> cloud, std::chrono::milliseconds stallTimeout,
+               std::function<void(ItemNumber item)> ended);
 
   // The outcome of an upload of exactly that file, which is forgotten by that; otherwise starts one, or
   // leaves the one under way. One that is of an older state of the file is stopped.
   std::optional<Finished> take(ItemNumber item, const LocalFile &file, int descriptor);
+  // The item is gone: its upload is stopped, and what was sent forgotten.
+  void forget(ItemNumber item);
   // No more upload is started; returns when those under way have ended, which is soon.
   void stop();
   std::vector<Progress> underWay() const;
@@ -52,6 +56,7 @@ class AssetUploads : public std::enable_shared_from_this<AssetUploads> {
            const std::shared_ptr<CKCancellation> &cancellation);
 
   const std::shared_ptr<CKCloud> cloud_;
+  const std::chrono::milliseconds stallTimeout_;
   const std::function<void(ItemNumber)> ended_;
   mutable Mutex mutex_;
   std::map<ItemNumber, Upload> uploads_ GUARDED_BY(mutex_);

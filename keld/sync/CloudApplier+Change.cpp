@@ -17,9 +17,8 @@ void CloudApplier::change(const DocumentRecord &document, const Place &place, Sy
                           const ItemRecord &item) {
   auto location = context_.files.locate(item.id, nullptr);
   if (!location) {
-    // Its folder can't be opened now; the next fetch of everything tries again.
-    row.tag.clear();
-    context_.store.put(row);
+    // Its folder can't be opened now; the next fetch tries again.
+    context_.store.fetchAgain(document.record);
     return;
   }
   const bool isMoved = document.parent != row.parent || document.name != row.name;
@@ -37,6 +36,7 @@ void CloudApplier::change(const DocumentRecord &document, const Place &place, Sy
         document.kind == NSFileProviderItemKind::folder && document.content.mode != row.content.mode;
     if (changesMode)
       ::fchmodat(location->folder.get(), location->name.c_str(), document.content.mode & 0777U, 0);
+    if (!document.target.empty()) changeLink(document, &row, *location);
     row.tag = document.tag;
     row.content = document.content;
     context_.store.put(row);
@@ -91,6 +91,26 @@ void CloudApplier::changeContents(const DocumentRecord &document, SyncRow row, c
     touch(location.path);
     return;
   }
+  if (isIntact && look.marker && look.marker->digest == document.content.digest) {
+    // It is that version already: what is known of it here is older than the file.
+    row.tag = document.tag;
+    row.content = document.content;
+    row.local = LocalFileOf(look.facts);
+    row.isDataless = false;
+    row.newerTag.clear();
+    context_.store.put(row);
+    touch(location.path);
+    return;
+  }
+  if (!isIntact && isBasedOn(document, row, look)) {
+    row.tag = document.tag;
+    row.content = document.content;
+    row.isDataless = false;
+    row.newerTag.clear();
+    context_.store.put(row);
+    context_.store.enqueue(row.item, false, false);
+    return;
+  }
   if (isIntact) {
     // The newer version is fetched first, and then put in its place at once.
     row.newerTag = document.tag;
@@ -127,13 +147,37 @@ void CloudApplier::changeContents(const DocumentRecord &document, SyncRow row, c
   context_.store.enqueue(row.item, false, false);  // which keeps what was written
 }
 
+// Whether what was written here was written over that very version: the file's marker says so, or this device
+// sent that version itself and lost the reply.
+bool CloudApplier::isBasedOn(const DocumentRecord &document, const SyncRow &row, const DocumentLook &look) {
+  if (look.marker && look.marker->recordName == row.record)
+    return look.marker->digest == document.content.digest &&
+           (look.kind == DocumentClass::edited || look.kind == DocumentClass::overwritten);
+  return document.device == context_.cloud.deviceName() &&
+         context_.store.wasSent(document.record, document.content.digest);
+}
+
+// Another target is another link: the item of that is found by its name.
+void CloudApplier::changeLink(const DocumentRecord &document, SyncRow *row, const FileLocation &location) {
+  char target[4096];
+  const ssize_t length = ::readlinkat(location.folder.get(), location.name.c_str(), target, sizeof target);
+  if (length <= 0 || document.target == std::string_view(target, static_cast<std::size_t>(length))) return;
+  if (::unlinkat(location.folder.get(), location.name.c_str(), 0) != 0 ||
+      ::symlinkat(document.target.c_str(), location.folder.get(), location.name.c_str()) != 0) {
+    os_log_error(qvc_default_log(), "[ERROR] can't change the link %s", location.path);
+    return;
+  }
+  row->item = 0;
+  row->local = {};
+}
+
 void CloudApplier::replacePlaceholder(const DocumentRecord &document, SyncRow row,
                                       const FileLocation &location, const DocumentLook &look) {
   PreparedResult prepared = context_.storage.preparePlaceholder(
       markerOf(document), document.content.mode & 0777U, {0, document.content.modified});
   if (!prepared.result.isDone()) {
-    row.tag.clear();
     context_.store.put(row);
+    context_.store.fetchAgain(document.record);
     return;
   }
   const ContentsResult result =

@@ -37,8 +37,11 @@ void CloudApplier::create(const DocumentRecord &document, const Place &place, Sy
     made = createDocument(document, place, &row);
   else
     made = createLink(document, place, &row);
-  // What couldn't be made is tried again with the next fetch of everything.
-  if (!made) row.tag.clear();
+  if (!made) {
+    // It is tried again with the next fetch.
+    row.tag.clear();
+    context_.store.fetchAgain(document.record);
+  }
   context_.store.put(row);
 }
 

@@ -18,6 +18,8 @@ namespace {
 
 constexpr std::size_t kRecordsAtATime = 200;
 constexpr char kToken[] = "changeToken";
+constexpr char kFetchesAll[] = "fetchesAll";     // 1 until the last page of everything was applied
+constexpr char kHasFetchedAll[] = "fetchedAll";  // 1 since the first time
 
 }  // namespace
 
@@ -39,54 +41,77 @@ CloudApplier::CloudApplier(const SyncContext &context, ConflictCopies &conflicts
     : context_(context), conflicts_(conflicts) {}
 
 NSError CloudApplier::fetchAndApply(const CKCallContext &call) {
+  NSError problem = fetchPages(call);
+  if (!problem) problem = fetchAgain(call);
+  if (!problem && !hasFetchedAll()) context_.store.setNumber(kHasFetchedAll, 1);
+  return problem;
+}
+
+bool CloudApplier::hasFetchedAll() {
+  return context_.store.number(kHasFetchedAll) != 0;
+}
+
+void CloudApplier::beginFetchOfAll() {
+  fetchesAll_ = true;
+  seen_.clear();
+  context_.store.setText(kToken, "");
+  context_.store.setNumber(kFetchesAll, 1);
+}
+
+NSError CloudApplier::fetchPages(const CKCallContext &call) {
   for (;;) {
     CKServerChangeToken token;
-    const std::string kept = context_.store.text(kToken);
-    if (!kept.empty()) token.data = NSData::dataWithString(kept);
-    if (!token && !fetchesAll_) {
-      fetchesAll_ = true;
-      seen_.clear();
+    std::string kept = context_.store.text(kToken);
+    // What was seen of everything is known to this process alone.
+    const bool wasCutShort = !fetchesAll_ && context_.store.number(kFetchesAll) != 0;
+    if ((kept.empty() && !fetchesAll_) || wasCutShort) {
+      beginFetchOfAll();
+      kept.clear();
     }
+    if (!kept.empty()) token.data = NSData::dataWithString(kept);
     const CKZoneChanges page =
         context_.cloud.fetchZoneChanges(DriveZone(), token, std::nullopt, kRecordsAtATime, call);
     if (CKErrorIs(page.error, CKErrorCode::changeTokenExpired)) {
-      context_.store.setText(kToken, "");
-      fetchesAll_ = false;
+      if (isSameCloud_ && !isSameCloud_()) return page.error;
+      beginFetchOfAll();
       continue;
     }
     if (CKErrorIs(page.error, CKErrorCode::zoneNotFound)) {
+      if (isSameCloud_ && !isSameCloud_()) return page.error;
       const NSError problem = context_.cloud.saveZone(DriveZone(), call);
       if (problem) return problem;
       continue;
     }
     if (page.error) return page.error;
-    const NSError problem = applyPage(page, call);
+    const NSError problem = applyPage(page);
     if (problem) return problem;
     if (!page.moreComing) return NSError();
   }
 }
 
-NSError CloudApplier::applyPage(const CKZoneChanges &page, const CKCallContext &call) {
+NSError CloudApplier::applyPage(const CKZoneChanges &page) {
   std::vector<DocumentRecord> documents;
   for (const CKRecord &record : page.changedRecords) {
+    // One that makes no sense isn't one that was deleted.
+    if (fetchesAll_) seen_.insert(record.recordID.recordName);
     auto document = ReadRecord(record);
     if (!document) {
       os_log_error(qvc_default_log(), "[ERROR] the cloud's record %s makes no sense and is left alone",
                    record.recordID.recordName);
       continue;
     }
-    if (fetchesAll_) seen_.insert(document->record);
     documents.push_back(std::move(*document));
   }
+  const bool endsAll = fetchesAll_ && !page.moreComing;
+  // Another cloud that came into this one's place has none of the records.
+  if (endsAll && isSameCloud_ && !isSameCloud_())
+    return CKErrorMake(CKErrorCode::changeTokenExpired, "the cloud was replaced while it was read");
   context_.store.transaction([&] {
-    applyAll(documents, call);
+    applyAll(documents);
     for (const CKDeletedRecord &deleted : page.deletedRecords) remove(deleted.recordID.recordName);
-    if (fetchesAll_ && !page.moreComing) {
-      // What the cloud doesn't have any more was deleted while nobody could tell.
-      fetchesAll_ = false;
-      for (const std::string &record : context_.store.recordsInCloud())
-        if (seen_.count(record) == 0) remove(record);
-      seen_.clear();
+    if (endsAll) {
+      removeUnseen();
+      context_.store.setNumber(kFetchesAll, 0);
     }
     if (!page.moreComing) removeFolders();
     const auto token = page.token.data.bytes();
@@ -98,16 +123,76 @@ NSError CloudApplier::applyPage(const CKZoneChanges &page, const CKCallContext &
       if (replica) ::syncfs(replica.get());
     }
   });
+  if (endsAll) {
+    fetchesAll_ = false;
+    seen_.clear();
+  }
   finishBatch();
   return NSError();
+}
+
+// What the cloud doesn't have any more was deleted while nobody could tell. A cloud that has nothing at all
+// any more was emptied, or put back to its beginning: nobody deletes a whole drive so, and what is here may
+// be the last copy.
+void CloudApplier::removeUnseen() {
+  const std::vector<std::string> known = context_.store.recordsInCloud();
+  if (seen_.empty() && !known.empty()) {
+    os_log_error(qvc_default_log(),
+                 "[ERROR] the cloud has lost all of the drive: what is here is sent to it again");
+    for (const std::string &record : known) sendAgain(record);
+    return;
+  }
+  for (const std::string &record : known)
+    if (seen_.count(record) == 0) remove(record);
+}
+
+void CloudApplier::sendAgain(const std::string &record) {
+  auto row = context_.store.byRecord(record);
+  if (!row) return;
+  if (row->item == 0 || !context_.files.item(row->item)) return context_.store.erase(record);
+  row->tag.clear();
+  row->newerTag.clear();
+  row->newer = {};
+  row->content.digest.clear();
+  context_.store.put(*row);
+  context_.store.enqueue(row->item, false, false);
 }
 
 void CloudApplier::applyRecords(const std::vector<CKRecord> &records, const CKCallContext &call) {
   std::vector<DocumentRecord> documents;
   for (const CKRecord &record : records)
     if (auto document = ReadRecord(record)) documents.push_back(std::move(*document));
-  context_.store.transaction([&] { applyAll(documents, call); });
+  context_.store.transaction([&] { applyAll(documents); });
   finishBatch();
+  (void)fetchAgain(call);  // what it can't have now comes with the next fetch
+}
+
+// Once each: what still can't be made waits for the next fetch.
+NSError CloudApplier::fetchAgain(const CKCallContext &call) {
+  std::set<std::string> asked;
+  for (;;) {
+    std::vector<CKRecordID> wanted;
+    for (const std::string &record : context_.store.toFetch(asked.size() + kRecordsAtATime))
+      if (asked.insert(record).second) wanted.push_back(RecordID(record));
+    if (wanted.empty()) return NSError();
+    const CKFetchReply reply = context_.cloud.fetchRecords(wanted, std::nullopt, call);
+    if (reply.error && !CKErrorIs(reply.error, CKErrorCode::partialFailure)) return reply.error;
+    context_.store.transaction([&] {
+      std::vector<DocumentRecord> documents;
+      for (const CKRecordResult &result : reply.results) {
+        const std::string &record = result.recordID.recordName;
+        const auto document = result.error ? std::nullopt : ReadRecord(result.record);
+        const bool isGone = CKErrorIs(result.error, CKErrorCode::unknownItem);
+        if (result.error && !isGone) continue;
+        context_.store.fetched(record);
+        if (isGone) remove(record);
+        if (document) documents.push_back(*document);
+      }
+      applyAll(documents);
+      removeFolders();
+    });
+    finishBatch();
+  }
 }
 
 void CloudApplier::finishBatch() {
@@ -115,35 +200,8 @@ void CloudApplier::finishBatch() {
   if (!touched_.empty()) context_.states.lookAt(std::exchange(touched_, {}));
 }
 
-void CloudApplier::applyAll(const std::vector<DocumentRecord> &documents, const CKCallContext &call) {
+void CloudApplier::applyAll(const std::vector<DocumentRecord> &documents) {
   for (const DocumentRecord &document : documents) apply(document);
-  adoptOrphans(call);
-}
-
-// What came before its parent is asked for again once the parent is there.
-void CloudApplier::adoptOrphans(const CKCallContext &call) {
-  while (!parentsMade_.empty()) {
-    std::vector<CKRecordID> wanted;
-    for (const std::string &parent : std::exchange(parentsMade_, {}))
-      for (const std::string &record : context_.store.takeOrphansOf(parent))
-        wanted.push_back(RecordID(record));
-    for (std::size_t at = 0; at < wanted.size(); at += kRecordsAtATime) {
-      const auto begin = wanted.begin() + static_cast<std::ptrdiff_t>(at);
-      const auto end =
-          wanted.begin() + static_cast<std::ptrdiff_t>(std::min(at + kRecordsAtATime, wanted.size()));
-      const CKFetchReply reply = context_.cloud.fetchRecords({begin, end}, std::nullopt, call);
-      const bool failed = reply.error && !CKErrorIs(reply.error, CKErrorCode::partialFailure);
-      if (failed) {
-        // Everything is fetched anew, rather than one document never.
-        context_.store.setText(kToken, "");
-        return;
-      }
-      for (const CKRecordResult &result : reply.results) {
-        if (result.error) continue;
-        if (const auto document = ReadRecord(result.record)) apply(*document);
-      }
-    }
-  }
 }
 
 bool CloudApplier::openPlace(const std::string &parentRecord, Place *place) {
@@ -167,7 +225,10 @@ bool CloudApplier::openPlace(const std::string &parentRecord, Place *place) {
 void CloudApplier::apply(const DocumentRecord &document) {
   auto row = context_.store.byRecord(document.record);
   if (row && row->tag == document.tag) return;
-  if (row && row->hasNewer() && row->newerTag == document.tag) return;
+  // Its contents are on their way; unless something was written here meanwhile.
+  if (row && row->hasNewer() && row->newerTag == document.tag && context_.files.item(row->item) &&
+      !context_.store.queued(row->item))
+    return;
   Place place;
   if (!openPlace(document.parent, &place)) {
     context_.store.keepOrphan(document.record, document.parent);
@@ -186,7 +247,7 @@ void CloudApplier::apply(const DocumentRecord &document) {
     made.newerTag.clear();
     create(document, place, std::move(made));
   }
-  if (document.kind == NSFileProviderItemKind::folder) parentsMade_.push_back(document.record);
+  if (document.kind == NSFileProviderItemKind::folder) context_.store.fetchOrphansOf(document.record);
 }
 
 DocumentMarker CloudApplier::markerOf(const DocumentRecord &document) const {
@@ -236,7 +297,10 @@ void CloudApplier::remove(const std::string &record) {
 }
 
 void CloudApplier::removeDocument(const SyncRow &row, const FileLocation &location) {
-  bool isUnchanged = true;
+  const auto facts = ReadFileFacts(location.folder.get(), location.name, 0);
+  const bool isLink = facts && (facts->kind == NSFileProviderItemKind::symbolicLink ||
+                                facts->kind == NSFileProviderItemKind::alias);
+  bool isUnchanged = isLink || !facts;
   if (row.kind == NSFileProviderItemKind::document) {
     const DocumentLook look = context_.storage.classify(location.folder.get(), location.name);
     const bool isIntact = look.kind == DocumentClass::present || look.kind == DocumentClass::dataless ||
@@ -284,20 +348,21 @@ void CloudApplier::removeFolders() {
 }
 
 void CloudApplier::bringBack(const SyncRow &row) {
-  DocumentRecord document;
-  document.record = row.record;
-  document.tag = row.tag;
-  document.parent = row.parent;
-  document.name = row.name;
-  document.kind = row.kind;
-  document.content = row.content;
-  Place place;
-  if (!openPlace(row.parent, &place)) return;
   SyncRow fresh = row;
   fresh.item = 0;
   fresh.local = {};
-  create(document, place, fresh);
-  finishBatch();
+  fresh.tag.clear();
+  fresh.newerTag.clear();
+  fresh.newer = {};
+  context_.store.put(fresh);
+  context_.store.fetchAgain(row.record);
+}
+
+void CloudApplier::bringBackWhatIsMissing() {
+  context_.store.transaction([&] {
+    for (const std::string &record : context_.store.unboundInCloud())
+      if (const auto row = context_.store.byRecord(record)) bringBack(*row);
+  });
 }
 
 }  // namespace droxa::keld

@@ -23,8 +23,15 @@ class CloudApplier {
   NSError fetchAndApply(const CKCallContext &call);
   // Applies states that came another way.
   void applyRecords(const std::vector<CKRecord> &records, const CKCallContext &call);
-  // Brings back what was deleted here and not in the cloud.
+  // Brings back what was deleted here and not in the cloud, with the next fetch.
   void bringBack(const SyncRow &row);
+  // Asks for records again that no file stands for though the cloud has them: after the first look at the
+  // whole replica.
+  void bringBackWhatIsMissing();
+  // Everything that the cloud has was seen once. Before that, what is new here may be known there.
+  bool hasFetchedAll();
+  // Asked before much is believed to be deleted: whether the cloud is still the same one.
+  void setCloudCheck(std::function<bool()> isSame) { isSameCloud_ = std::move(isSame); }
   std::uint64_t applied() const { return applied_; }
 
  private:
@@ -33,10 +40,14 @@ class CloudApplier {
     std::string folderPath;
   };
 
-  NSError applyPage(const CKZoneChanges &page, const CKCallContext &call);
-  void applyAll(const std::vector<DocumentRecord> &documents, const CKCallContext &call);
+  NSError fetchPages(const CKCallContext &call);
+  NSError applyPage(const CKZoneChanges &page);
+  void applyAll(const std::vector<DocumentRecord> &documents);
+  NSError fetchAgain(const CKCallContext &call);
+  void beginFetchOfAll();
+  void removeUnseen();
+  void sendAgain(const std::string &record);
   void apply(const DocumentRecord &document);
-  void adoptOrphans(const CKCallContext &call);
   bool openPlace(const std::string &parentRecord, Place *place);
 
   void create(const DocumentRecord &document, const Place &place, SyncRow row);
@@ -53,6 +64,8 @@ class CloudApplier {
 
   void change(const DocumentRecord &document, const Place &place, SyncRow row, const ItemRecord &item);
   bool move(const DocumentRecord &document, const Place &place, FileLocation *location);
+  void changeLink(const DocumentRecord &document, SyncRow *row, const FileLocation &location);
+  bool isBasedOn(const DocumentRecord &document, const SyncRow &row, const DocumentLook &look);
   void changeContents(const DocumentRecord &document, SyncRow row, const FileLocation &location);
   void replacePlaceholder(const DocumentRecord &document, SyncRow row, const FileLocation &location,
                           const DocumentLook &look);
@@ -68,9 +81,9 @@ class CloudApplier {
   const SyncContext &context_;
   ConflictCopies &conflicts_;
   std::vector<std::string> touched_;          // paths that the keeper is to look at
-  std::vector<std::string> parentsMade_;      // records that orphans may wait for
   std::vector<std::string> foldersToRemove_;  // records
   std::uint64_t applied_ = 0;
+  std::function<bool()> isSameCloud_;
   bool fetchesAll_ = false;
   std::set<std::string> seen_;  // while everything is fetched anew
 };

@@ -1,6 +1,6 @@
 // One transfer, from the cloud into the document.
 
-#include <thread>
+#include <cerrno>
 
 #include "keld/sync/CloudErrors.h"
 #include "keld/sync/Downloads.h"
@@ -29,7 +29,7 @@ NSError posixError(const ContentsResult &result, const std::string &path) {
 void Downloads::run(std::uint64_t number, ItemNumber item,
                     const std::shared_ptr<CKCancellation> &cancellation) {
   NSError error;
-  for (int tries = 0;; ++tries) {
+  for (int tries = 0;;) {
     if (cancellation->isCancelled()) {
       error = qvc_error(QVErrorCancelled, "nobody wants it any more");
       break;
@@ -37,11 +37,12 @@ void Downloads::run(std::uint64_t number, ItemNumber item,
     error = NSError();
     const Try outcome = attempt(number, item, cancellation, &error);
     if (outcome == Try::ended) break;
-    if (tries >= kMostTries) {
+    // However long another one takes for the same contents: it ends, or fails for not moving.
+    if (outcome != Try::waitForOther && ++tries > kMostTries) {
       if (!error) error = NSError::errorWithPOSIXCode(EBUSY, files_.pathOf(item));
       break;
     }
-    if (outcome == Try::wait) cancellation->waitUntil(std::chrono::steady_clock::now() + kPause);
+    if (outcome != Try::again) cancellation->waitUntil(std::chrono::steady_clock::now() + kPause);
   }
   if (error && !error.is(QVTessalyErrorDomain, QVErrorCancelled))
     os_log_error(qvc_default_log(), "[ERROR] can't download %s: %@", files_.pathOf(item), error);
@@ -53,19 +54,32 @@ Downloads::Try Downloads::attempt(std::uint64_t number, ItemNumber item,
                                   const std::shared_ptr<CKCancellation> &cancellation, NSError *error) {
   const auto location = files_.locate(item, error);
   if (!location) {
-    if (!*error) *error = qvc_errorNoSuchItem(QVFileObjectID::documentID(item).asString());
+    if (!*error) *error = nothingThere(item, number);
     return Try::ended;
+  }
+  {
+    const Lock lock(mutex_);
+    const auto transfer = transfers_.find(number);
+    if (transfer != transfers_.end()) transfer->second.path = location->path;
   }
   const std::string &name = location->name;
   const int folder = location->folder.get();
   const DocumentLook look = storage_.classify(folder, name);
   const auto row = store_.byItem(item);
+  const bool isFile = look.kind != DocumentClass::missing && look.kind != DocumentClass::notADocument;
+  if (isFile && !look.isPromised && look.facts.inode != location->item.facts.inode) {
+    // Another file is at its place; whose that is the keeper finds out.
+    states_.lookAt({location->path});
+    *error = qvc_error(QVErrorDocumentInUse, files_.absolute(location->path) + ": it is being replaced");
+    return Try::wait;
+  }
   switch (look.kind) {
     case DocumentClass::missing:
     case DocumentClass::notADocument:
       states_.lookAt({location->path});
       return Try::wait;
     case DocumentClass::unreadable:
+      if (look.error == EWOULDBLOCK) return Try::wait;  // it is being evicted just now
       *error = NSError::errorWithPOSIXCode(look.error, files_.absolute(location->path));
       return Try::ended;
     case DocumentClass::evicting:
@@ -149,7 +163,7 @@ Downloads::Try Downloads::fill(std::uint64_t number, const FileLocation &locatio
     if (--digests_[wanted.digest] == 0) digests_.erase(wanted.digest);
   }};
   PartResult opened = storage_.openPart(wanted.digest, wanted.size);
-  if (opened.result.outcome == ContentsOutcome::busy) return Try::wait;
+  if (opened.result.outcome == ContentsOutcome::busy) return Try::waitForOther;
   if (!opened.part) {
     *error = posixError(opened.result, path);
     return Try::ended;
@@ -177,7 +191,7 @@ Downloads::Try Downloads::fill(std::uint64_t number, const FileLocation &locatio
   const ContentsResult result = publish(*opened.part, isShared ? PartUse::keep : PartUse::consume);
   switch (result.outcome) {
     case ContentsOutcome::done:
-      states_.show({location.item.id, false, true, LocalFileOf(result.facts), true});
+      published(location.item.id, result);
       return Try::ended;
     case ContentsOutcome::gone:
     case ContentsOutcome::folderGone:
@@ -226,6 +240,18 @@ NSError Downloads::receive(std::uint64_t number, const CKAssetReference &asset, 
     const bool moved = part.length() > before;
     if (!CKErrorIsTimeout(error) || !moved) return error;
   }
+}
+
+void Downloads::published(ItemNumber item, const ContentsResult &result) {
+  states_.show({item, false, true, LocalFileOf(result.facts), true});
+}
+
+NSError Downloads::nothingThere(ItemNumber item, std::uint64_t number) const {
+  const Lock lock(mutex_);
+  const auto transfer = transfers_.find(number);
+  const bool isKnown = transfer != transfers_.end() && !transfer->second.path.empty();
+  return qvc_errorNoSuchItem(isKnown ? files_.absolute(transfer->second.path)
+                                     : QVFileObjectID::documentID(item).asString());
 }
 
 }  // namespace droxa::keld

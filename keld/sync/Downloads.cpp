@@ -12,7 +12,8 @@ namespace droxa::keld {
 
 namespace {
 
-constexpr std::size_t kMostFinishedKept = 1000;
+constexpr std::chrono::seconds kFirstRetry{1};
+constexpr std::chrono::seconds kLongestRetry{300};
 constexpr std::size_t kMostFailuresKept = 10000;
 
 NSError cancelledError() {
@@ -20,6 +21,14 @@ NSError cancelledError() {
 }
 
 }  // namespace
+
+// What one who wants a document is told. Guarded by the downloads' mutex.
+struct Downloads::Interest::State {
+  std::vector<Ended> waiting;
+  bool hasEnded = false;
+  NSError outcome;
+  std::uint64_t done = 0, total = 0;  // when it ended
+};
 
 Downloads::Downloads(std::shared_ptr<CKCloud> cloud, SyncStore &store, ReplicaFiles &files,
                      const ContentsStorage &storage, ItemStates &states, DownloadOptions options)
@@ -57,12 +66,16 @@ std::unique_ptr<Downloads::Interest> Downloads::want(ItemNumber item, std::uint6
                                                      DownloadPriority priority) {
   auto interest = std::make_unique<Interest>();
   interest->downloads_ = shared_from_this();
+  interest->state_ = std::make_shared<Interest::State>();
   const Lock lock(mutex_);
-  if (stopped_) return interest;  // of nothing: it is told as cancelled
+  if (stopped_ || pausedBecause_) {
+    interest->state_->hasEnded = true;
+    interest->state_->outcome = stopped_ ? cancelledError() : pausedBecause_;
+    return interest;
+  }
   Transfer &transfer = transferOf(item, size, priority);
   interest->transfer_ = transfer.number;
-  interest->number_ = ++lastNumber_;
-  transfer.interests[interest->number_];
+  transfer.interests.insert(interest->state_);
   startMore();
   return interest;
 }
@@ -70,33 +83,72 @@ std::unique_ptr<Downloads::Interest> Downloads::want(ItemNumber item, std::uint6
 void Downloads::fetchInBackground(ItemNumber item, std::uint64_t size) {
   const Lock lock(mutex_);
   if (stopped_) return;
+  const auto retry = retries_.find(item);
+  if (pausedBecause_ || (retry != retries_.end() && retry->second.when > std::chrono::steady_clock::now())) {
+    retries_[item].size = size;
+    return;
+  }
   transferOf(item, size, DownloadPriority::background).isKept = true;
   startMore();
 }
 
+void Downloads::retryDue() {
+  const Lock lock(mutex_);
+  if (stopped_ || pausedBecause_) return;
+  const auto now = std::chrono::steady_clock::now();
+  for (const auto &[item, retry] : retries_)
+    if (retry.when <= now) transferOf(item, retry.size, DownloadPriority::background).isKept = true;
+  startMore();
+}
+
+void Downloads::retryAllNow() {
+  const Lock lock(mutex_);
+  for (auto &[item, retry] : retries_) retry.when = {};
+}
+
+void Downloads::pause(const NSError &why) {
+  std::vector<std::uint64_t> never;
+  {
+    const Lock lock(mutex_);
+    if (stopped_) return;
+    pausedBecause_ = why;
+    waiting_.clear();
+    for (auto &[number, transfer] : transfers_) {
+      transfer.why = why;
+      transfer.cancellation->cancel();
+      if (!transfer.isRunning) never.push_back(number);
+    }
+    running_ += never.size();  // end() counts them as ended
+  }
+  for (const std::uint64_t number : never) end(number, why);
+}
+
+void Downloads::resume() {
+  {
+    const Lock lock(mutex_);
+    pausedBecause_ = NSError();
+  }
+  retryAllNow();
+  retryDue();
+}
+
 Downloads::Interest::~Interest() {
-  if (downloads_) downloads_->release(transfer_, number_, cancelledError());
+  cancel();
 }
 
 void Downloads::Interest::cancel() {
-  downloads_->release(transfer_, number_, cancelledError());
+  downloads_->release(transfer_, state_);
 }
 
 void Downloads::Interest::whenEnded(Ended ended) {
-  NSError outcome = cancelledError();
+  NSError outcome;
   {
     const Lock lock(downloads_->mutex_);
-    const auto transfer = downloads_->transfers_.find(transfer_);
-    if (transfer != downloads_->transfers_.end()) {
-      const auto interest = transfer->second.interests.find(number_);
-      if (interest != transfer->second.interests.end()) {
-        interest->second.push_back(std::move(ended));
-        return;
-      }
-    } else if (const auto known = downloads_->finished_.find(transfer_);
-               known != downloads_->finished_.end()) {
-      outcome = known->second.error;
+    if (!state_->hasEnded) {
+      state_->waiting.push_back(std::move(ended));
+      return;
     }
+    outcome = state_->outcome;
   }
   dispatch_async_global([ended = std::move(ended), outcome] { ended(outcome); });
 }
@@ -104,32 +156,36 @@ void Downloads::Interest::whenEnded(Ended ended) {
 void Downloads::Interest::progress(std::uint64_t *done, std::uint64_t *total) const {
   const Lock lock(downloads_->mutex_);
   const auto transfer = downloads_->transfers_.find(transfer_);
-  if (transfer != downloads_->transfers_.end()) {
-    *done = transfer->second.done;
-    *total = transfer->second.total;
-    return;
-  }
-  const auto known = downloads_->finished_.find(transfer_);
-  *done = known == downloads_->finished_.end() ? 0 : known->second.done;
-  *total = known == downloads_->finished_.end() ? 0 : known->second.total;
+  const bool isUnderWay = !state_->hasEnded && transfer != downloads_->transfers_.end();
+  *done = isUnderWay ? transfer->second.done : state_->done;
+  *total = isUnderWay ? transfer->second.total : state_->total;
 }
 
-void Downloads::release(std::uint64_t number, std::uint64_t interest, const NSError &error) {
+// One that nobody wants any more is out of the list at once, so that whoever wants the document now gets a
+// transfer of its own, and not the end of this one.
+void Downloads::release(std::uint64_t number, const std::shared_ptr<Interest::State> &interest) {
   std::vector<Ended> told;
+  const NSError error = cancelledError();
   {
     const Lock lock(mutex_);
+    if (interest->hasEnded) return;
+    interest->hasEnded = true;
+    interest->outcome = error;
+    told.swap(interest->waiting);
     const auto found = transfers_.find(number);
-    if (found == transfers_.end()) return;
-    Transfer &transfer = found->second;
-    auto node = transfer.interests.extract(interest);
-    if (!node) return;
-    told = std::move(node.mapped());
-    if (transfer.interests.empty() && !transfer.isKept) {
-      transfer.cancellation->cancel();
-      if (!transfer.isRunning) {
-        waiting_.erase({-static_cast<int>(transfer.priority), number});
-        byItem_.erase(transfer.item);
-        transfers_.erase(found);
+    if (found != transfers_.end()) {
+      Transfer &transfer = found->second;
+      interest->done = transfer.done;
+      interest->total = transfer.total;
+      transfer.interests.erase(interest);
+      if (transfer.interests.empty() && !transfer.isKept) {
+        transfer.cancellation->cancel();
+        const auto known = byItem_.find(transfer.item);
+        if (known != byItem_.end() && known->second == number) byItem_.erase(known);
+        if (!transfer.isRunning) {
+          waiting_.erase({-static_cast<int>(transfer.priority), number});
+          transfers_.erase(found);
+        }
       }
     }
   }
@@ -152,26 +208,50 @@ void Downloads::startMore() {
   }
 }
 
-void Downloads::end(std::uint64_t number, const NSError &error) {
+void Downloads::noteOutcome(const Transfer &transfer, const NSError &error) {
+  if (!error) {
+    ++done_;
+    failures_.erase(transfer.item);
+    retries_.erase(transfer.item);
+    return;
+  }
+  const bool isCancelled = error.is(QVTessalyErrorDomain, QVErrorCancelled);
+  if (!isCancelled) {
+    ++failed_;
+    if (failures_.size() < kMostFailuresKept) failures_[transfer.item] = error;
+  }
+  const bool isGone = error.is(QVTessalyErrorDomain, QVErrorNoSuchItem);
+  if (!transfer.isKept || isGone) return;
+  Retry &retry = retries_[transfer.item];
+  retry.size = transfer.total;
+  if (isCancelled || pausedBecause_) return;
+  const auto pause =
+      std::min<std::chrono::seconds>(kFirstRetry * (1 << std::min(retry.failures, 20)), kLongestRetry);
+  ++retry.failures;
+  retry.when = std::chrono::steady_clock::now() + pause;
+}
+
+void Downloads::end(std::uint64_t number, const NSError &outcome) {
   std::vector<Ended> told;
+  NSError error = outcome;
   {
     const Lock lock(mutex_);
     auto node = transfers_.extract(number);
     if (!node) return;
     Transfer &transfer = node.mapped();
-    byItem_.erase(transfer.item);
+    const auto known = byItem_.find(transfer.item);
+    if (known != byItem_.end() && known->second == number) byItem_.erase(known);
     --running_;
-    if (!error) {
-      ++done_;
-      failures_.erase(transfer.item);
-    } else if (!error.is(QVTessalyErrorDomain, QVErrorCancelled)) {
-      ++failed_;
-      if (failures_.size() < kMostFailuresKept) failures_[transfer.item] = error;
+    if (error && transfer.why) error = transfer.why;
+    noteOutcome(transfer, error);
+    for (const auto &interest : transfer.interests) {
+      interest->hasEnded = true;
+      interest->outcome = error;
+      interest->done = error ? transfer.done : transfer.total;
+      interest->total = transfer.total;
+      for (Ended &ended : interest->waiting) told.push_back(std::move(ended));
+      interest->waiting.clear();
     }
-    for (auto &[interest, waiting] : transfer.interests)
-      for (Ended &ended : waiting) told.push_back(std::move(ended));
-    finished_[number] = {error, error ? transfer.done : transfer.total, transfer.total};
-    if (finished_.size() > kMostFinishedKept) finished_.erase(finished_.begin());
     startMore();
     idle_.notify_all();
   }

@@ -56,13 +56,20 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
 
    private:
     friend class Downloads;
+    struct State;
     std::shared_ptr<Downloads> downloads_;
     std::uint64_t transfer_ = 0;
-    std::uint64_t number_ = 0;
+    std::shared_ptr<State> state_;
   };
   std::unique_ptr<Interest> want(ItemNumber item, std::uint64_t size, DownloadPriority priority);
-  // Wants it on the daemon's own behalf, until it has ended. Does nothing when it is wanted so already.
+  // Wants it on the daemon's own behalf, until it has ended well: retryDue() begins what failed again, after
+  // a pause that grows. Does nothing when it is wanted so already.
   void fetchInBackground(ItemNumber item, std::uint64_t size);
+  void retryDue();
+  void retryAllNow();  // the cloud is back
+  // While paused nothing is begun; what runs ends with `why`.
+  void pause(const NSError &why);
+  void resume();
 
   QVTransferCounts counts() const;
   // The bytes that are there of the transfer under way; nullopt when there is none.
@@ -75,25 +82,30 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
   struct Transfer {
     ItemNumber item = 0;
     std::uint64_t number = 0;
+    std::string path;  // where the document was last
     std::uint64_t done = 0, total = 0;
     DownloadPriority priority = DownloadPriority::background;
     bool isRunning = false;
     std::shared_ptr<CKCancellation> cancellation = std::make_shared<CKCancellation>();
-    std::map<std::uint64_t, std::vector<Ended>> interests;
+    std::set<std::shared_ptr<Interest::State>> interests;
     bool isKept = false;  // wanted by the daemon itself
+    NSError why;          // of its cancellation, where that isn't its interests'
   };
-  struct Finished {
-    NSError error;
-    std::uint64_t done = 0, total = 0;
+  // What the daemon itself wants, and failed.
+  struct Retry {
+    std::uint64_t size = 0;
+    int failures = 0;
+    std::chrono::steady_clock::time_point when;
   };
 
   Transfer &transferOf(ItemNumber item, std::uint64_t size, DownloadPriority priority) REQUIRES(mutex_);
   void startMore() REQUIRES(mutex_);
   void run(std::uint64_t number, ItemNumber item, const std::shared_ptr<CKCancellation> &cancellation);
   void end(std::uint64_t number, const NSError &error);
-  void release(std::uint64_t transfer, std::uint64_t interest, const NSError &error);
+  void release(std::uint64_t transfer, const std::shared_ptr<Interest::State> &interest);
+  void noteOutcome(const Transfer &transfer, const NSError &error) REQUIRES(mutex_);
 
-  enum class Try { ended, again, wait };
+  enum class Try { ended, again, wait, waitForOther };
   Try attempt(std::uint64_t number, ItemNumber item, const std::shared_ptr<CKCancellation> &cancellation,
               NSError *error);
   Try fill(std::uint64_t number, const FileLocation &location, const DocumentMarker &wanted,
@@ -102,6 +114,8 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
   NSError receive(std::uint64_t number, const CKAssetReference &asset, PartFile &part,
                   const std::shared_ptr<CKCancellation> &cancellation);
   void becameNewer(const std::string &tag);
+  void published(ItemNumber item, const ContentsResult &result);
+  NSError nothingThere(ItemNumber item, std::uint64_t number) const;
 
   const std::shared_ptr<CKCloud> cloud_;
   SyncStore &store_;
@@ -115,7 +129,7 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
   std::map<std::uint64_t, Transfer> transfers_ GUARDED_BY(mutex_);  // by their numbers
   std::map<ItemNumber, std::uint64_t> byItem_ GUARDED_BY(mutex_);
   std::set<std::pair<int, std::uint64_t>> waiting_ GUARDED_BY(mutex_);  // by falling priority, then age
-  std::map<std::uint64_t, Finished> finished_ GUARDED_BY(mutex_);       // while somebody may ask
+  std::map<ItemNumber, Retry> retries_ GUARDED_BY(mutex_);
   std::map<ItemNumber, NSError> failures_ GUARDED_BY(mutex_);
   std::map<std::string, int> digests_ GUARDED_BY(mutex_);  // under way
   std::uint64_t lastNumber_ GUARDED_BY(mutex_) = 0;
@@ -124,6 +138,7 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
   TransferRate rate_ GUARDED_BY(mutex_);
   std::condition_variable_any idle_;
   bool stopped_ GUARDED_BY(mutex_) = false;
+  NSError pausedBecause_ GUARDED_BY(mutex_);  // nil: not paused
 };
 
 }  // namespace droxa::keld

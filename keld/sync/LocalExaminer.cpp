@@ -1,6 +1,7 @@
 #include "keld/sync/LocalExaminer.h"
 
 #include <algorithm>
+#include <chrono>
 
 #include "keld/sync/DocumentRecord.h"
 #include "tessaly/QVLog.h"
@@ -10,6 +11,7 @@ namespace droxa::keld {
 namespace {
 
 constexpr std::uint64_t kChangesAtATime = 500;
+constexpr std::chrono::seconds kSpreeWindow{60};
 constexpr char kExaminedRank[] = "examinedRank";
 constexpr char kHoldsDeletions[] = "holdsDeletions";
 
@@ -81,41 +83,65 @@ void LocalExaminer::examineItem(ItemNumber item) {
 
 // --- Deaths.
 
+// How many items died lately, with `more` of this moment.
+std::uint64_t LocalExaminer::recentDeaths(std::uint64_t more) {
+  const auto now = std::chrono::steady_clock::now();
+  recent_.push_back({now, more});
+  while (recent_.front().when + kSpreeWindow < now) recent_.pop_front();
+  std::uint64_t deaths = 0;
+  for (const Deaths &each : recent_) deaths += each.count;
+  return deaths;
+}
+
 // Counts before the first of them is queued, because what is queued may be sent at once.
 void LocalExaminer::guardAgainstSpree(const std::vector<Change> &changes) {
   if (holdsDeletions_) return;
   std::uint64_t deaths = 0;
-  std::uint64_t rank = changes.back().rank;
+  const std::uint64_t rank = changes.back().rank;
   for (const Change &change : changes)
     if (change.isDeath && store_.byItem(change.item)) ++deaths;
   if (deaths == 0) return;
-  // What follows belongs to the same event.
+  if (isReplicaItself_ && !isReplicaItself_()) return holdDeletions();
+  const std::uint64_t known = recentDeaths(deaths);
+  // What follows belongs to the same event, and is counted again when its turn comes.
+  std::uint64_t following = 0;
+  std::uint64_t after = rank;
   for (bool more = true; more;) {
-    std::vector<Tombstone> following;
-    (void)read_([&](ItemQueries &queries) { following = queries.deadAfter(rank, kChangesAtATime); });
-    for (const Tombstone &death : following)
-      if (store_.byItem(death.id)) ++deaths;
-    more = following.size() == kChangesAtATime;
-    if (more) rank = following.back().rank;
+    std::vector<Tombstone> next;
+    (void)read_([&](ItemQueries &queries) { next = queries.deadAfter(after, kChangesAtATime); });
+    for (const Tombstone &death : next)
+      if (store_.byItem(death.id)) ++following;
+    more = next.size() == kChangesAtATime;
+    if (more) after = next.back().rank;
   }
-  deaths += store_.countDeletions();
-  const std::uint64_t all = store_.countRows();
-  if (deaths < guard_.atLeast || static_cast<double>(deaths) <= guard_.share * static_cast<double>(all))
-    return;
-  holdsDeletions_ = true;
-  store_.setNumber(kHoldsDeletions, 1);
+  // Those of the window that were carried out aren't among the rows any more.
+  const std::uint64_t all = store_.countRows() + known - std::min(known, store_.countDeletions() + deaths);
+  const std::uint64_t sum = known + following;
+  if (sum < guard_.atLeast || static_cast<double>(sum) <= guard_.share * static_cast<double>(all)) return;
   os_log_error(qvc_default_log(),
                "[ERROR] %llu of %llu items were deleted here at once: nothing is deleted in the cloud until "
                "somebody says that this was meant",
-               deaths, all);
+               sum, all);
+  holdDeletions();
+}
+
+void LocalExaminer::holdDeletions() {
+  holdsDeletions_ = true;
+  store_.setNumber(kHoldsDeletions, 1);
+  store_.holdDeletions();
 }
 
 void LocalExaminer::allowDeletions() {
   holdsDeletions_ = false;
+  recent_.clear();
   store_.transaction([this] {
     store_.setNumber(kHoldsDeletions, 0);
     store_.releaseHeld();
   });
+}
+
+void LocalExaminer::forgetHoldIfNothingIsHeld() {
+  if (holdsDeletions_ && store_.countHeld() == 0) allowDeletions();
 }
 
 void LocalExaminer::examineDeath(ItemNumber item) {
@@ -126,7 +152,12 @@ void LocalExaminer::examineDeath(ItemNumber item) {
 }
 
 void LocalExaminer::queue(ItemNumber item, bool isDeletion) {
-  store_.enqueue(item, isDeletion, isDeletion && holdsDeletions_);
+  std::int64_t notBefore = 0;
+  if (isDeletion)
+    notBefore = std::chrono::duration_cast<std::chrono::milliseconds>(
+                    std::chrono::system_clock::now().time_since_epoch() + guard_.pause)
+                    .count();
+  store_.enqueue(item, isDeletion, isDeletion && holdsDeletions_, notBefore);
   queuedAny_ = true;
 }
 
@@ -196,11 +227,11 @@ bool LocalExaminer::bind(const ItemRecord &item, const std::string &parent) {
   const auto facts = ReadFileFacts(location->folder.get(), location->name, 0);
   if (!facts || facts->inode != item.facts.inode) return false;  // another file by now; it is told of yet
   const auto marker = ReadMarker(location->folder.get(), location->name);
-  if (!marker) return false;
-  auto row = store_.byRecord(marker->recordName);
+  auto row = marker ? store_.byRecord(marker->recordName) : findUnmarked(item, parent);
   if (!row || row->kind != item.facts.kind) return false;
   // A copy that somebody made with the marker on it is another document.
   if (row->item != 0 && row->item != item.id && files_.item(row->item)) return false;
+  if (row->item != 0 && row->item != item.id) store_.dropQueued(row->item);  // it hasn't died
   row->item = item.id;
   store_.put(*row);
   store_.dropQueued(item.id);
@@ -216,6 +247,14 @@ void LocalExaminer::bindTo(const std::string &record, ItemNumber item) {
   row->item = item;
   store_.put(*row);
   examineItem(item);
+}
+
+// A document that bears no marker, but is the very file that was synced at this place.
+std::optional<SyncRow> LocalExaminer::findUnmarked(const ItemRecord &item, const std::string &parent) {
+  auto row = store_.byName(parent, item.name);
+  if (!row || row->item != 0 || row->tag.empty() || item.isFolder()) return std::nullopt;
+  if (row->isDataless || !IsSameContents(LocalFileOf(item.facts), row->local)) return std::nullopt;
+  return row;
 }
 
 bool LocalExaminer::bindLink(const ItemRecord &item, SyncRow row) {

@@ -1,6 +1,8 @@
 #pragma once
 
+#include <chrono>
 #include <cstdint>
+#include <deque>
 #include <functional>
 #include <string>
 #include <vector>
@@ -17,6 +19,8 @@ namespace droxa::keld {
 struct DeletionGuard {
   double share = 0.3;          // of the documents and folders that the drive has in the cloud
   std::uint64_t atLeast = 25;  // deletions
+  // No deletion is sent sooner, so that the first ones of many are still here when the rest is noticed.
+  std::chrono::milliseconds pause{700};
 };
 
 // Reads the item table's feed of changes and finds out which of them the cloud doesn't know: those it puts
@@ -44,6 +48,12 @@ class LocalExaminer {
   }
   // A person has said what is to become of the deletions that were held.
   void allowDeletions();
+  // Nothing is held any more, so that what dies next is judged anew.
+  void forgetHoldIfNothingIsHeld();
+  // Deletions from now on wait for a person's word, as those do that weren't sent yet.
+  void holdDeletions();
+  // Asked before deletions are believed: whether the replica's folder is the one that it always was.
+  void setReplicaCheck(std::function<bool()> isItself) { isReplicaItself_ = std::move(isItself); }
 
  private:
   struct Change {
@@ -58,7 +68,9 @@ class LocalExaminer {
   bool bind(const ItemRecord &item, const std::string &parent);
   bool bindLink(const ItemRecord &item, SyncRow row);
   bool hasSyncedContents(const ItemRecord &item, SyncRow &row);
+  std::optional<SyncRow> findUnmarked(const ItemRecord &item, const std::string &parent);
   void guardAgainstSpree(const std::vector<Change> &changes);
+  std::uint64_t recentDeaths(std::uint64_t more);
   void queue(ItemNumber item, bool isDeletion);
 
   SyncStore &store_;
@@ -68,6 +80,12 @@ class LocalExaminer {
   const ReplicaFiles::Read read_;
   const DeletionGuard guard_;
   std::function<void(ItemNumber, const SyncRow &)> bound_;
+  std::function<bool()> isReplicaItself_;
+  struct Deaths {
+    std::chrono::steady_clock::time_point when;
+    std::uint64_t count = 0;
+  };
+  std::deque<Deaths> recent_;  // sent or not
   bool holdsDeletions_ = false;
   bool queuedAny_ = false;
 };

@@ -2,7 +2,9 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <fstream>
 #include <future>
+#include <sys/stat.h>
 #include <system_error>
 #include <utility>
 
@@ -19,8 +21,11 @@ constexpr std::chrono::milliseconds kFirstPause{500};
 constexpr std::chrono::milliseconds kLongestPause{60'000};
 constexpr std::chrono::milliseconds kCallTimeout{60'000};
 constexpr std::uint64_t kVersionsAtATime = 1000;
+constexpr std::chrono::milliseconds kScanPoll{100};
 constexpr char kCloudIdentifier[] = "cloudIdentifier";
 constexpr char kItemDatabase[] = "itemDatabase";
+constexpr char kReplica[] = "replica";
+constexpr char kIdentityName[] = "identity";
 
 std::unique_ptr<ContentsStorage> openStorage(const std::string &replicaPath,
                                              const ContentsSettings &settings) {
@@ -38,12 +43,13 @@ SyncEngine::SyncEngine(const std::string &replicaPath, const std::string &databa
                        ReplicaFiles::Read read, SyncOptions options)
     : cloud_(std::move(cloud)),
       options_(std::move(options)),
+      keeper_(std::move(keeper)),
       store_(databasePath),
       files_(replicaPath, read, store_),
       storage_(openStorage(replicaPath, options_.contents)),
-      states_(std::move(keeper)),
+      states_(keeper_),
       context_{store_, files_, *storage_, states_, *cloud_, cloud_->deviceName()},
-      assets_(std::make_shared<AssetUploads>(cloud_,
+      assets_(std::make_shared<AssetUploads>(cloud_, options_.downloads.stallTimeout,
                                              [this](ItemNumber item) {
                                                store_.retryNow(item);
                                                itemsChanged();
@@ -61,6 +67,10 @@ SyncEngine::SyncEngine(const std::string &replicaPath, const std::string &databa
   examiner_.setBoundHandler([this](ItemNumber item, const SyncRow &row) {
     if (row.isDataless && isPinnedOrBelowPin(item)) downloads_->fetchInBackground(item, row.content.size);
   });
+  examiner_.setReplicaCheck([this] { return isReplicaItself(); });
+  applier_.setCloudCheck([this] { return isSameCloud(); });
+  uploader_.setNeedsContents(
+      [this](const ItemRecord &item) { downloads_->fetchInBackground(item.id, item.facts.size); });
 }
 
 SyncEngine::~SyncEngine() {
@@ -68,6 +78,7 @@ SyncEngine::~SyncEngine() {
 }
 
 void SyncEngine::start(const std::string &itemDatabase) {
+  checkReplica();
   bindAnew(itemDatabase);
   storage_->recover();
   nextPoll_ = std::chrono::steady_clock::now();
@@ -106,6 +117,34 @@ void SyncEngine::stop() {
   for (auto &done : fetchers) dispatch_async_global([done = std::move(done), error] { done(error); });
 }
 
+// Another folder in the replica's place has none of its documents, and nobody has deleted them. The folder is
+// told by a name that it was given once.
+void SyncEngine::checkReplica() {
+  const std::string path = files_.replicaPath() + "/" + kContentsStorageName;
+  struct stat status = {};
+  if (::stat(path.c_str(), &status) == 0) storageInode_ = status.st_ino;
+  std::string found;
+  std::ifstream(path + "/" + kIdentityName) >> found;
+  std::string known = store_.text(kReplica);
+  const bool isOther = !known.empty() && found != known;
+  if (isOther && store_.countRows() > 0) {
+    os_log_error(qvc_default_log(),
+                 "[ERROR] %s isn't the folder that it was: what is missing in it isn't deleted in the cloud "
+                 "until somebody says so",
+                 files_.replicaPath());
+    examiner_.holdDeletions();
+  }
+  if (known.empty()) known = found.empty() ? NewRecordName() : found;
+  if (found != known) std::ofstream(path + "/" + kIdentityName, std::ios::trunc) << known << "\n";
+  store_.setText(kReplica, known);
+}
+
+bool SyncEngine::isReplicaItself() const {
+  struct stat status = {};
+  const std::string path = files_.replicaPath() + "/" + kContentsStorageName;
+  return ::stat(path.c_str(), &status) == 0 && status.st_ino == storageInode_;
+}
+
 void SyncEngine::bindAnew(const std::string &itemDatabase) {
   if (store_.text(kItemDatabase) == itemDatabase) return;
   store_.transaction([&] {
@@ -122,10 +161,16 @@ void SyncEngine::itemsChanged() {
 }
 
 void SyncEngine::setSignedIn(bool isSignedIn) {
-  const Lock lock(mutex_);
-  signedIn_ = isSignedIn;
-  hasLocalNews_ = hasCloudNews_ = true;
-  wake_.notify_all();
+  {
+    const Lock lock(mutex_);
+    signedIn_ = isSignedIn;
+    hasLocalNews_ = hasCloudNews_ = true;
+    wake_.notify_all();
+  }
+  if (isSignedIn)
+    downloads_->resume();
+  else
+    downloads_->pause(qvc_errorLoggedOut());
 }
 
 bool SyncEngine::perform(std::function<void()> work) {
@@ -219,6 +264,8 @@ void SyncEngine::answerDeletions(bool carryOut) {
           if (row) applier_.bringBack(*row);
         }
       }
+      const Lock lock(mutex_);
+      hasCloudNews_ = true;
     }
     examiner_.allowDeletions();
   });
@@ -269,7 +316,7 @@ void SyncEngine::run() {
       round();
     } catch (const SqlError &error) {
       os_log_fault(qvc_default_log(), "[CRIT] the sync's database failed: %s", error.what());
-      noteCloudProblem(qvc_error(QVErrorDatabase, error.what()));
+      noteCloudProblem(fetching, qvc_error(QVErrorDatabase, error.what()));
     }
     waitForWork();
   }
@@ -290,13 +337,26 @@ void SyncEngine::round() {
     waiters_.clear();
   }
   moreIsDue_ = false;
+  // Asked for first: what it has seen by then is in the feed.
+  const bool isReplicaSeen = !hasSeenReplica_ && keeper_() && keeper_()->firstScanDone();
   examiner_.examine();
+  if (hasSeenReplica_ || isReplicaSeen) examiner_.forgetHoldIfNothingIsHeld();
+  if (isReplicaSeen) afterFirstScan();
   for (const auto &task : work) task();
   if (!isSignedIn || !prepareCloud()) {
+    answerFetchers(isSignedIn ? problems_[fetching] : qvc_errorLoggedOut());
     answerWaiters();
     return;
   }
   if (fetches) fetch();
+  // What is new here may be known there, until all of that was seen.
+  if (applier_.hasFetchedAll()) send();
+  downloads_->retryDue();
+  startWaitingVersions();
+  answerWaiters();
+}
+
+void SyncEngine::send() {
   const std::uint64_t before = uploader_.totals().bytes;
   const Uploader::Round sent = uploader_.sendDue(call(kCallTimeout));
   {
@@ -304,33 +364,49 @@ void SyncEngine::round() {
     uploadRate_.add(uploader_.totals().bytes - before);
   }
   if (!sent.newerRecords.empty()) applier_.applyRecords(sent.newerRecords, call(kCallTimeout));
-  if (sent.cloudProblem) noteCloudProblem(sent.cloudProblem);
-  if (sent.sent > 0) noteCloudProblem(NSError());
-  moreIsDue_ = sent.moreIsDue || !sent.newerRecords.empty();
-  startWaitingVersions();
-  answerWaiters();
+  if (sent.cloudProblem)
+    noteCloudProblem(sending, sent.cloudProblem);
+  else if (sent.sent > 0 || store_.countQueued() == 0)
+    noteCloudProblem(sending, NSError());
+  moreIsDue_ = sent.moreIsDue || (!sent.newerRecords.empty() && !sent.cloudProblem);
+}
+
+// The whole replica was looked at once: a record that no file stands for has lost its file unseen, and what
+// is held because of a replaced folder is all there is.
+void SyncEngine::afterFirstScan() {
+  hasSeenReplica_ = true;
+  applier_.bringBackWhatIsMissing();
+  for (const SyncRow &row : store_.datalessRows())
+    if (isPinnedOrBelowPin(row.item)) downloads_->fetchInBackground(row.item, row.content.size);
+}
+
+bool SyncEngine::isSameCloud() {
+  const std::string known = store_.text(kCloudIdentifier);
+  return known.empty() || cloud_->cloudIdentifier().description() == known;
 }
 
 bool SyncEngine::prepareCloud() {
-  if (isCloudReady_) return true;
   const UUID identifier = cloud_->cloudIdentifier();
   const std::string text = identifier.description();
   if (identifier.isNull()) {
     noteCloudProblem(
-        CKErrorMake(CKErrorCode::serviceUnavailable, cloud_->description() + " can't be reached"));
+        fetching, CKErrorMake(CKErrorCode::serviceUnavailable, cloud_->description() + " can't be reached"));
     return false;
   }
+  // Each time: it may have been replaced while this runs.
   const std::string known = store_.text(kCloudIdentifier);
   if (!known.empty() && known != text) {
-    noteCloudProblem(CKErrorMake(CKErrorCode::invalidArguments,
+    noteCloudProblem(fetching,
+                     CKErrorMake(CKErrorCode::invalidArguments,
                                  cloud_->description() + " isn't the cloud that this drive is in (" + known +
                                      "); nothing is sent or fetched until that one is back"));
     return false;
   }
+  if (isCloudReady_) return true;
   if (known.empty()) store_.setText(kCloudIdentifier, text);
   const NSError problem = cloud_->saveZone(DriveZone(), call(kCallTimeout));
   if (problem) {
-    noteCloudProblem(problem);
+    noteCloudProblem(fetching, problem);
     return false;
   }
   if (!subscription_) {
@@ -351,7 +427,11 @@ bool SyncEngine::prepareCloud() {
 void SyncEngine::fetch() {
   nextPoll_ = std::chrono::steady_clock::now() + options_.pollInterval;
   const NSError error = applier_.fetchAndApply(call(kCallTimeout));
-  noteCloudProblem(error);
+  noteCloudProblem(fetching, error);
+  answerFetchers(error);
+}
+
+void SyncEngine::answerFetchers(const NSError &error) {
   std::vector<std::function<void(const NSError &)>> fetchers;
   {
     const Lock lock(mutex_);
@@ -360,30 +440,37 @@ void SyncEngine::fetch() {
   for (auto &done : fetchers) dispatch_async_global([done = std::move(done), error] { done(error); });
 }
 
-void SyncEngine::noteCloudProblem(const NSError &error) {
+// Each direction has its own: one that works doesn't end the other's pause.
+void SyncEngine::noteCloudProblem(Direction direction, const NSError &error) {
   if (stopping_->isCancelled()) return;
-  const std::string text = error ? error.localizedDescription() : std::string();
+  const bool wasWell = !problems_[fetching] && !problems_[sending];
+  problems_[direction] = error;
+  const NSError &shown = problems_[fetching] ? problems_[fetching] : problems_[sending];
+  const std::string text = shown ? shown.localizedDescription() : std::string();
   bool isNews = false;
   {
     const Lock lock(mutex_);
     isNews = cloudProblem_ != text;
     cloudProblem_ = text;
   }
-  if (!error) {
+  if (!shown) {
     retryPause_ = {};
-    if (isNews) store_.retryAllNow();
+    if (wasWell) return;
+    store_.retryAllNow();
+    downloads_->retryAllNow();
     return;
   }
+  if (!error) return;
   if (isNews) os_log_error(qvc_default_log(), "[ERROR] the cloud: %@", error);
   retryPause_ = std::min(std::max(retryPause_ * 2, kFirstPause), kLongestPause);
+  if (const auto asked = CKErrorRetryAfter(error)) retryPause_ = std::max(retryPause_, *asked);
   nextPoll_ = std::chrono::steady_clock::now() + retryPause_;
 }
 
 // The versions that wait to replace what is here are fetched by the downloads.
 void SyncEngine::startWaitingVersions() {
   for (const SyncRow &row : store_.withNewerVersion(kVersionsAtATime))
-    if (row.item != 0 && !downloads_->lastError(row.item))
-      downloads_->fetchInBackground(row.item, row.newer.size);
+    if (row.item != 0) downloads_->fetchInBackground(row.item, row.newer.size);
 }
 
 void SyncEngine::answerWaiters() {
@@ -419,6 +506,8 @@ void SyncEngine::waitForWork() {
     const auto wait = std::max(std::chrono::milliseconds(*retry) - now, std::chrono::milliseconds(5));
     if (retryPause_.count() == 0) until = std::min(until, std::chrono::steady_clock::now() + wait);
   }
+  // Nobody tells of the end of the first look at the replica.
+  if (!hasSeenReplica_) until = std::min(until, std::chrono::steady_clock::now() + kScanPoll);
   until = std::max(until, std::chrono::steady_clock::now() + std::chrono::milliseconds(1));
   Lock lock(mutex_);
   while (!stop_ && !hasLocalNews_ && !hasCloudNews_ && work_.empty()) {

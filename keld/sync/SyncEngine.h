@@ -88,10 +88,17 @@ class SyncEngine {
   void run();
   bool prepareCloud();
   ContentsResult keepBoth(const FileLocation &location, PreparedFile &prepared);
+  bool isSameCloud();
+  void checkReplica();
+  bool isReplicaItself() const;
+  void afterFirstScan();
+  void answerFetchers(const NSError &error);
   void bindAnew(const std::string &itemDatabase);
   void round();
   void fetch();
-  void noteCloudProblem(const NSError &error);
+  void send();
+  enum Direction { fetching, sending };
+  void noteCloudProblem(Direction direction, const NSError &error);
   void answerWaiters();
   void startWaitingVersions();
   void waitForWork();
@@ -99,6 +106,7 @@ class SyncEngine {
 
   const std::shared_ptr<CKCloud> cloud_;
   const SyncOptions options_;
+  const std::function<Keeper *()> keeper_;
   SyncStore store_;
   ReplicaFiles files_;
   std::unique_ptr<ContentsStorage> storage_;
@@ -110,6 +118,7 @@ class SyncEngine {
   LocalExaminer examiner_;
   Uploader uploader_;
   CloudApplier applier_;
+  std::uint64_t storageInode_ = 0;  // of the replica's own folder; constant after start()
   const std::shared_ptr<CKCancellation> stopping_ = std::make_shared<CKCancellation>();
   std::unique_ptr<CKSubscription> subscription_;
 
@@ -118,6 +127,8 @@ class SyncEngine {
   bool moreIsDue_ = false;
   std::vector<Waiter> waiting_;
   std::chrono::milliseconds retryPause_{0};
+  NSError problems_[2];  // by direction
+  bool hasSeenReplica_ = false;
   std::chrono::steady_clock::time_point nextPoll_;
 
   Mutex mutex_;

@@ -6,6 +6,8 @@ namespace droxa::keld {
 
 namespace {
 
+constexpr std::int64_t kLongestDelay = 3'600'000;  // milliseconds
+
 constexpr char kSchema[] = R"sql(
 CREATE TABLE IF NOT EXISTS rows(
   record TEXT PRIMARY KEY,
@@ -34,6 +36,11 @@ CREATE INDEX IF NOT EXISTS rows_name ON rows(parent, name);
 CREATE INDEX IF NOT EXISTS rows_newer ON rows(newerTag) WHERE newerTag <> '';
 CREATE TABLE IF NOT EXISTS orphans(record TEXT PRIMARY KEY, parent TEXT NOT NULL) WITHOUT ROWID;
 CREATE INDEX IF NOT EXISTS orphans_parent ON orphans(parent);
+CREATE TABLE IF NOT EXISTS sent(
+  record TEXT NOT NULL,
+  digest TEXT NOT NULL,
+  PRIMARY KEY(record, digest)
+) WITHOUT ROWID;
 CREATE TABLE IF NOT EXISTS uploads(
   sequence INTEGER PRIMARY KEY AUTOINCREMENT,
   item INTEGER NOT NULL UNIQUE,
@@ -49,6 +56,7 @@ CREATE TABLE IF NOT EXISTS uploads(
 CREATE INDEX IF NOT EXISTS uploads_held ON uploads(sequence) WHERE held = 1;
 CREATE INDEX IF NOT EXISTS uploads_failed ON uploads(retry) WHERE retry <> 0;
 CREATE TABLE IF NOT EXISTS pins(item INTEGER PRIMARY KEY, record TEXT NOT NULL);
+CREATE INDEX IF NOT EXISTS pins_record ON pins(record) WHERE record <> '';
 CREATE TABLE IF NOT EXISTS meta(key TEXT PRIMARY KEY, value) WITHOUT ROWID;
 PRAGMA user_version = 1;
 )sql";
@@ -184,6 +192,10 @@ void SyncStore::put(const SyncRow &row) {
     SqlStatement &unbind = statement("UPDATE rows SET item = 0 WHERE item = ? AND item <> 0 AND record <> ?");
     unbind.bind(1, row.item).bindText(2, row.record);
     unbind.run();
+    statement("UPDATE OR REPLACE pins SET item = ?, record = '' WHERE record = ? AND record <> ''")
+        .bind(1, row.item)
+        .bindText(2, row.record)
+        .run();
   }
   SqlStatement &put = statement(
       "INSERT INTO rows(" ROW_COLUMNS
@@ -224,13 +236,50 @@ std::vector<std::string> SyncStore::recordsInCloud() {
 void SyncStore::unbindAll() {
   const RecursiveLock lock(mutex_);
   transaction([this]() NO_THREAD_SAFETY_ANALYSIS {
+    // A pin waits under its record until that has an item again; the negative numbers are no items.
     database_.execute(
-        "UPDATE OR IGNORE pins SET record = (SELECT record FROM rows WHERE rows.item = pins.item AND item <> "
-        "0)"
-        " WHERE record = '' AND EXISTS (SELECT 1 FROM rows WHERE rows.item = pins.item)");
+        "UPDATE pins SET record = (SELECT record FROM rows WHERE rows.item = pins.item), item = -1 - item"
+        " WHERE record = '' AND EXISTS (SELECT 1 FROM rows WHERE rows.item = pins.item AND rows.item <> 0)");
+    database_.execute("DELETE FROM pins WHERE record = ''");
+    database_.execute("DELETE FROM rows WHERE tag = '' AND item <> 0");
     database_.execute("UPDATE rows SET item = 0");
     database_.execute("DELETE FROM uploads");
   });
+}
+
+std::vector<std::string> SyncStore::unboundInCloud() {
+  const RecursiveLock lock(mutex_);
+  SqlStatement &asked = statement("SELECT record FROM rows WHERE item = 0 AND tag <> ''");
+  std::vector<std::string> records;
+  while (asked.step()) records.emplace_back(asked.bytes(0));
+  asked.reset();
+  return records;
+}
+
+std::vector<SyncRow> SyncStore::datalessRows() {
+  const RecursiveLock lock(mutex_);
+  return all(statement("SELECT " ROW_COLUMNS " FROM rows WHERE dataless = 1 AND item <> 0"));
+}
+
+// --- Saves whose outcome isn't known.
+
+void SyncStore::noteSent(const std::string &record, const std::string &digest) {
+  const RecursiveLock lock(mutex_);
+  statement("INSERT OR REPLACE INTO sent VALUES (?, ?)").bindText(1, record).bindText(2, digest).run();
+}
+
+void SyncStore::forgetSent(const std::string &record) {
+  const RecursiveLock lock(mutex_);
+  statement("DELETE FROM sent WHERE record = ?").bindText(1, record).run();
+}
+
+bool SyncStore::wasSent(const std::string &record, const std::string &digest) {
+  const RecursiveLock lock(mutex_);
+  SqlStatement &asked = statement("SELECT 1 FROM sent WHERE record = ? AND digest = ?");
+  asked.bindText(1, record).bindText(2, digest);
+  const bool found = asked.step();
+  asked.reset();
+  return found;
 }
 
 // --- Orphans.
@@ -240,19 +289,38 @@ void SyncStore::keepOrphan(const std::string &record, const std::string &parent)
   statement("INSERT OR REPLACE INTO orphans VALUES (?, ?)").bindText(1, record).bindText(2, parent).run();
 }
 
-std::vector<std::string> SyncStore::takeOrphansOf(const std::string &parent) {
+void SyncStore::fetchAgain(const std::string &record) {
+  keepOrphan(record, "");
+}
+
+std::uint64_t SyncStore::fetchOrphansOf(const std::string &parent) {
   const RecursiveLock lock(mutex_);
-  SqlStatement &asked = statement("SELECT record FROM orphans WHERE parent = ?");
-  asked.bindText(1, parent);
+  const std::uint64_t before = countToFetch();
+  statement("UPDATE orphans SET parent = '' WHERE parent = ?").bindText(1, parent).run();
+  return countToFetch() - before;
+}
+
+std::vector<std::string> SyncStore::toFetch(std::uint64_t limit) {
+  const RecursiveLock lock(mutex_);
+  SqlStatement &asked = statement("SELECT record FROM orphans WHERE parent = '' LIMIT ?");
+  asked.bind(1, limit);
   std::vector<std::string> records;
   while (asked.step()) records.emplace_back(asked.bytes(0));
   asked.reset();
-  if (!records.empty()) statement("DELETE FROM orphans WHERE parent = ?").bindText(1, parent).run();
   return records;
 }
 
+void SyncStore::fetched(const std::string &record) {
+  const RecursiveLock lock(mutex_);
+  statement("DELETE FROM orphans WHERE record = ? AND parent = ''").bindText(1, record).run();
+}
+
+std::uint64_t SyncStore::countToFetch() {
+  return count("SELECT count(*) FROM orphans WHERE parent = ''");
+}
+
 std::uint64_t SyncStore::countOrphans() {
-  return count("SELECT count(*) FROM orphans");
+  return count("SELECT count(*) FROM orphans WHERE parent <> ''");
 }
 
 // --- Uploads.
@@ -278,16 +346,17 @@ std::vector<QueuedUpload> SyncStore::queuedOf(SqlStatement &asked) {
   return uploads;
 }
 
-void SyncStore::enqueue(ItemNumber item, bool isDeletion, bool isHeld) {
+void SyncStore::enqueue(ItemNumber item, bool isDeletion, bool isHeld, std::int64_t notBefore) {
   const RecursiveLock lock(mutex_);
   statement(
       "INSERT INTO uploads(item, generation, attempts, retry, deletion, held, errorDomain, errorCode, "
       "errorText)"
-      " VALUES (?1, 1, 0, 0, ?2, ?3, '', 0, '') ON CONFLICT(item) DO UPDATE SET generation = generation + 1,"
-      " attempts = 0, retry = 0, deletion = ?2, held = ?3, errorDomain = '', errorCode = 0, errorText = ''")
+      " VALUES (?1, 1, 0, ?4, ?2, ?3, '', 0, '') ON CONFLICT(item) DO UPDATE SET generation = generation + 1,"
+      " attempts = 0, retry = ?4, deletion = ?2, held = ?3, errorDomain = '', errorCode = 0, errorText = ''")
       .bind(1, item)
       .bind(2, static_cast<std::int64_t>(isDeletion))
       .bind(3, static_cast<std::int64_t>(isHeld))
+      .bind(4, notBefore)
       .run();
 }
 
@@ -303,8 +372,10 @@ std::optional<QueuedUpload> SyncStore::queued(ItemNumber item) {
 std::vector<QueuedUpload> SyncStore::due(std::int64_t now, std::uint64_t limit) {
   const RecursiveLock lock(mutex_);
   SqlStatement &asked = statement("SELECT " UPLOAD_COLUMNS
-                                  " FROM uploads WHERE held = 0 AND retry <= ? ORDER BY sequence LIMIT ?");
-  asked.bind(1, now).bind(2, limit);
+                                  " FROM uploads WHERE held = 0 AND (retry <= ?1 OR retry > ?2)"
+                                  " ORDER BY sequence LIMIT ?3");
+  // Nothing is put off for so long: the clock was put back.
+  asked.bind(1, now).bind(2, now + kLongestDelay).bind(3, limit);
   return queuedOf(asked);
 }
 
@@ -348,9 +419,8 @@ void SyncStore::dropQueued(ItemNumber item) {
 void SyncStore::uploadFailed(const QueuedUpload &upload, const NSError &error, std::int64_t retry) {
   const RecursiveLock lock(mutex_);
   statement(
-      "UPDATE uploads SET attempts = attempts + (?2 <> ''), retry = ?1, errorDomain = ?, errorCode = ?, "
-      "errorText = ?"
-      " WHERE item = ? AND generation = ?")
+      "UPDATE uploads SET attempts = attempts + (?2 <> ''), retry = ?1, errorDomain = ?2, errorCode = ?3,"
+      " errorText = ?4 WHERE item = ?5 AND generation = ?6")
       .bind(1, retry)
       .bindText(2, error.domain())
       .bind(3, error.code())
@@ -367,7 +437,7 @@ void SyncStore::retryNow(ItemNumber item) {
 
 void SyncStore::retryAllNow() {
   const RecursiveLock lock(mutex_);
-  statement("UPDATE uploads SET retry = 0 WHERE retry <> 0").run();
+  statement("UPDATE uploads SET retry = 0 WHERE retry <> 0 AND deletion = 0").run();
 }
 
 std::uint64_t SyncStore::countQueued() {
@@ -382,6 +452,11 @@ std::uint64_t SyncStore::countHeld() {
 
 std::uint64_t SyncStore::countDeletions() {
   return count("SELECT count(*) FROM uploads WHERE deletion = 1");
+}
+
+void SyncStore::holdDeletions() {
+  const RecursiveLock lock(mutex_);
+  statement("UPDATE uploads SET held = 1 WHERE deletion = 1").run();
 }
 
 void SyncStore::releaseHeld() {
@@ -409,7 +484,7 @@ bool SyncStore::isPinned(ItemNumber item) {
 
 std::vector<ItemNumber> SyncStore::pins() {
   const RecursiveLock lock(mutex_);
-  SqlStatement &asked = statement("SELECT item FROM pins");
+  SqlStatement &asked = statement("SELECT item FROM pins WHERE item > 0");
   std::vector<ItemNumber> items;
   while (asked.step()) items.push_back(asked.number(0));
   asked.reset();

@@ -89,15 +89,29 @@ class SyncStore {
   void erase(const std::string &record);
   std::uint64_t countRows();
   std::vector<std::string> recordsInCloud();
-  void unbindAll();  // the item database is a new one: every item has another number
+  // The item database is a new one: every item has another number. Rows find their items by the markers, and
+  // pins follow them.
+  void unbindAll();
+  std::vector<std::string> unboundInCloud();  // records that no item stands for
+  std::vector<SyncRow> datalessRows();
 
-  // Records that came before their parents.
+  // Records that came before their parents, and those that are to be asked for again: orphans whose parent
+  // has come, and what couldn't be made here.
   void keepOrphan(const std::string &record, const std::string &parent);
-  std::vector<std::string> takeOrphansOf(const std::string &parent);
   std::uint64_t countOrphans();
+  std::uint64_t fetchOrphansOf(const std::string &parent);  // how many
+  void fetchAgain(const std::string &record);
+  std::vector<std::string> toFetch(std::uint64_t limit);
+  void fetched(const std::string &record);
+  std::uint64_t countToFetch();
+
+  // Contents whose save was begun, and may have been carried out without this device being told.
+  void noteSent(const std::string &record, const std::string &digest);
+  void forgetSent(const std::string &record);
+  bool wasSent(const std::string &record, const std::string &digest);
 
   // The queue of uploads, in the order of the changes.
-  void enqueue(ItemNumber item, bool isDeletion, bool isHeld);
+  void enqueue(ItemNumber item, bool isDeletion, bool isHeld, std::int64_t notBeforeMilliseconds = 0);
   std::optional<QueuedUpload> queued(ItemNumber item);
   // Those that are due, oldest first.
   std::vector<QueuedUpload> due(std::int64_t nowMilliseconds, std::uint64_t limit);
@@ -113,6 +127,7 @@ class SyncStore {
   std::uint64_t countFailed();
   std::uint64_t countHeld();
   std::uint64_t countDeletions();
+  void holdDeletions();  // all that wait
   void releaseHeld();
   std::vector<QueuedUpload> held(std::uint64_t limit);
 

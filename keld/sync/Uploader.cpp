@@ -16,7 +16,8 @@ namespace {
 constexpr std::uint64_t kRecordsAtATime = 100;
 constexpr std::uint64_t kInlineSize = 4 << 20;    // larger contents are sent beside this thread
 constexpr std::uint64_t kInlineBytes = 16 << 20;  // of one round
-constexpr std::int64_t kSoon = 300;               // milliseconds
+constexpr std::chrono::seconds kTransferTimeout{60};
+constexpr std::int64_t kSoon = 300;  // milliseconds
 constexpr std::int64_t kLongestPause = 300'000;
 
 std::int64_t nowMilliseconds() {
@@ -28,6 +29,11 @@ std::int64_t nowMilliseconds() {
 bool isSyncedItem(const ItemRecord &item) {
   const bool isPlaced = item.zone() == Zone::shown || item.zone() == Zone::trashed;
   return isPlaced && (item.flags & kExcludedFlag) == 0;
+}
+
+// A lease that an eviction holds, or a writer, for a moment.
+bool isBusy(int code) {
+  return code == EWOULDBLOCK || code == ETXTBSY;
 }
 
 OwnedDescriptor openFile(const FileLocation &location) {
@@ -61,7 +67,7 @@ Uploader::Round Uploader::sendDue(const CKCallContext &call) {
     if (cloudProblem_ || inlineBytes_ >= kInlineBytes || call.isCancelled()) break;
   }
   round.cloudProblem = cloudProblem_;
-  if (cloudProblem_ || call.isCancelled() || (saves.empty() && removals.empty())) {
+  if (call.isCancelled() || (saves.empty() && removals.empty())) {
     round.moreIsDue = !cloudProblem_ && due.size() == kRecordsAtATime;
     return round;
   }
@@ -73,7 +79,14 @@ Uploader::Round Uploader::sendDue(const CKCallContext &call) {
   }
   for (const Plan &plan : removals)
     request.recordsToDelete.push_back({RecordID(plan.row.record), plan.row.tag});
-  const CKModifyReply reply = context_.cloud.modifyRecords(request, call);
+  // The outcome of a call that is cut off isn't known: what this device itself has sent isn't a conflict.
+  context_.store.transaction([&] {
+    for (const Plan &plan : saves)
+      if (plan.hasContent) context_.store.noteSent(plan.row.record, plan.document.content.digest);
+  });
+  CKCallContext own = call;
+  own.deadline = CKCallContext::Clock::now() + kTransferTimeout;
+  const CKModifyReply reply = context_.cloud.modifyRecords(request, own);
   if (reply.error && !CKErrorIs(reply.error, CKErrorCode::partialFailure)) {
     round.cloudProblem = reply.error;
     return round;
@@ -97,7 +110,7 @@ Uploader::Round Uploader::sendDue(const CKCallContext &call) {
     }
   });
   context_.states.flush();
-  round.moreIsDue = !context_.store.due(nowMilliseconds(), 1).empty();
+  round.moreIsDue = !round.cloudProblem && !context_.store.due(nowMilliseconds(), 1).empty();
   return round;
 }
 
@@ -106,23 +119,34 @@ Uploader::Round Uploader::sendDue(const CKCallContext &call) {
 Uploader::Prepared Uploader::prepare(const QueuedUpload &entry, Plan *plan, const CKCallContext &call) {
   if (auto row = context_.store.byItem(entry.item)) plan->row = std::move(*row);
   const auto item = context_.files.item(entry.item);
-  if (!item || !isSyncedItem(*item)) return prepareDeletion(plan);
+  if (!item || !isSyncedItem(*item)) return prepareDeletion(item, plan);
   return prepareSave(*item, plan, call);
 }
 
-Uploader::Prepared Uploader::prepareDeletion(Plan *plan) {
+Uploader::Prepared Uploader::prepareDeletion(const std::optional<ItemRecord> &item, Plan *plan) {
   // What was never seen to die is missing for another reason: the keeper hasn't told yet.
   if (!plan->entry.isDeletion && !plan->row.record.empty()) return laterWith(plan, NSError());
   if (plan->row.record.empty()) {
     context_.store.uploaded(plan->entry);
     return Prepared::nothing;
   }
+  const auto location = item ? context_.files.locate(item->id, nullptr) : std::nullopt;
+  if (location && item->facts.kind == NSFileProviderItemKind::document &&
+      context_.storage.classify(location->folder.get(), location->name).kind == DocumentClass::dataless) {
+    // It only leaves what is synced, and without the cloud's nobody would have its contents.
+    if (needsContents_) needsContents_(*item);
+    return laterWith(plan, NSError());
+  }
+  assets_.forget(plan->entry.item);
   plan->isDeletion = true;
   return Prepared::remove;
 }
 
 Uploader::Prepared Uploader::laterWith(Plan *plan, const NSError &error) {
   std::int64_t pause = kSoon;
+  if (error && plan->entry.attempts == 0)
+    os_log_error(qvc_default_log(), "[ERROR] can't upload %s: %@", context_.files.pathOf(plan->entry.item),
+                 error);
   for (std::int64_t attempt = 0; error && attempt < plan->entry.attempts && pause < kLongestPause; ++attempt)
     pause *= 2;
   context_.store.uploadFailed(plan->entry, error, nowMilliseconds() + std::min(pause, kLongestPause));
@@ -157,7 +181,8 @@ Uploader::Prepared Uploader::prepareSave(const ItemRecord &item, Plan *plan, con
   }
   DocumentRecord &document = plan->document;
   document.record = row.record;
-  document.tag = row.tag;
+  // Names and places of a newer version were followed when it came; only its contents are still on their way.
+  document.tag = row.hasNewer() ? row.newerTag : row.tag;
   document.parent = parent;
   document.name = location->item.name;
   document.kind = location->item.facts.kind;
@@ -167,10 +192,24 @@ Uploader::Prepared Uploader::prepareSave(const ItemRecord &item, Plan *plan, con
   plan->file = LocalFileOf(location->item.facts);
   if (document.kind == NSFileProviderItemKind::folder) {
     plan->changesMarker = row.tag.empty();
-    return Prepared::save;
+    return changesAnything(*plan) ? Prepared::save : nothingToSend(*plan);
   }
   if (document.kind != NSFileProviderItemKind::document) return prepareLink(*location, plan);
   return prepareDocument(*location, plan, call);
+}
+
+bool Uploader::changesAnything(const Plan &plan) {
+  const SyncRow &row = plan.row;
+  return row.tag.empty() || plan.changesTarget || row.parent != plan.document.parent ||
+         row.name != plan.document.name || row.kind != plan.document.kind ||
+         (row.content.mode & 0777) != (plan.document.content.mode & 0777);
+}
+
+Uploader::Prepared Uploader::nothingToSend(const Plan &plan) {
+  context_.store.uploaded(plan.entry);
+  const bool hasFile = plan.row.kind == NSFileProviderItemKind::document;
+  context_.states.show({plan.entry.item, plan.isDataless, true, plan.file, hasFile});
+  return Prepared::nothing;
 }
 
 Uploader::Prepared Uploader::prepareLink(const FileLocation &location, Plan *plan) {
@@ -178,16 +217,17 @@ Uploader::Prepared Uploader::prepareLink(const FileLocation &location, Plan *pla
   const ssize_t length = ::readlinkat(location.folder.get(), location.name.c_str(), target, sizeof target);
   if (length <= 0) return laterWith(plan, NSError::errorWithPOSIXCode(errno, location.path));
   plan->document.target.assign(target, static_cast<std::size_t>(length));
-  return Prepared::save;
+  plan->changesTarget = plan->file.inode != plan->row.local.inode;  // a link's target never changes
+  return changesAnything(*plan) ? Prepared::save : nothingToSend(*plan);
 }
 
 Uploader::Prepared Uploader::prepareDocument(const FileLocation &location, Plan *plan,
                                              const CKCallContext &call) {
   const DocumentLook look = context_.storage.classify(location.folder.get(), location.name);
   SyncRow &row = plan->row;
-  const bool isKnownFile = look.facts.inode == location.item.facts.inode;
-  if (!isKnownFile && look.kind != DocumentClass::missing) {
-    // Another file than the item's: the keeper has to find out which items they are.
+  const bool isFile = look.kind != DocumentClass::missing && look.kind != DocumentClass::notADocument;
+  if (isFile && !look.isPromised && look.facts.inode != location.item.facts.inode) {
+    // Another file is at its place; whose that is the keeper finds out.
     context_.states.lookAt({location.path});
     return laterWith(plan, NSError());
   }
@@ -197,6 +237,7 @@ Uploader::Prepared Uploader::prepareDocument(const FileLocation &location, Plan 
       context_.states.lookAt({location.path});
       return laterWith(plan, NSError());
     case DocumentClass::unreadable:
+      if (isBusy(look.error)) return laterWith(plan, NSError());
       return laterWith(plan, NSError::errorWithPOSIXCode(look.error, context_.files.absolute(location.path)));
     case DocumentClass::evicting:
       context_.storage.finishEviction(location.folder.get(), location.name);
@@ -212,6 +253,7 @@ Uploader::Prepared Uploader::prepareDocument(const FileLocation &location, Plan 
       plan->document.content.size = look.marker->size;
       plan->document.content.digest = look.marker->digest;
       plan->document.content.modified = look.marker->modified;
+      if (!plan->hasContent && !plan->changesMarker && !changesAnything(*plan)) return nothingToSend(*plan);
       return Prepared::save;
     case DocumentClass::plain:
     case DocumentClass::present:
@@ -222,22 +264,29 @@ Uploader::Prepared Uploader::prepareDocument(const FileLocation &location, Plan 
   plan->file = LocalFileOf(look.facts);
   plan->isDataless = false;
   const bool isKnown = !row.content.digest.empty() && !row.tag.empty();
-  if (isKnown && !row.isDataless && IsSameContents(plan->file, row.local)) return Prepared::save;
+  if (isKnown && !row.isDataless && IsSameContents(plan->file, row.local))
+    return changesAnything(*plan) ? Prepared::save : nothingToSend(*plan);
   // Written here and elsewhere: the other version is on its way here, and then both are kept.
   if (row.hasNewer()) return laterWith(plan, NSError());
   plan->hasContent = true;
   plan->changesMarker = true;
+  plan->document.tag = row.tag;  // of the version that was written over: a newer one is a conflict
   return sendContents(location, plan, call);
 }
 
 Uploader::Prepared Uploader::sendContents(const FileLocation &location, Plan *plan,
                                           const CKCallContext &call) {
   const OwnedDescriptor file = openFile(location);
-  if (!file)
-    return laterWith(plan, NSError::errorWithPOSIXCode(errno, context_.files.absolute(location.path)));
+  if (!file) {
+    const int code = errno;
+    if (isBusy(code)) return laterWith(plan, NSError());
+    return laterWith(plan, NSError::errorWithPOSIXCode(code, context_.files.absolute(location.path)));
+  }
   AssetUploads::Finished finished;
   if (plan->file.size <= kInlineSize) {
-    finished = SendContents(context_.cloud, file.get(), plan->file, nullptr, call);
+    CKCallContext own = call;
+    own.deadline = CKCallContext::Clock::now() + kTransferTimeout;
+    finished = SendContents(context_.cloud, file.get(), plan->file, nullptr, own);
     inlineBytes_ += plan->file.size;
   } else {
     auto taken = assets_.take(plan->entry.item, plan->file, file.get());
@@ -247,7 +296,7 @@ Uploader::Prepared Uploader::sendContents(const FileLocation &location, Plan *pl
   if (finished.error) {
     if (CKErrorIsTransient(finished.error)) {
       cloudProblem_ = finished.error;
-      return Prepared::later;
+      return laterWith(plan, NSError());
     }
     const bool changed = CKErrorIs(finished.error, CKErrorCode::assetFileModified);
     if (!changed) failed(*plan, finished.error);
@@ -297,6 +346,11 @@ void Uploader::saved(const Plan &plan, const CKRecord &record) {
   if (plan.hasContent) {
     row.newerTag.clear();
     row.newer = {};
+    context_.store.forgetSent(row.record);
+  } else if (row.hasNewer()) {
+    // What is written over the contents here is still a conflict with the newer ones.
+    row.tag = plan.row.tag;
+    row.newerTag = record.recordChangeTag;
   }
   if (plan.changesMarker) markFile(plan, &row);
   context_.store.put(row);
@@ -332,6 +386,7 @@ void Uploader::markFile(const Plan &plan, SyncRow *row) {
 
 void Uploader::removed(const Plan &plan) {
   context_.store.erase(plan.row.record);
+  context_.store.forgetSent(plan.row.record);
   context_.store.uploaded(plan.entry);
   const Lock lock(mutex_);
   ++totals_.documents;
@@ -342,7 +397,7 @@ void Uploader::saveFailed(const Plan &plan, const NSError &error, Round *round) 
     CKRecord sent = plan.hasContent ? MakeRecordWithContent(plan.document) : MakeRecord(plan.document);
     if (CKServerRecordIsOwnSave(sent, *server, context_.cloud.deviceName())) return saved(plan, *server);
     round->newerRecords.push_back(*server);
-    context_.store.retryNow(plan.entry.item);
+    context_.store.uploadFailed(plan.entry, NSError(), nowMilliseconds() + kSoon);
     return;
   }
   if (CKErrorIs(error, CKErrorCode::unknownItem)) {
@@ -350,6 +405,8 @@ void Uploader::saveFailed(const Plan &plan, const NSError &error, Round *round) 
     SyncRow row = plan.row;
     row.tag.clear();
     row.content = {};
+    row.newerTag.clear();
+    row.newer = {};
     context_.store.put(row);
     context_.store.enqueue(plan.entry.item, false, false);
     return;
@@ -373,11 +430,9 @@ void Uploader::removeFailed(const Plan &plan, const NSError &error, Round *round
 }
 
 void Uploader::failed(const Plan &plan, const NSError &error) {
-  const std::string path = context_.files.pathOf(plan.entry.item);
-  const NSError told = ErrorForClients(error, path);
-  os_log_error(qvc_default_log(), "[ERROR] can't upload %s: %@", path, error);
+  const NSError told =
+      ErrorForClients(error, context_.files.absolute(context_.files.pathOf(plan.entry.item)));
   Plan again = plan;
-  again.entry.attempts = std::max<std::int64_t>(again.entry.attempts, 2);
   laterWith(&again, told);
   const Lock lock(mutex_);
   ++totals_.failed;

@@ -29,6 +29,12 @@ class Uploader {
   Uploader(const SyncContext &context, AssetUploads &assets, ConflictCopies &conflicts,
            LocalExaminer &examiner);
 
+  // Called for a document whose contents are in the cloud alone, and which is to leave it: they have to come
+  // first.
+  void setNeedsContents(std::function<void(const ItemRecord &item)> handler) {
+    needsContents_ = std::move(handler);
+  }
+
   // Sends a batch of what is due.
   Round sendDue(const CKCallContext &call);
 
@@ -47,11 +53,14 @@ class Uploader {
     bool hasContent = false;
     bool isDataless = false;
     bool changesMarker = false;
+    bool changesTarget = false;
   };
   enum class Prepared { save, remove, later, nothing };
 
   Prepared prepare(const QueuedUpload &entry, Plan *plan, const CKCallContext &call);
-  Prepared prepareDeletion(Plan *plan);
+  Prepared prepareDeletion(const std::optional<ItemRecord> &item, Plan *plan);
+  static bool changesAnything(const Plan &plan);
+  Prepared nothingToSend(const Plan &plan);
   Prepared prepareSave(const ItemRecord &item, Plan *plan, const CKCallContext &call);
   Prepared prepareDocument(const FileLocation &location, Plan *plan, const CKCallContext &call);
   Prepared prepareLink(const FileLocation &location, Plan *plan);
@@ -67,6 +76,7 @@ class Uploader {
 
   const SyncContext &context_;
   AssetUploads &assets_;
+  std::function<void(const ItemRecord &)> needsContents_;
   ConflictCopies &conflicts_;
   LocalExaminer &examiner_;
   std::uint64_t inlineBytes_ = 0;  // sent by this round on this thread

@@ -1,0 +1,282 @@
+#include "keld/sync/SyncStore.h"
+
+#include <gtest/gtest.h>
+
+#include "platform/cloudkit/CKError.h"
+#include "tests/platform/TemporaryFolder.h"
+
+namespace droxa::keld {
+namespace {
+
+class SyncStoreTest : public testing::Test {
+ protected:
+  SyncRow row(const std::string &record, ItemNumber item, const std::string &tag = "t1") {
+    SyncRow made;
+    made.record = record;
+    made.item = item;
+    made.tag = tag;
+    made.parent = "container:c";
+    made.name = record + ".txt";
+    made.content = {5, -7, "digest", 0644};
+    made.local = {11, 5, -7, 13};
+    made.isDataless = true;
+    made.newerTag = "t2";
+    made.newer = {6, 8, "newer", 0600};
+    return made;
+  }
+  std::vector<ItemNumber> due(std::int64_t now = 1000) {
+    std::vector<ItemNumber> items;
+    for (const QueuedUpload &each : store.due(now, 100)) items.push_back(each.item);
+    return items;
+  }
+  using Items = std::vector<ItemNumber>;
+
+  const TemporaryFolder folder;
+  const std::string path = folder.path() + "/sync.sqlite";
+  SyncStore store{path};
+};
+
+TEST_F(SyncStoreTest, aRowComesBackAsItWasPut) {
+  const SyncRow put = row("r", 7);
+  store.put(put);
+  for (const auto &got : {store.byRecord("r"), store.byItem(7), store.byName("container:c", "r.txt")}) {
+    ASSERT_TRUE(got);
+    EXPECT_EQ(got->record, "r");
+    EXPECT_EQ(got->item, 7U);
+    EXPECT_EQ(got->tag, "t1");
+    EXPECT_EQ(got->parent, "container:c");
+    EXPECT_EQ(got->name, "r.txt");
+    EXPECT_EQ(got->content, put.content);
+    EXPECT_EQ(got->local, put.local);
+    EXPECT_TRUE(got->isDataless);
+    EXPECT_EQ(got->newerTag, "t2");
+    EXPECT_EQ(got->newer, put.newer);
+  }
+  store.erase("r");
+  EXPECT_FALSE(store.byRecord("r"));
+}
+
+TEST_F(SyncStoreTest, namesOfAnyBytesAreFound) {
+  SyncRow odd = row("r", 1);
+  odd.name = std::string("\xff\n'%_", 5);
+  store.put(odd);
+  ASSERT_TRUE(store.byName("container:c", odd.name));
+  EXPECT_EQ(store.byName("container:c", odd.name)->name, odd.name);
+}
+
+TEST_F(SyncStoreTest, noItemIsAskedForByTheNumberOfNone) {
+  store.put(row("r", 0));
+  EXPECT_FALSE(store.byItem(0));
+}
+
+TEST_F(SyncStoreTest, anItemStandsForOneRecord) {
+  store.put(row("first", 7));
+  store.put(row("second", 7));
+  EXPECT_EQ(store.byItem(7)->record, "second");
+  EXPECT_EQ(store.byRecord("first")->item, 0U);
+}
+
+TEST_F(SyncStoreTest, uploadsAreDueInTheOrderOfTheirFirstChange) {
+  for (const ItemNumber item : {3, 1, 2}) store.enqueue(item, false, false);
+  store.enqueue(3, false, false);
+  EXPECT_EQ(due(), (Items{3, 1, 2}));
+  EXPECT_EQ(store.countQueued(), 3U);
+}
+
+TEST_F(SyncStoreTest, whatChangesWhileItIsSentStaysQueued) {
+  store.enqueue(1, false, false);
+  const QueuedUpload sent = *store.queued(1);
+  store.enqueue(1, false, false);
+  store.uploaded(sent);
+  ASSERT_TRUE(store.queued(1));
+  EXPECT_EQ(store.queued(1)->generation, sent.generation + 1);
+  store.uploaded(*store.queued(1));
+  EXPECT_FALSE(store.queued(1));
+}
+
+TEST_F(SyncStoreTest, aFailedUploadWaitsAndKeepsItsError) {
+  store.enqueue(1, false, false);
+  const NSError error = CKErrorMake(CKErrorCode::quotaExceeded, "full");
+  store.uploadFailed(*store.queued(1), error, 2000);
+  EXPECT_EQ(due(1999), Items());
+  EXPECT_EQ(due(2000), Items{1});
+  const QueuedUpload failed = *store.queued(1);
+  EXPECT_EQ(failed.attempts, 1);
+  EXPECT_TRUE(CKErrorIs(failed.error, CKErrorCode::quotaExceeded));
+  EXPECT_EQ(failed.error.localizedDescription(), "full");
+  EXPECT_EQ(store.nextRetry(), 2000);
+  EXPECT_EQ(store.countFailed(), 1U);
+}
+
+TEST_F(SyncStoreTest, whatOnlyWaitsForSomethingElseHasNotFailed) {
+  store.enqueue(1, false, false);
+  store.uploadFailed(*store.queued(1), NSError(), 2000);
+  EXPECT_EQ(due(1999), Items());
+  EXPECT_EQ(store.queued(1)->attempts, 0);
+  EXPECT_FALSE(store.queued(1)->error);
+  EXPECT_EQ(store.countFailed(), 0U);
+}
+
+TEST_F(SyncStoreTest, aFailureOfAnOlderStateIsNotOneOfTheNewer) {
+  store.enqueue(1, false, false);
+  const QueuedUpload old = *store.queued(1);
+  store.enqueue(1, false, false);
+  store.uploadFailed(old, CKErrorMake(CKErrorCode::internalError, ""), 2000);
+  EXPECT_FALSE(store.queued(1)->error);
+  EXPECT_EQ(due(), Items{1});
+}
+
+TEST_F(SyncStoreTest, anotherChangeForgetsTheFailure) {
+  store.enqueue(1, false, false);
+  store.uploadFailed(*store.queued(1), CKErrorMake(CKErrorCode::internalError, ""), 2000);
+  store.enqueue(1, false, false);
+  EXPECT_FALSE(store.queued(1)->error);
+  EXPECT_EQ(store.queued(1)->attempts, 0);
+  EXPECT_EQ(due(), Items{1});
+}
+
+TEST_F(SyncStoreTest, retriesCanBeMadeDueAtOnce) {
+  for (const ItemNumber item : {1, 2}) {
+    store.enqueue(item, false, false);
+    store.uploadFailed(*store.queued(item), CKErrorMake(CKErrorCode::internalError, ""), 2000);
+  }
+  store.retryNow(2);
+  EXPECT_EQ(due(), Items{2});
+  store.retryAllNow();
+  EXPECT_EQ(due(), (Items{1, 2}));
+}
+
+TEST_F(SyncStoreTest, aRetryOfAnotherYearIsDue) {
+  constexpr std::int64_t kYear = 31'536'000'000;
+  store.enqueue(1, false, false);
+  store.uploadFailed(*store.queued(1), NSError(), 1000 + kYear);
+  EXPECT_EQ(due(1000), Items{1});
+}
+
+TEST_F(SyncStoreTest, heldDeletionsAreNotDueUntilTheyAreReleased) {
+  store.enqueue(1, true, true);
+  store.enqueue(2, true, false);
+  store.enqueue(3, false, false);
+  EXPECT_EQ(due(), (Items{2, 3}));
+  EXPECT_EQ(store.countHeld(), 1U);
+  EXPECT_EQ(store.countDeletions(), 2U);
+  store.holdDeletions();
+  EXPECT_EQ(due(), Items{3});
+  EXPECT_EQ(store.held(100).size(), 2U);
+  store.releaseHeld();
+  EXPECT_EQ(due(), (Items{1, 2, 3}));
+}
+
+TEST_F(SyncStoreTest, aDeletionCanBePutOff) {
+  store.enqueue(1, true, false, 1500);
+  EXPECT_EQ(due(1499), Items());
+  EXPECT_EQ(store.nextRetry(), 1500);
+  store.retryAllNow();
+  EXPECT_EQ(due(1499), Items()) << "it waits to see whether more is deleted, not for the cloud";
+  EXPECT_EQ(due(1500), Items{1});
+}
+
+TEST_F(SyncStoreTest, orphansAreFetchedWhenTheirParentCame) {
+  store.keepOrphan("a", "p");
+  store.keepOrphan("b", "p");
+  store.keepOrphan("c", "q");
+  EXPECT_EQ(store.countOrphans(), 3U);
+  EXPECT_EQ(store.fetchOrphansOf("p"), 2U);
+  EXPECT_EQ(store.toFetch(100), (std::vector<std::string>{"a", "b"}));
+  EXPECT_EQ(store.toFetch(1).size(), 1U);
+  store.fetched("a");
+  store.fetchAgain("d");
+  EXPECT_EQ(store.toFetch(100), (std::vector<std::string>{"b", "d"}));
+  EXPECT_EQ(store.countOrphans(), 1U);
+}
+
+TEST_F(SyncStoreTest, aRecordThatLostItsParentAgainIsAnOrphanAndNotFetched) {
+  store.fetchAgain("a");
+  store.keepOrphan("a", "p");
+  store.fetched("a");
+  EXPECT_EQ(store.countOrphans(), 1U);
+  EXPECT_TRUE(store.toFetch(100).empty());
+}
+
+TEST_F(SyncStoreTest, pinsStayWhileTheirItemsDo) {
+  store.setPinned(5, true);
+  store.setPinned(5, true);
+  EXPECT_TRUE(store.isPinned(5));
+  EXPECT_EQ(store.pins(), Items{5});
+  store.setPinned(5, false);
+  EXPECT_FALSE(store.isPinned(5));
+}
+
+TEST_F(SyncStoreTest, afterUnbindingRowsHaveNoItemsAndNothingIsQueued) {
+  store.put(row("r", 7));
+  store.put(row("unsent", 8, ""));
+  store.enqueue(7, false, false);
+  store.unbindAll();
+  EXPECT_EQ(store.byRecord("r")->item, 0U);
+  EXPECT_FALSE(store.byRecord("unsent")) << "its item is sent again, with a record of its own";
+  EXPECT_EQ(store.countQueued(), 0U);
+  EXPECT_EQ(store.unboundInCloud(), std::vector<std::string>{"r"});
+}
+
+TEST_F(SyncStoreTest, pinsFollowTheirRecordsToOtherItems) {
+  store.put(row("r", 7));
+  store.setPinned(7, true);
+  store.setPinned(9, true);  // nothing in the cloud
+  store.unbindAll();
+  EXPECT_TRUE(store.pins().empty()) << "the numbers belong to other items now";
+  SyncRow found = *store.byRecord("r");
+  found.item = 70;
+  store.put(found);
+  EXPECT_EQ(store.pins(), Items{70});
+  store.unbindAll();
+  found.item = 71;
+  store.put(found);
+  EXPECT_EQ(store.pins(), Items{71});
+}
+
+TEST_F(SyncStoreTest, savesOfUnknownOutcomeAreRemembered) {
+  EXPECT_FALSE(store.wasSent("r", "one"));
+  store.noteSent("r", "one");
+  store.noteSent("r", "one");
+  store.noteSent("r", "two");
+  EXPECT_TRUE(store.wasSent("r", "one"));
+  EXPECT_TRUE(store.wasSent("r", "two"));
+  EXPECT_FALSE(store.wasSent("other", "two"));
+  store.forgetSent("r");
+  EXPECT_FALSE(store.wasSent("r", "one"));
+}
+
+TEST_F(SyncStoreTest, aTransactionThatThrowsLeavesNothing) {
+  EXPECT_THROW(store.transaction([&] {
+    store.put(row("r", 7));
+    store.transaction([&] { store.enqueue(7, false, false); });
+    throw SqlError(1, "no");
+  }),
+               SqlError);
+  EXPECT_FALSE(store.byRecord("r"));
+  EXPECT_FALSE(store.queued(7));
+  store.transaction([&] { store.put(row("r", 7)); });
+  EXPECT_TRUE(store.byRecord("r"));
+}
+
+TEST_F(SyncStoreTest, everythingIsThereAfterOpeningItAgain) {
+  store.put(row("r", 7));
+  store.enqueue(7, true, true);
+  store.setNumber("rank", 12);
+  store.setText("token", std::string("\0\1", 2));
+  SyncStore again(path);
+  EXPECT_TRUE(again.byRecord("r"));
+  EXPECT_EQ(again.countHeld(), 1U);
+  EXPECT_EQ(again.number("rank"), 12U);
+  EXPECT_EQ(again.text("token"), std::string("\0\1", 2));
+}
+
+TEST_F(SyncStoreTest, onlyRecordsWithATagAreInTheCloud) {
+  store.put(row("sent", 1));
+  store.put(row("unsent", 2, ""));
+  EXPECT_EQ(store.recordsInCloud(), std::vector<std::string>{"sent"});
+  EXPECT_EQ(store.countRows(), 2U);
+}
+
+}  // namespace
+}  // namespace droxa::keld
