@@ -23,7 +23,7 @@ using Words = std::vector<std::string>;
 class Contents : public ::testing::Test, protected CommandFixture {
  protected:
   Contents() {
-    std::string path = ::testing::TempDir() + "/droxa-contents-XXXXXX";
+    std::string path = ::testing::TempDir() + "droxa-contents-XXXXXX";
     root = mkdtemp(path.data());
     keld = FakeDaemon::make(root / "replica");
     connection = std::make_shared<FakeDaemonConnection>(keld);

@@ -24,7 +24,7 @@ using namespace std::chrono_literals;
 class Setup : public ::testing::Test {
  protected:
   Setup() {
-    std::string path = ::testing::TempDir() + "/droxa-cli-XXXXXX";
+    std::string path = ::testing::TempDir() + "droxa-cli-XXXXXX";
     root = mkdtemp(path.data());
   }
   ~Setup() override { fs::remove_all(root); }
