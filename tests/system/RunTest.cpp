@@ -84,7 +84,9 @@ TEST_F(Run, twoHomesOnOneCloudAreTwoDevices) {
   ASSERT_TRUE(drive.waitForName("Recipes"));
   ASSERT_EQ(drive.droxa({"wait"}).status, 0);
   const auto second = other.droxaInBackground({"run", "--cloud", cloud, "--device", "second"}, "run");
-  ASSERT_TRUE(other.waitForName("Recipes")) << second->output() << second->errors();
+  ASSERT_TRUE(eventually([&] { return second->output().find("next:") != std::string::npos; }, 60s))
+      << second->output() << second->errors();
+  ASSERT_TRUE(other.waitForName("Recipes"));
   EXPECT_NE(other.droxa({"status"}).output.find("second"), std::string::npos);
   ASSERT_TRUE(other.waitForName("Welcome.txt"));
   EXPECT_EQ(other.droxa({"cat", "Welcome.txt"}).output, readFile(drive.documents() + "/Welcome.txt"));
