@@ -23,6 +23,7 @@ struct CommandContext {
   std::chrono::milliseconds timeout{30'000};
   // Waits for Ctrl-C or SIGTERM, at most that long; true when one came. For the commands that stay.
   std::function<bool(std::chrono::milliseconds)> waitForStop;
+  bool isTerminal = false;  // `out` is shown to a person as it is written
 };
 
 // Says on the error output what went wrong with `asked`; gives the exit status for it.

@@ -2,9 +2,12 @@
 
 #include <CLI/CLI.hpp>
 #include <cmath>
+#include <iostream>
 #include <signal.h>
+#include <unistd.h>
 
 #include "cli/Commands.h"
+#include "cli/ContentsCommands.h"
 #include "cli/ExitStatus.h"
 #include "cli/ItemArgument.h"
 #include "cli/Run.h"
@@ -18,8 +21,11 @@ namespace {
 constexpr char kFooter[] =
     "Names are printed with control characters, bytes that aren't UTF-8 and backslashes escaped\n"
     "(\"\\n\", \"\\xff\", \"\\\\\"); `ls -0` prints them raw, each ended by a NUL byte.\n"
-    "Exit status: 0 done, 1 failed, 2 wrong usage, 66 no such item, 69 a part of the system doesn't run,\n"
-    "75 no answer in time, 77 nobody is signed in or it may not be read.";
+    "Exit status: 0 done, 1 failed or refused, 2 wrong usage, 66 no such item, 69 a part of the system\n"
+    "doesn't run, 73 the disk or the cloud is full, 74 the disk failed, 75 no answer in time or the cloud\n"
+    "can't be reached, 77 nobody is signed in or it may not be read, 78 the home's drive is in another "
+    "cloud,\n"
+    "130 Ctrl-C.";
 
 // What the words of the command line mean.
 struct Words {
@@ -30,7 +36,8 @@ struct Words {
   std::size_t depth = 0;
   std::string argument;
   std::string name;
-  std::string folder;
+  std::vector<std::string> items;
+  std::string folder, cloud, device;
   bool json = false;
 };
 
@@ -38,7 +45,8 @@ struct Words {
 class CommandLine {
  public:
   explicit CommandLine(Words &words)
-      : words_(words), app_("Shows a Droxa drive: its items, their changes, and what serves it.", "droxa") {
+      : words_(words),
+        app_("Shows a Droxa drive: its items, their contents and changes, and what serves it.", "droxa") {
     app_.require_subcommand(1);
     app_.fallthrough();
     app_.footer(kFooter);
@@ -50,10 +58,12 @@ class CommandLine {
         ->check(CLI::Range(0.001, 86400.0));
     addLs();
     addItemCommands();
+    contents_.emplace(app_);
     addSystemCommands();
   }
 
   CLI::App &app() { return app_; }
+  const ContentsCommands &contents() const { return *contents_; }
   bool has(const char *command) const { return app_.got_subcommand(command); }
   bool hasAccount(const char *command) const { return account_->got_subcommand(command); }
   bool hasDepth() const { return depth_->count() > 0; }
@@ -63,8 +73,11 @@ class CommandLine {
     CLI::App *ls = add("ls", "Lists a folder, page by page");
     ls->add_option("item", words_.ls.argument,
                    std::string("The folder: ") + kItemArgumentHelp + " (default: the root)");
-    ls->add_flag("-l,--long", words_.ls.isLong,
-                 "Permissions, size in bytes, date of change, identifier and name");
+    ls->add_flag(
+        "-l,--long", words_.ls.isLong,
+        "Permissions, where the contents are, size in bytes, date of change, identifier and name.\n"
+        "Contents: \"c\" in the cloud alone, \"-\" here and in the cloud, \"u\" here and not yet in\n"
+        "the cloud, \"x\" excluded from sync, \".\" none of its own (folders, links)");
     ls->add_option_function<std::string>(
           "--sort", [this](const std::string &order) { words_.ls.byDate = order == "date"; },
           "By name (bytes), or by date, the newest first")
@@ -99,8 +112,12 @@ class CommandLine {
   }
 
   void addSystemCommands() {
-    add("status", "Shows what runs, since when, ranks and counts")
-        ->add_flag("--json", words_.json, "One JSON object");
+    CLI::App *status =
+        add("status",
+            "Shows what runs, since when, the cloud, the transfers and counts; or, of each item\n"
+            "that is named, where its contents are and whether the cloud has them");
+    status->add_flag("--json", words_.json, "One JSON object, and one for each item");
+    status->add_option("item", words_.items, kItemArgumentHelp);
     account_ = add("account", "Shows, signs in or signs out the account");
     account_->add_subcommand("show", "Shows who is signed in")
         ->fallthrough()
@@ -109,14 +126,30 @@ class CommandLine {
                 "The account's name", &words_.name)
         ->required();
     account_->add_subcommand("sign-out", "Signs out")->fallthrough();
-    addArgument(
+    addRun();
+  }
+
+  void addRun() {
+    CLI::App *run =
         add("run",
             "Serves the drive in the foreground: starts keld, fileproviderd and the extension, and\n"
-            "keeps them running until Ctrl-C"),
-        "folder",
-        "Serve a copy of this folder's documents, on a home of its own unless --home names one. The folder\n"
-        "is never written to. Default: a small sample drive, when the home is new",
+            "keeps them running until Ctrl-C");
+    addArgument(
+        run, "folder",
+        "Put this folder's documents into the drive's cloud first, on a home of its own unless --home\n"
+        "names one. The folder is never written to. Default: a small sample drive, when the home and its\n"
+        "cloud are new",
         &words_.folder);
+    run->add_option(
+           "--cloud", words_.cloud,
+           "The folder that the drive's cloud is in; several homes may share one, as devices of one\n"
+           "drive. The home remembers it (default: the home's own folder \"cloud\")")
+        ->envname("DROXA_CLOUD")
+        ->type_name("DIR");
+    run->add_option("--device", words_.device,
+                    "What this device is called, as conflict copies show it; remembered too (default: the\n"
+                    "machine's name)")
+        ->type_name("NAME");
   }
 
   CLI::App *add(const char *name, const char *description) {
@@ -129,6 +162,7 @@ class CommandLine {
 
   Words &words_;
   CLI::App app_;
+  std::optional<ContentsCommands> contents_;
   CLI::App *account_ = nullptr;
   CLI::Option *depth_ = nullptr;
 };
@@ -145,9 +179,12 @@ bool waitForStopSignal(std::chrono::milliseconds longest) {
 }
 
 int runCommand(const CommandLine &line, const Words &words, std::ostream &out, std::ostream &err) {
-  const std::optional<std::string> home = words.home.empty() ? std::nullopt : std::optional(words.home);
+  const auto given = [](const std::string &word) {
+    return word.empty() ? std::nullopt : std::optional(word);
+  };
+  const std::optional<std::string> home = given(words.home);
   if (line.has("run"))
-    return runRun(out, err, {home, words.folder.empty() ? std::nullopt : std::optional(words.folder)});
+    return runRun(out, err, {home, given(words.folder), given(words.cloud), given(words.device)});
 
   DroxaSetProcessHome(DroxaHome::resolve(home));
   const std::chrono::milliseconds timeout(std::llround(words.timeout * 1000));
@@ -158,7 +195,8 @@ int runCommand(const CommandLine &line, const Words &words, std::ostream &out, s
           std::make_shared<ControlConnectionOverXPC>(DroxaProcessHome().hostSocket(), timeout), timeout),
       QVDaemonConnection::defaultConnection(),
       timeout,
-      waitForStopSignal};
+      waitForStopSignal,
+      &out == &std::cout && isatty(STDOUT_FILENO) == 1};
   if (line.has("ls")) return runLs(context, words.ls);
   if (line.has("stat")) return runStat(context, words.argument, words.json);
   if (line.has("id")) return runId(context, words.argument);
@@ -168,11 +206,13 @@ int runCommand(const CommandLine &line, const Words &words, std::ostream &out, s
     if (line.hasDepth()) options.depth = words.depth;
     return runTree(context, options);
   }
-  if (line.has("watch")) {
-    waitForStopSignal(std::chrono::milliseconds(0));  // before there are threads that could take the signal
-    return runWatch(context, words.argument, words.json);
-  }
-  if (line.has("status")) return runStatus(context, words.json);
+  // Before there are threads that could take the signal.
+  if (line.has("watch") || line.contents().canBeStopped()) waitForStopSignal(std::chrono::milliseconds(0));
+  if (line.has("watch")) return runWatch(context, words.argument, words.json);
+  if (line.contents().isChosen()) return line.contents().run(context);
+  if (line.has("status"))
+    return words.items.empty() ? runStatus(context, words.json)
+                               : runItemStatus(context, words.items, words.json);
   if (line.hasAccount("sign-in")) return runAccountSignIn(context, words.name);
   if (line.hasAccount("sign-out")) return runAccountSignOut(context);
   return runAccountShow(context, words.json);

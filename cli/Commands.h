@@ -1,8 +1,10 @@
 #pragma once
 
+#include <chrono>
 #include <cstddef>
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "cli/CommandContext.h"
 
@@ -35,6 +37,25 @@ int runTree(CommandContext &context, const TreeOptions &options);
 int runWatch(CommandContext &context, const std::string &argument, bool json);
 
 int runStatus(CommandContext &context, bool json);
+// Of each item, instead of the system.
+int runItemStatus(CommandContext &context, const std::vector<std::string> &arguments, bool json);
+
+// The commands about contents; each takes folders too, but for the first two.
+int runCat(CommandContext &context, const std::vector<std::string> &arguments);
+int runOpen(CommandContext &context, const std::vector<std::string> &arguments, bool json);
+int runDownload(CommandContext &context, const std::vector<std::string> &arguments, bool json);
+int runEvict(CommandContext &context, const std::vector<std::string> &arguments, bool json);
+int runPin(CommandContext &context, const std::vector<std::string> &arguments, bool isPinned, bool json);
+
+struct WaitOptions {
+  std::vector<std::string> arguments;  // none: the whole drive
+  std::optional<std::chrono::milliseconds> timeout;
+  bool json = false;
+};
+int runWait(CommandContext &context, const WaitOptions &options);
+
+enum class DeletionsAnswer { none, carryOut, restore };
+int runDeletions(CommandContext &context, DeletionsAnswer answer, bool json);
 
 int runAccountShow(CommandContext &context, bool json);
 int runAccountSignIn(CommandContext &context, const std::string &name);

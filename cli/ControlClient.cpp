@@ -66,6 +66,17 @@ CallResult<std::shared_ptr<FPDWatch>> ControlClient::watch(const std::string &id
   });
 }
 
+CallResult<ControlClient::Provided> ControlClient::startProviding(const std::string &identifier,
+                                                                  std::uint64_t readingOptions) {
+  return ask<Provided>(*connecting_, timeout_, [&](FPDControlProtocol &control, auto slot) {
+    control.startProvidingItemWithIdentifier(
+        identifier, readingOptions,
+        [slot](const std::shared_ptr<FPDProviding> &providing, const NSURL &url, const NSError &error) {
+          slot->put({{providing, url}, error});
+        });
+  });
+}
+
 CallResult<ControlClient::Page> ControlClient::page(const Enumerator &enumerator, const NSData &page) {
   auto slot = std::make_shared<AnswerSlot<Page>>();
   enumerator->enumerateItems(

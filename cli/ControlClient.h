@@ -19,6 +19,11 @@ class ControlClient {
     NSFileProviderItems items;
     NSData next;
   };
+  // Contents on their way here.
+  struct Provided {
+    std::shared_ptr<FPDProviding> providing;
+    NSURL url;  // where they are when it has ended
+  };
   struct Changes {
     NSFileProviderItems updated;
     NSData anchor;
@@ -34,6 +39,8 @@ class ControlClient {
   CallResult<Enumerator> enumerator(const std::string &identifier);
   CallResult<std::shared_ptr<FPDWatch>> watch(const std::string &identifier,
                                               std::shared_ptr<FPDWatchObserver> observer);
+
+  CallResult<Provided> startProviding(const std::string &identifier, std::uint64_t readingOptions);
 
   CallResult<Page> page(const Enumerator &enumerator, const NSData &page);
   CallResult<NSData> anchor(const Enumerator &enumerator);

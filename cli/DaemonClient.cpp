@@ -1,7 +1,5 @@
 #include "cli/DaemonClient.h"
 
-#include "cli/Waiting.h"
-
 namespace droxa {
 
 DaemonClient::DaemonClient(std::shared_ptr<QVDaemonConnection> connection, std::chrono::milliseconds timeout)
@@ -18,13 +16,18 @@ NSError daemonIsAway(const NSError &cause) {
 }
 
 template <class Value, class Call>
-CallResult<Value> ask(QVDaemonConnection &connection, std::chrono::milliseconds timeout, Call call) {
+std::shared_ptr<AnswerSlot<Value>> begin(QVDaemonConnection &connection, Call call) {
   auto slot = std::make_shared<AnswerSlot<Value>>();
   const auto daemon = connection.remoteObjectProxyWithErrorHandler([slot](const NSError &error) {
     slot->put({{}, daemonIsAway(error)});
   });
   call(*daemon, slot);
-  return slot->wait(timeout);
+  return slot;
+}
+
+template <class Value, class Call>
+CallResult<Value> ask(QVDaemonConnection &connection, std::chrono::milliseconds timeout, Call call) {
+  return begin<Value>(connection, std::move(call))->wait(timeout);
 }
 
 }  // namespace
@@ -57,6 +60,64 @@ NSError DaemonClient::signOut() {
                      daemon.signOut([slot](const NSError &error) { slot->put({true, error}); });
                    })
       .error;
+}
+
+CallResult<std::vector<QVContainerDescription>> DaemonClient::containers() {
+  using Containers = std::vector<QVContainerDescription>;
+  return ask<Containers>(*connection_, timeout_, [](QVProtocol &daemon, auto slot) {
+    daemon.getContainers([slot](const Containers &containers, const NSError &error) {
+      slot->put({containers, error});
+    });
+  });
+}
+
+CallResult<QVContentsStatus> DaemonClient::contentsStatus(const NSURL &url) {
+  return ask<QVContentsStatus>(*connection_, timeout_, [&](QVProtocol &daemon, auto slot) {
+    daemon.getContentsStatusAtURL(url, [slot](const QVContentsStatus &status, const NSError &error) {
+      slot->put({status, error});
+    });
+  });
+}
+
+CallResult<QVTransferStatus> DaemonClient::transferStatus() {
+  return ask<QVTransferStatus>(*connection_, timeout_, [](QVProtocol &daemon, auto slot) {
+    daemon.getTransferStatus([slot](const QVTransferStatus &status, const NSError &error) {
+      slot->put({status, error});
+    });
+  });
+}
+
+NSError DaemonClient::setPinned(const NSURL &url, bool isPinned) {
+  return ask<bool>(*connection_, timeout_,
+                   [&](QVProtocol &daemon, auto slot) {
+                     daemon.setPinnedAtURL(url, isPinned, [slot](const NSError &error) {
+                       slot->put({true, error});
+                     });
+                   })
+      .error;
+}
+
+NSError DaemonClient::confirmDeletions(bool carryOut) {
+  return ask<bool>(
+             *connection_, timeout_,
+             [&](QVProtocol &daemon, auto slot) {
+               daemon.confirmDeletions(carryOut, [slot](const NSError &error) { slot->put({true, error}); });
+             })
+      .error;
+}
+
+std::shared_ptr<AnswerSlot<QVContentsResult>> DaemonClient::evict(const NSURL &url) {
+  return begin<QVContentsResult>(*connection_, [&](QVProtocol &daemon, auto slot) {
+    daemon.evictItemAtURL(url, [slot](const QVContentsResult &result, const NSError &error) {
+      slot->put({result, error});
+    });
+  });
+}
+
+std::shared_ptr<AnswerSlot<bool>> DaemonClient::waitForUpload(const NSURL &url) {
+  return begin<bool>(*connection_, [&](QVProtocol &daemon, auto slot) {
+    daemon.waitForUploadAtURL(url, [slot](const NSError &error) { slot->put({true, error}); });
+  });
 }
 
 }  // namespace droxa

@@ -3,8 +3,10 @@
 #include <chrono>
 #include <memory>
 #include <optional>
+#include <string>
+#include <vector>
 
-#include "cli/CallResult.h"
+#include "cli/Waiting.h"
 #include "tessaly/QVDaemonConnection.h"
 
 namespace droxa {
@@ -20,6 +22,16 @@ class DaemonClient {
   CallResult<Account> account();
   CallResult<Account> signIn(const std::string &name);
   NSError signOut();
+  CallResult<std::vector<QVContainerDescription>> containers();
+
+  CallResult<QVContentsStatus> contentsStatus(const NSURL &url);
+  CallResult<QVTransferStatus> transferStatus();
+  NSError setPinned(const NSURL &url, bool isPinned);
+  NSError confirmDeletions(bool carryOut);
+
+  // These take as long as they take: the answer is waited for by the caller.
+  std::shared_ptr<AnswerSlot<QVContentsResult>> evict(const NSURL &url);
+  std::shared_ptr<AnswerSlot<bool>> waitForUpload(const NSURL &url);  // nil: everything
 
  private:
   const std::shared_ptr<QVDaemonConnection> connection_;

@@ -3,7 +3,7 @@
 #include <filesystem>
 #include <fstream>
 
-#include "cli/DocumentCopy.h"
+#include "cli/ContentsText.h"
 #include "cli/SampleDrive.h"
 #include "cli/Text.h"
 
@@ -13,33 +13,29 @@ namespace {
 
 namespace fs = std::filesystem;
 
-constexpr int kMostReported = 5;
-
 // Nothing is in it, or it isn't there.
 bool isEmpty(const std::string &folder) {
   std::error_code code;
   return fs::directory_iterator(folder, code) == fs::directory_iterator();
 }
 
-bool fillFromFolder(const DroxaHome &home, const std::string &folder, std::ostream &err, std::string *summary,
-                    std::string *problem) {
-  int reported = 0;
-  DocumentCopy copy(home.root(), [&](const std::string &path, const std::string &reason) {
-    if (reported++ < kMostReported)
-      err << "droxa: left out " << escapedText(path) << ": " << reason << std::endl;
-  });
-  DocumentCopy::Result result;
-  if (!copy.copy(folder, documentsFolder(home.replica(), kDefaultContainer), &result, problem)) return false;
-  *summary = "a copy of " + countText(result.documents, "document") + " in " +
-             countText(result.folders, "folder") + " of " + escapedText(folder);
-  if (result.leftOut > 0) *summary += "; " + std::to_string(result.leftOut) + " things could not be copied";
-  return true;
+bool importFolder(const HomeSetupRequest &request, HomeSetup *setup, std::string *problem) {
+  const FolderImportResult result = request.import(*request.folder);
+  setup->isStopped = result.end == FolderImportResult::End::stopped;
+  if (result.end == FolderImportResult::End::failed)
+    *problem =
+        "can't put " + escapedText(*request.folder) + " into the cloud: " + escapedText(result.problem);
+  setup->summary = countText(result.documents, "document") + " in " + countText(result.folders, "folder") +
+                   " of " + escapedText(*request.folder) + ", " + bytesText(result.bytes) +
+                   " in the cloud alone until they are read";
+  if (result.leftOut > 0) setup->summary += "; " + std::to_string(result.leftOut) + " could not be read";
+  return result.end != FolderImportResult::End::failed;
 }
 
 }  // namespace
 
-std::optional<HomeSetup> setUpHome(const DroxaHome &home, const std::optional<std::string> &folder,
-                                   std::ostream &err, std::string *problem) {
+std::optional<HomeSetup> setUpHome(const DroxaHome &home, const HomeSetupRequest &request,
+                                   std::string *problem) {
   if (!home.create(problem)) return std::nullopt;
   // Stands for as long as the documents are being put in.
   const std::string marker = home.state() + "/filling";
@@ -49,13 +45,16 @@ std::optional<HomeSetup> setUpHome(const DroxaHome &home, const std::optional<st
                 (isEmpty(documentsFolder(home.replica(), kDefaultContainer)) && isEmpty(home.state()));
   if (!setup.isNew) {
     setup.summary = "as it was left";
-    if (folder) setup.summary += "; " + escapedText(*folder) + " is not copied again";
+    if (request.folder) setup.summary += "; " + escapedText(*request.folder) + " is not put in again";
     return setup;
   }
   std::ofstream(marker) << "1\n";
   if (!makeContainers(home.replica(), problem)) return std::nullopt;
-  if (folder) {
-    if (!fillFromFolder(home, *folder, err, &setup.summary, problem)) return std::nullopt;
+  if (request.folder) {
+    if (!importFolder(request, &setup, problem)) return std::nullopt;
+    if (setup.isStopped) return setup;
+  } else if (request.hasCloudOfOthers) {
+    setup.summary = "what the cloud has";
   } else {
     if (!makeSampleDrive(home.replica(), problem)) return std::nullopt;
     setup.summary = "a small sample drive";

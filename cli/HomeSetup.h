@@ -1,21 +1,30 @@
 #pragma once
 
+#include <functional>
 #include <optional>
-#include <ostream>
 #include <string>
 
+#include "cli/FolderImport.h"
 #include "platform/foundation/Paths.h"
 
 namespace droxa {
 
 struct HomeSetup {
-  bool isNew = false;   // documents were put into it now
-  std::string summary;  // one line about where its documents come from
+  bool isNew = false;      // documents were put into it, or its cloud, now
+  bool isStopped = false;  // by Ctrl-C, in the middle
+  std::string summary;     // one line about where its documents come from
 };
 
-// Makes the home, and fills it when it is new: with a copy of `folder`'s documents, else with the sample
-// drive. A home whose filling was cut off counts as new. nullopt with `problem` when that isn't possible.
-std::optional<HomeSetup> setUpHome(const DroxaHome &home, const std::optional<std::string> &folder,
-                                   std::ostream &err, std::string *problem);
+struct HomeSetupRequest {
+  std::optional<std::string> folder;  // whose documents go into the cloud
+  bool hasCloudOfOthers = false;      // the cloud has documents already: no sample drive then
+  std::function<FolderImportResult(const std::string &folder)> import;
+};
+
+// Makes the home, and when it is new gives it something to show: the folder's documents, else what the cloud
+// has, else the sample drive. A home whose filling was cut off counts as new. nullopt with `problem` when
+// that isn't possible.
+std::optional<HomeSetup> setUpHome(const DroxaHome &home, const HomeSetupRequest &request,
+                                   std::string *problem);
 
 }  // namespace droxa

@@ -29,6 +29,14 @@ std::string modeText(const NSFileProviderItemFields &item) {
   return text;
 }
 
+// Where a document's contents are; "." for what has none of its own.
+char contentsMark(const NSFileProviderItemFields &item) {
+  if (item.kind != NSFileProviderItemKind::document) return '.';
+  if (item.isExcludedFromSync) return 'x';
+  if (!item.isDownloaded) return 'c';
+  return item.isUploaded ? '-' : 'u';
+}
+
 Json dateJSON(const NSDate &date) {
   return date ? Json(isoTimeText(date.nanosecondsSince1970())) : Json(nullptr);
 }
@@ -114,7 +122,8 @@ std::string kindText(NSFileProviderItemKind kind) {
 }
 
 std::string longLine(const NSFileProviderItemFields &item) {
-  return modeText(item) + " " + padded(std::to_string(item.documentSize), 12, true) + "  " +
+  return modeText(item) + " " + contentsMark(item) + " " +
+         padded(std::to_string(item.documentSize), 12, true) + "  " +
          padded(localTimeText(item.contentModificationDate.nanosecondsSince1970()), 16, false) + "  " +
          padded(item.itemIdentifier, 8, false) + "  " + escapedText(item.filename);
 }

@@ -1,6 +1,7 @@
 #include "cli/Run.h"
 
 #include <filesystem>
+#include <iostream>
 #include <pwd.h>
 #include <sysexits.h>
 #include <unistd.h>
@@ -8,6 +9,7 @@
 #include "cli/ControlClient.h"
 #include "cli/DaemonClient.h"
 #include "cli/ExitStatus.h"
+#include "cli/HomeCloud.h"
 #include "cli/HomeSetup.h"
 #include "cli/SampleDrive.h"
 #include "cli/Supervisor.h"
@@ -48,10 +50,11 @@ std::string quoted(const std::string &word) {
 // One run of `droxa run`.
 class Run {
  public:
-  Run(std::ostream &out, std::ostream &err, DroxaHome home)
+  Run(std::ostream &out, std::ostream &err, DroxaHome home, HomeCloud cloud)
       : out_(out),
         err_(err),
         home_(std::move(home)),
+        cloud_(std::move(cloud)),
         supervisor_(err),
         daemon_(QVDaemonConnection::defaultConnection(), 2s) {}
 
@@ -75,7 +78,10 @@ class Run {
   void printNextSteps() {
     const std::string droxa = quoted(programBeside("droxa")) + " --home " + quoted(home_.root());
     out_ << "files:  " << documentsFolder(home_.replica(), kDefaultContainer) << "\n"
+         << "cloud:  " << cloudFolder(home_, cloud_) << "\n"
          << "next:   " << droxa << " ls -l\n"
+         << "        " << droxa << " cat PATH\n"
+         << "        " << droxa << " download /\n"
          << "        " << droxa << " watch /\n"
          << "        " << droxa << " status\n";
     out_.flush();
@@ -85,23 +91,24 @@ class Run {
   enum class Outcome { ready, stopped, failed };
 
   Outcome startAll(bool isNew, std::string *problem) {
-    if (!add("keld", problem)) return Outcome::failed;
+    if (!add("keld", cloud_.keldOptions(), problem)) return Outcome::failed;
     Outcome outcome = await([this] { return !daemon_.status().error; }, problem);
     if (outcome != Outcome::ready) return outcome;
     if (isNew && !signInSomebody(problem)) return Outcome::failed;
-    if (!add("fileproviderd", problem)) return Outcome::failed;
+    if (!add("fileproviderd", {}, problem)) return Outcome::failed;
     outcome = await([this] { return hostAnswers(); }, problem);
     return outcome;
   }
 
-  bool add(const std::string &name, std::string *problem) {
+  bool add(const std::string &name, const std::vector<std::string> &options, std::string *problem) {
     const std::string program = programBeside(name.c_str());
     if (access(program.c_str(), X_OK) != 0) {
       *problem = "there is no program " + program;
       return false;
     }
-    return supervisor_.add(
-        ChildProcess(name, {program, "--home", home_.root()}, home_.logs() + "/" + name + ".log"), problem);
+    std::vector<std::string> command{program, "--home", home_.root()};
+    command.insert(command.end(), options.begin(), options.end());
+    return supervisor_.add(ChildProcess(name, command, home_.logs() + "/" + name + ".log"), problem);
   }
 
   // Until `isReady` holds, with the children looked after meanwhile.
@@ -150,10 +157,33 @@ class Run {
   std::ostream &out_;
   std::ostream &err_;
   const DroxaHome home_;
+  const HomeCloud cloud_;
   Supervisor supervisor_;
   DaemonClient daemon_;
   FPDStatus hostStatus_;
 };
+
+// A cloud that isn't there yet is made by keld; one that is there has what others put into it.
+bool hasCloud(const DroxaHome &home, const HomeCloud &cloud) {
+  std::error_code code;
+  const fs::directory_iterator entries(cloudFolder(home, cloud), code);
+  return !code && entries != fs::directory_iterator();
+}
+
+std::optional<HomeSetup> setUp(const DroxaHome &home, const HomeCloud &cloud,
+                               const std::optional<std::string> &folder, std::ostream &out, std::ostream &err,
+                               std::string *problem) {
+  HomeSetupRequest request;
+  request.folder = folder;
+  request.hasCloudOfOthers = hasCloud(home, cloud);
+  request.import = [&](const std::string &source) {
+    std::vector<std::string> command{programBeside("keld"), "--home", home.root(), "--import", source};
+    const auto options = cloud.keldOptions();
+    command.insert(command.end(), options.begin(), options.end());
+    return runFolderImport(command, &out == &std::cout && isatty(STDOUT_FILENO) == 1, out, err);
+  };
+  return setUpHome(home, request, problem);
+}
 
 }  // namespace
 
@@ -191,22 +221,26 @@ int runRun(std::ostream &out, std::ostream &err, const RunOptions &options) {
   DroxaSetProcessHome(home);
   blockSupervisorSignals();
 
+  const auto fail = [&err, &problem](int status) {
+    err << "droxa: " << problem << std::endl;
+    return status;
+  };
+  const auto cloud = resolveHomeCloud(home, options.cloud, options.device, &problem);
+  if (!cloud) return fail(EX_CONFIG);
   int holder = 0;
   const auto lock = ProcessLock::acquire(home.run() + "/droxa-run.pid", &holder, &problem);
-  Run run(out, err, home);
+  Run run(out, err, home, *cloud);
   if (!lock && holder != 0) {
     out << "drive:  " << home.root() << " runs already, under process " << holder << "\n";
     run.printNextSteps();
     return kExitSuccess;
   }
-  if (!lock) {
-    err << "droxa: " << problem << std::endl;
-    return EX_CANTCREAT;
-  }
-  const auto setup = setUpHome(home, folder, err, &problem);
-  if (!setup) {
-    err << "droxa: " << problem << std::endl;
-    return EX_CANTCREAT;
+  if (!lock || !rememberHomeCloud(home, *cloud, &problem)) return fail(EX_CANTCREAT);
+  const auto setup = setUp(home, *cloud, folder, out, err, &problem);
+  if (!setup) return fail(EX_CANTCREAT);
+  if (setup->isStopped) {
+    err << "droxa: stopped; the same command goes on with " << escapedText(*folder) << std::endl;
+    return kExitInterrupted;
   }
   return run.serve(*setup);
 }

@@ -10,7 +10,9 @@ namespace droxa {
 
 struct RunOptions {
   std::optional<std::string> home;
-  std::optional<std::string> folder;
+  std::optional<std::string> folder;  // whose documents go into the cloud
+  std::optional<std::string> cloud;   // the folder that the drive's cloud is in
+  std::optional<std::string> device;
 };
 
 // `droxa run`: serves a drive in the foreground until Ctrl-C. Gives the exit status.

@@ -2,6 +2,7 @@
 #include <sysexits.h>
 
 #include "cli/Commands.h"
+#include "cli/ContentsText.h"
 #include "cli/DaemonClient.h"
 #include "cli/ExitStatus.h"
 #include "cli/Text.h"
@@ -17,6 +18,7 @@ using Json = nlohmann::ordered_json;
 struct SystemStatus {
   CallResult<QVDaemonStatus> daemon;
   CallResult<DaemonClient::Account> account;
+  CallResult<QVTransferStatus> transfers;
   CallResult<FPDStatus> host;
   bool isWhole() const { return !daemon.error && !host.error; }
 };
@@ -26,9 +28,11 @@ SystemStatus gather(CommandContext &context) {
   SystemStatus status;
   status.daemon = daemon.status();
   if (status.daemon.error) {
-    status.account.error = status.daemon.error;  // the same wait twice would tell nothing new
+    // The same wait again would tell nothing new.
+    status.account.error = status.transfers.error = status.daemon.error;
   } else {
     status.account = daemon.account();
+    status.transfers = daemon.transferStatus();
   }
   status.host = context.host->status();
   return status;
@@ -136,6 +140,8 @@ std::string statusJSON(const SystemStatus &status) {
   json["keld"] = daemonJSON(status.daemon);
   json["account"] =
       !status.account.error && status.account.value ? Json(status.account.value->name) : Json(nullptr);
+  json["transfers"] =
+      status.transfers.error ? Json(nullptr) : Json::parse(transferJSON(status.transfers.value));
   json["fileproviderd"] = hostJSON(status.host);
   json["extension"] = extensionJSON(status.host);
   return json.dump(-1, ' ', false, Json::error_handler_t::replace);
@@ -150,6 +156,7 @@ int runStatus(CommandContext &context, bool json) {
   } else {
     printDaemon(context.out, status.daemon);
     printAccount(context.out, status.account);
+    if (!status.transfers.error) context.out << transferLines(status.transfers.value);
     printHost(context.out, status.host);
   }
   context.out.flush();

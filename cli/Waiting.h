@@ -22,13 +22,18 @@ class AnswerSlot {
     answered_.notify_all();
   }
 
-  // NSXPCConnectionReplyInvalid when there is none in time.
-  CallResult<Value> wait(std::chrono::milliseconds timeout) {
+  // The answer, if there is one in time.
+  std::optional<CallResult<Value>> waitFor(std::chrono::milliseconds timeout) {
     const auto until = std::chrono::steady_clock::now() + timeout;
     Lock held(lock_);
     while (!result_)
       if (answered_.wait_until(held, until) == std::cv_status::timeout) break;
-    if (result_) return *result_;
+    return result_;
+  }
+
+  // NSXPCConnectionReplyInvalid when there is none in time.
+  CallResult<Value> wait(std::chrono::milliseconds timeout) {
+    if (auto result = waitFor(timeout)) return *result;
     return {{}, NSError(NSCocoaErrorDomain, NSXPCConnectionReplyInvalid)};
   }
 

@@ -146,7 +146,7 @@ NSError ContentsService::evict(const ItemRecord &document, std::uint64_t *bytes)
   if (!row || row->tag.empty() || !isSyncedItem(location->item)) return unsent;
   if (const auto queued = engine_->store().queued(document.id); queued && !queued->isDeletion) return unsent;
   const DocumentLook look = engine_->storage().classify(location->folder.get(), location->name);
-  if (look.kind == DocumentClass::dataless) return NSError();
+  if (look.kind == DocumentClass::dataless || look.facts.size == 0) return NSError();  // nothing to let go of
   if (!cloudHasContents(*location, *row, look)) return unsent;
   DocumentMarker marker = look.marker ? *look.marker : DocumentMarker();
   marker.recordName = row->record;

@@ -8,7 +8,8 @@
 
 #include "cli/ChildProcess.h"
 #include "cli/CommandLine.h"
-#include "cli/DocumentCopy.h"
+#include "cli/FolderImport.h"
+#include "cli/HomeCloud.h"
 #include "cli/HomeSetup.h"
 #include "cli/Run.h"
 #include "cli/SampleDrive.h"
@@ -23,7 +24,7 @@ using namespace std::chrono_literals;
 class Setup : public ::testing::Test {
  protected:
   Setup() {
-    std::string path = ::testing::TempDir() + "/droxa-cli-XXXXXX";
+    std::string path = ::testing::TempDir() + "droxa-cli-XXXXXX";
     root = mkdtemp(path.data());
   }
   ~Setup() override { fs::remove_all(root); }
@@ -40,12 +41,24 @@ class Setup : public ::testing::Test {
   DroxaHome home() const { return DroxaHome((root / "home").native()); }
   fs::path documents() const { return documentsFolder(home().replica(), kDefaultContainer); }
   std::optional<HomeSetup> setUp(const std::optional<std::string> &folder = {}) {
-    return setUpHome(home(), folder, err, &problem);
+    HomeSetupRequest request;
+    request.folder = folder;
+    request.hasCloudOfOthers = hasCloudOfOthers;
+    request.import = [this](const std::string &asked) {
+      imported.push_back(asked);
+      markerStood = fs::exists(home().state() + "/filling");
+      return importEnds;
+    };
+    return setUpHome(home(), request, &problem);
   }
 
   fs::path root;
   std::ostringstream err;
   std::string problem;
+  bool hasCloudOfOthers = false;
+  FolderImportResult importEnds{FolderImportResult::End::done, 4, 2, 1'400'000, 0, ""};
+  std::vector<std::string> imported;
+  bool markerStood = false;
 };
 
 TEST_F(Setup, aNewHomeGetsTheSampleDrive) {
@@ -77,42 +90,115 @@ TEST_F(Setup, aFillingThatWasCutOffIsGoneOnWith) {
   EXPECT_FALSE(fs::exists(home().state() + "/filling"));
 }
 
-TEST_F(Setup, aFoldersDocumentsAreCopied) {
-  const fs::path source = root / "source";
-  write(source / "a.txt", "one");
-  write(source / "inner/deep/b.txt", std::string(300'000, 'b'));
-  write(source / "\xff\nname", "odd");
-  fs::create_symlink("a.txt", source / "link");
-  ::mkfifo((source / "pipe").c_str(), 0600);
-  const auto time = fs::last_write_time(source / "a.txt") - 24h;
-  fs::last_write_time(source / "a.txt", time);
-  const auto made = setUp(source.native());
+TEST_F(Setup, aFoldersDocumentsGoIntoTheCloudAndNotIntoTheReplica) {
+  write(root / "source/a.txt", "one");
+  const auto made = setUp(root / "source");
   ASSERT_TRUE(made) << problem;
-  EXPECT_EQ(read(documents() / "a.txt"), "one");
-  EXPECT_EQ(fs::last_write_time(documents() / "a.txt"), time);
-  EXPECT_EQ(read(documents() / "inner/deep/b.txt"), std::string(300'000, 'b'));
-  EXPECT_EQ(read(documents() / "\xff\nname"), "odd");
-  EXPECT_EQ(fs::read_symlink(documents() / "link"), "a.txt");
-  EXPECT_FALSE(fs::exists(documents() / "pipe"));
-  EXPECT_NE(err.str().find("pipe: neither a file, a folder nor a symbolic link"), std::string::npos);
-  EXPECT_NE(made->summary.find("a copy of 4 documents in 2 folders"), std::string::npos) << made->summary;
+  EXPECT_EQ(imported, std::vector<std::string>{(root / "source").native()});
+  EXPECT_TRUE(markerStood);
+  EXPECT_TRUE(fs::is_empty(documents()));
+  EXPECT_NE(made->summary.find("4 documents in 2 folders of "), std::string::npos) << made->summary;
+  EXPECT_NE(made->summary.find("1.4 MB in the cloud alone"), std::string::npos) << made->summary;
 }
 
-TEST_F(Setup, aHomeInsideTheFolderIsntCopiedIntoItself) {
-  write(root / "a.txt", "one");
-  ASSERT_TRUE(setUp(root.native())) << problem;
-  EXPECT_TRUE(fs::exists(documents() / "a.txt"));
-  EXPECT_FALSE(fs::exists(documents() / "home"));
+TEST_F(Setup, anImportThatFailedOrWasStoppedIsDoneAgain) {
+  importEnds.end = FolderImportResult::End::failed;
+  importEnds.problem = "the cloud is full";
+  EXPECT_FALSE(setUp(root));
+  EXPECT_NE(problem.find("the cloud is full"), std::string::npos) << problem;
+  importEnds.end = FolderImportResult::End::stopped;
+  EXPECT_TRUE(setUp(root)->isStopped);
+  importEnds.end = FolderImportResult::End::done;
+  EXPECT_TRUE(setUp(root)->isNew);
+  EXPECT_EQ(imported.size(), 3U);
 }
 
-TEST_F(Setup, documentsThatAreThereAlreadyStay) {
-  write(root / "source/a.txt", "theirs");
-  write(root / "target/a.txt", "mine");
-  DocumentCopy copy("", [](const std::string &, const std::string &) {});
-  DocumentCopy::Result result;
-  EXPECT_TRUE(copy.copy(root / "source", root / "target", &result, &problem));
-  EXPECT_EQ(read(root / "target/a.txt"), "mine");
-  EXPECT_EQ(result.documents, 0U);
+TEST_F(Setup, aHomeThatIsntNewImportsNothing) {
+  ASSERT_TRUE(setUp());
+  const auto again = setUp(root);
+  ASSERT_TRUE(again);
+  EXPECT_TRUE(imported.empty());
+  EXPECT_NE(again->summary.find("is not put in again"), std::string::npos) << again->summary;
+}
+
+TEST_F(Setup, aHomeOnTheCloudOfOthersGetsNoSampleDrive) {
+  hasCloudOfOthers = true;
+  const auto made = setUp();
+  ASSERT_TRUE(made);
+  EXPECT_TRUE(made->isNew);
+  EXPECT_TRUE(fs::is_empty(documents()));
+}
+
+// A program that stands for the importing one.
+class Import : public Setup {
+ protected:
+  FolderImportResult import(const std::string &script, bool isTerminal = false) {
+    return runFolderImport({"/bin/sh", "-c", script}, isTerminal, out, err);
+  }
+  std::ostringstream out;
+};
+
+TEST_F(Import, countsWhatItIsToldAndPassesOnWhatIsLeftOut) {
+  const auto result = import(
+      "echo '1 documents, 0 folders, 5 bytes'; echo 'keld: left out a\tb: no' >&2;"
+      "echo '2 documents, 1 folders, 9 bytes'");
+  EXPECT_EQ(result.end, FolderImportResult::End::done);
+  EXPECT_EQ(result.documents, 2U);
+  EXPECT_EQ(result.folders, 1U);
+  EXPECT_EQ(result.bytes, 9U);
+  EXPECT_EQ(result.leftOut, 1U);
+  EXPECT_NE(err.str().find("droxa: left out a"), std::string::npos) << err.str();
+  EXPECT_EQ(out.str(), "") << "lines are for a terminal";
+}
+
+TEST_F(Import, showsHowFarItIsInOneLineOfATerminal) {
+  import("echo '1 documents, 0 folders, 5 bytes'", true);
+  EXPECT_EQ(out.str(), "\rinto the cloud: 1 document, 0 folders, 5 bytes\033[K\r\033[K");
+}
+
+TEST_F(Import, aFailureHasTheLastWordsOfTheProgram) {
+  const auto result = import("echo 'keld: the disk is full' >&2; exit 74");
+  EXPECT_EQ(result.end, FolderImportResult::End::failed);
+  EXPECT_EQ(result.problem, "the disk is full");
+  EXPECT_EQ(import("exit 3").problem, "keld ended with status 3");
+  EXPECT_EQ(runFolderImport({"/no/such/program"}, false, out, err).end, FolderImportResult::End::failed);
+}
+
+TEST_F(Setup, aHomeRemembersItsCloudAndItsDevice) {
+  ASSERT_TRUE(home().create(&problem));
+  const auto first = resolveHomeCloud(home(), root / "cloud", "laptop", &problem);
+  ASSERT_TRUE(first) << problem;
+  EXPECT_EQ(first->keldOptions(),
+            (std::vector<std::string>{"--cloud", (root / "cloud").native(), "--device", "laptop"}));
+  ASSERT_TRUE(rememberHomeCloud(home(), *first, &problem)) << problem;
+  const auto later = resolveHomeCloud(home(), {}, {}, &problem);
+  ASSERT_TRUE(later) << problem;
+  EXPECT_EQ(later->keldOptions(), first->keldOptions());
+}
+
+TEST_F(Setup, aDriveStaysInItsCloudOnceItWasServed) {
+  ASSERT_TRUE(home().create(&problem));
+  ASSERT_TRUE(rememberHomeCloud(home(), HomeCloud(), &problem));
+  EXPECT_TRUE(resolveHomeCloud(home(), root / "other", {}, &problem))
+      << "nothing was served yet: " << problem;
+  write(home().state() + "/sync.sqlite", "");
+  EXPECT_FALSE(resolveHomeCloud(home(), root / "other", {}, &problem));
+  EXPECT_NE(problem.find((root / "other").native()), std::string::npos) << problem;
+  EXPECT_NE(problem.find(home().root() + "/cloud"), std::string::npos) << problem;
+  EXPECT_TRUE(resolveHomeCloud(home(), home().root() + "/cloud/", {}, &problem)) << problem;
+}
+
+TEST_F(Setup, aCloudAmongTheDocumentsIsRefused) {
+  ASSERT_TRUE(home().create(&problem));
+  EXPECT_FALSE(resolveHomeCloud(home(), home().replica() + "/cloud", {}, &problem));
+  EXPECT_FALSE(resolveHomeCloud(home(), home().root(), {}, &problem));
+}
+
+TEST_F(Setup, aSettingThatCantBeReadIsNamed) {
+  ASSERT_TRUE(home().create(&problem));
+  write(home().configuration() + "/cloud.json", "no JSON");
+  EXPECT_FALSE(resolveHomeCloud(home(), {}, {}, &problem));
+  EXPECT_NE(problem.find("cloud.json"), std::string::npos) << problem;
 }
 
 TEST(Run, eachFolderHasAHomeOfItsOwn) {
@@ -159,7 +245,8 @@ class CommandLineTest : public Setup {
 };
 
 TEST_F(CommandLineTest, everyCommandHasHelp) {
-  for (const char *command : {"ls", "stat", "id", "url", "tree", "watch", "status", "account", "run"}) {
+  for (const char *command : {"ls", "stat", "id", "url", "tree", "watch", "status", "account", "run", "cat",
+                              "open", "download", "evict", "pin", "unpin", "wait", "deletions"}) {
     EXPECT_EQ(droxa({command, "--help"}), 0) << command;
     EXPECT_NE(out.str().find("Usage: "), std::string::npos) << command;
   }
@@ -176,7 +263,11 @@ TEST_F(CommandLineTest, wrongUsageEndsWith2) {
                                                     {"ls", "-0", "--json"},
                                                     {"stat"},
                                                     {"--timeout", "never", "ls"},
-                                                    {"account", "sign-in"}};
+                                                    {"account", "sign-in"},
+                                                    {"cat"},
+                                                    {"evict"},
+                                                    {"wait", "--timeout", "0"},
+                                                    {"deletions", "perhaps"}};
   for (const auto &words : wrong) EXPECT_EQ(droxa(words), 2) << (words.empty() ? "" : words.back());
 }
 

@@ -99,6 +99,43 @@ void ScriptedHost::watchContainer(const std::string &identifier, std::shared_ptr
   completion(std::make_shared<SilentWatch>(), NSError());
 }
 
+void ScriptedHost::startProvidingItemWithIdentifier(const std::string &identifier,
+                                                    std::uint64_t readingOptions,
+                                                    FPDItemProvidingCompletion completion) {
+  if (!urls.contains(identifier) || !provide) {
+    completion(nullptr, NSURL(), fileProviderErrorForNonExistentItemWithIdentifier(identifier));
+    return;
+  }
+  const NSURL url = NSURL::fileURLWithPath(urls[identifier]);
+  completion(provide(url, readingOptions), url, NSError());
+}
+
+void ScriptedProviding::waitWithReply(NSFileProviderErrorCompletion completion) {
+  std::optional<NSError> outcome;
+  {
+    const Lock held(lock_);
+    outcome = outcome_;
+    if (!outcome) waiting_ = std::move(completion);
+  }
+  if (outcome) completion(*outcome);
+}
+
+void ScriptedProviding::cancel() {
+  wasCancelled_ = true;
+  end(NSError(NSCocoaErrorDomain, NSUserCancelledError));
+}
+
+void ScriptedProviding::end(const NSError &error) {
+  NSFileProviderErrorCompletion completion;
+  {
+    const Lock held(lock_);
+    if (outcome_) return;
+    outcome_ = error;
+    completion.swap(waiting_);
+  }
+  if (completion) completion(error);
+}
+
 std::shared_ptr<FPDControlProtocol> ScriptedHostConnecting::control(NSXPCErrorHandler, NSError *error) {
   *error = failure;
   return failure ? nullptr : host_;

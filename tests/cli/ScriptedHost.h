@@ -5,12 +5,14 @@
 #include <functional>
 #include <map>
 #include <memory>
+#include <optional>
 #include <sstream>
 #include <string>
 #include <vector>
 
 #include "cli/Commands.h"
 #include "platform/fileprovider/NSFileProviderError.h"
+#include "platform/foundation/ThreadSafety.h"
 #include "tessaly/QVDaemonConnection.h"
 
 namespace droxa::testing {
@@ -31,11 +33,10 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
                               NSFileProviderEnumeratorCompletion completion) override;
   void watchContainer(const std::string &identifier, std::shared_ptr<FPDWatchObserver> observer,
                       FPDWatchCompletion completion) override;
+  // Fetches through `provide`, as the extension would.
+  void startProvidingItemWithIdentifier(const std::string &identifier, std::uint64_t readingOptions,
+                                        FPDItemProvidingCompletion completion) override;
   // No command asks for these.
-  void startProvidingItemWithIdentifier(const std::string &, std::uint64_t,
-                                        FPDItemProvidingCompletion completion) override {
-    completion(nullptr, NSURL(), NSError(NSPOSIXErrorDomain, ENOSYS));
-  }
   void startProvidingItemAtPath(const std::string &, std::uint64_t,
                                 FPDItemProvidingCompletion completion) override {
     completion(nullptr, NSURL(), NSError(NSPOSIXErrorDomain, ENOSYS));
@@ -53,9 +54,25 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
   std::map<std::string, Pages> listings;                  // by container
   std::map<std::string, NSError> pageErrors;              // by container: instead of the page after the last
   FPDStatus status;
+  std::function<std::shared_ptr<FPDProviding>(const NSURL &url, std::uint64_t readingOptions)> provide;
   std::function<void(const std::string &container, std::size_t page)> onPage;  // before it is answered
   std::shared_ptr<FPDWatchObserver> observer;
   bool firstPageWasByDate = false;
+};
+
+// A providing that ends when the test says, or as cancelled. Thread contract: any thread.
+class ScriptedProviding final : public FPDProviding {
+ public:
+  void waitWithReply(NSFileProviderErrorCompletion completion) override;
+  void cancel() override;
+  void end(const NSError &error);
+  bool wasCancelled() const { return wasCancelled_; }
+
+ private:
+  std::atomic<bool> wasCancelled_{false};
+  Mutex lock_;
+  std::optional<NSError> outcome_ GUARDED_BY(lock_);
+  NSFileProviderErrorCompletion waiting_ GUARDED_BY(lock_);
 };
 
 class ScriptedHostConnecting final : public ControlConnecting {

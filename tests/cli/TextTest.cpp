@@ -54,7 +54,7 @@ TEST(Text, times) {
 TEST(ItemText, theLongLineHasTypePermissionsSizeIdentifierAndName) {
   NSFileProviderItemFields fields = item("d12", "a\nb");
   fields.documentSize = 1234;
-  EXPECT_EQ(longLine(fields), "-rw-r--r--         1234  -                 d12       a\\nb");
+  EXPECT_EQ(longLine(fields), "-rw-r--r-- u         1234  -                 d12       a\\nb");
   EXPECT_EQ(longLine(folder("i3", "x")).substr(0, 1), "d");
   EXPECT_EQ(longLine(item("i3", "x", NSFileProviderItemKind::alias)).substr(0, 1), "@");
 }

@@ -60,8 +60,8 @@ void Drive::startHost() {
                                     home_ + "/output", "host" + std::to_string(runs_++));
 }
 
-void Drive::start() {
-  startKeld();
+void Drive::start(std::vector<std::string> keldOptions) {
+  startKeld(std::move(keldOptions));
   startHost();
   ASSERT_TRUE(eventually([this] { return droxa({"ls"}).status == 0; }, 60s))
       << droxa({"ls"}).errors << keld_->errors() << host_->errors();
@@ -75,6 +75,17 @@ Result Drive::droxa(std::vector<std::string> words, std::chrono::milliseconds de
 
 std::unique_ptr<Process> Drive::droxaInBackground(std::vector<std::string> words, const std::string &name) {
   return std::make_unique<Process>(command(std::move(words)), home_ + "/output", name);
+}
+
+void Drive::importFolder(const std::string &folder, std::vector<std::string> keldOptions) {
+  keldOptions.insert(keldOptions.begin(), {program("keld"), "--home", home_, "--import", folder});
+  Process import(keldOptions, home_ + "/output", "import" + std::to_string(runs_++));
+  ASSERT_EQ(import.wait(120s), 0) << import.errors();
+}
+
+nlohmann::json Drive::contents(const std::string &path) {
+  auto json = nlohmann::json::parse(droxa({"status", "--json", path}).output, nullptr, false);
+  return json.is_discarded() ? nlohmann::json::object() : json;
 }
 
 pid_t Drive::extensionPid() {
@@ -98,6 +109,13 @@ bool Drive::waitForName(const std::string &name, const std::string &path) {
   return eventually([&] {
     const std::vector<std::string> all = names(path);
     return std::find(all.begin(), all.end(), name) != all.end();
+  });
+}
+
+bool Drive::waitUntilGone(const std::string &name, const std::string &path) {
+  return eventually([&] {
+    const std::vector<std::string> all = names(path);
+    return std::find(all.begin(), all.end(), name) == all.end();
   });
 }
 

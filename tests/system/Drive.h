@@ -1,6 +1,7 @@
 #pragma once
 
 #include <memory>
+#include <nlohmann/json_fwd.hpp>
 #include <string>
 #include <vector>
 
@@ -21,7 +22,8 @@ class Drive {
   std::string documents() const;  // the folder that is the drive's root
   std::string container(const std::string &identifier) const;
 
-  void start();  // both daemons, and waits until a listing of the root succeeds
+  // Both daemons, and waits until a listing of the root succeeds.
+  void start(std::vector<std::string> keldOptions = {});
   void startKeld(std::vector<std::string> options = {});
   void startHost();
   Process &keld() { return *keld_; }
@@ -35,9 +37,15 @@ class Drive {
   // Starts it and leaves it running.
   std::unique_ptr<Process> droxaInBackground(std::vector<std::string> words, const std::string &name);
 
+  // Puts a folder's documents into the cloud that keld is started with by these options; not while it runs.
+  void importFolder(const std::string &folder, std::vector<std::string> keldOptions = {});
+  // What is at a path of the drive, as `droxa status --json` tells it; an empty object when there is nothing.
+  nlohmann::json contents(const std::string &path);
+
   // The names that `droxa ls` gives for a folder, exactly (separated by NUL on the way).
   std::vector<std::string> names(const std::string &path = "/");
   bool waitForName(const std::string &name, const std::string &path = "/");
+  bool waitUntilGone(const std::string &name, const std::string &path = "/");
 
  private:
   std::vector<std::string> command(std::vector<std::string> words) const;

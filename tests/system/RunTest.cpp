@@ -67,10 +67,44 @@ TEST_F(Run, servesTheDocumentsOfAFolderAndNeverWritesToIt) {
   writeFile(folder + "/inner/two.txt", "2");
   const auto before = contents(folder);
   start({folder});
-  EXPECT_TRUE(drive.waitForName("one.txt"));
-  EXPECT_TRUE(drive.waitForName("two.txt", "inner"));
+  EXPECT_NE(run->output().find("2 documents in 1 folder of " + folder), std::string::npos) << run->output();
+  ASSERT_TRUE(drive.waitForName("one.txt"));
+  ASSERT_TRUE(drive.waitForName("two.txt", "inner"));
+  EXPECT_EQ(drive.contents("inner/two.txt")["contents"], "dataless");
+  EXPECT_EQ(drive.droxa({"cat", "inner/two.txt"}).output, "2");
   writeFile(drive.documents() + "/one.txt", "changed in the drive");
+  EXPECT_EQ(drive.droxa({"wait"}).status, 0);
   EXPECT_EQ(contents(folder), before);
+}
+
+TEST_F(Run, twoHomesOnOneCloudAreTwoDevices) {
+  const std::string cloud = drive.home() + "/shared";
+  Drive other;
+  start({"--cloud", cloud, "--device", "first"});
+  ASSERT_TRUE(drive.waitForName("Recipes"));
+  ASSERT_EQ(drive.droxa({"wait"}).status, 0);
+  const auto second = other.droxaInBackground({"run", "--cloud", cloud, "--device", "second"}, "run");
+  ASSERT_TRUE(eventually([&] { return second->output().find("next:") != std::string::npos; }, 60s))
+      << second->output() << second->errors();
+  ASSERT_TRUE(other.waitForName("Recipes"));
+  EXPECT_NE(other.droxa({"status"}).output.find("second"), std::string::npos);
+  ASSERT_TRUE(other.waitForName("Welcome.txt"));
+  EXPECT_EQ(other.droxa({"cat", "Welcome.txt"}).output, readFile(drive.documents() + "/Welcome.txt"));
+  second->signal(SIGINT);
+  EXPECT_EQ(second->wait(), 0);
+}
+
+TEST_F(Run, aHomeRemembersItsCloudAndRefusesAnother) {
+  const std::string cloud = drive.home() + "/shared";
+  start({"--cloud", cloud});
+  run->signal(SIGINT);
+  ASSERT_EQ(run->wait(), 0) << run->errors();
+  const Result other = drive.droxa({"run", "--cloud", drive.home() + "/another"});
+  EXPECT_EQ(other.status, 78);
+  EXPECT_NE(other.errors.find(cloud), std::string::npos) << other.errors;
+  EXPECT_FALSE(std::filesystem::exists(drive.home() + "/another"));
+  start();
+  EXPECT_NE(drive.droxa({"status"}).output.find(cloud), std::string::npos);
 }
 
 TEST_F(Run, startsADeadProcessAgain) {
