@@ -17,9 +17,8 @@ void CloudApplier::change(const DocumentRecord &document, const Place &place, Sy
                           const ItemRecord &item) {
   auto location = context_.files.locate(item.id, nullptr);
   if (!location) {
-    // Its folder can't be opened now; the next fetch of everything tries again.
-    row.tag.clear();
-    context_.store.put(row);
+    context_.store.keepOrphan(document.record, document.parent);
+    putOff(item.id);
     return;
   }
   const bool isMoved = document.parent != row.parent || document.name != row.name;

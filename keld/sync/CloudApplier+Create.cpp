@@ -37,8 +37,12 @@ void CloudApplier::create(const DocumentRecord &document, const Place &place, Sy
     made = createDocument(document, place, &row);
   else
     made = createLink(document, place, &row);
-  // What couldn't be made is tried again with the next fetch of everything.
-  if (!made) row.tag.clear();
+  if (!made) {
+    // Nothing is here that the tag could be of; the next fetches try again.
+    row.tag.clear();
+    context_.store.keepOrphan(document.record, document.parent);
+    putOff(0);
+  }
   context_.store.put(row);
 }
 

@@ -18,6 +18,8 @@ namespace {
 
 constexpr std::size_t kRecordsAtATime = 200;
 constexpr char kToken[] = "changeToken";
+constexpr int kMostTries = 40;  // of a page that something stood in the way of
+constexpr std::chrono::milliseconds kPause{25};
 
 }  // namespace
 
@@ -39,7 +41,8 @@ CloudApplier::CloudApplier(const SyncContext &context, ConflictCopies &conflicts
     : context_(context), conflicts_(conflicts) {}
 
 NSError CloudApplier::fetchAndApply(const CKCallContext &call) {
-  for (;;) {
+  for (int tries = 0;;) {
+    parentsMade_ = context_.store.parentsOfOrphans();
     CKServerChangeToken token;
     const std::string kept = context_.store.text(kToken);
     if (!kept.empty()) token.data = NSData::dataWithString(kept);
@@ -60,13 +63,30 @@ NSError CloudApplier::fetchAndApply(const CKCallContext &call) {
       continue;
     }
     if (page.error) return page.error;
-    const NSError problem = applyPage(page, call);
-    if (problem) return problem;
+    mayWait_ = tries < kMostTries && !call.isCancelled();
+    applyPage(page, call);
+    if (isIncomplete_) {
+      ++tries;
+      if (call.cancellation) call.cancellation->waitUntil(std::chrono::steady_clock::now() + kPause);
+      continue;
+    }
+    tries = 0;
     if (!page.moreComing) return NSError();
   }
 }
 
-NSError CloudApplier::applyPage(const CKZoneChanges &page, const CKCallContext &call) {
+// What couldn't be found where the item table says is found once the keeper has looked again: a folder above
+// it was moved a moment ago. The page is applied again then, which leaves alone what was done.
+bool CloudApplier::putOff(ItemNumber item) {
+  if (!mayWait_) return false;
+  isIncomplete_ = true;
+  const std::string path = item == 0 ? std::string() : context_.files.pathOf(item);
+  if (!path.empty()) touch(path);
+  return true;
+}
+
+void CloudApplier::applyPage(const CKZoneChanges &page, const CKCallContext &call) {
+  isIncomplete_ = false;
   std::vector<DocumentRecord> documents;
   for (const CKRecord &record : page.changedRecords) {
     auto document = ReadRecord(record);
@@ -81,6 +101,10 @@ NSError CloudApplier::applyPage(const CKZoneChanges &page, const CKCallContext &
   context_.store.transaction([&] {
     applyAll(documents, call);
     for (const CKDeletedRecord &deleted : page.deletedRecords) remove(deleted.recordID.recordName);
+    if (isIncomplete_) {
+      foldersToRemove_.clear();
+      return;
+    }
     if (fetchesAll_ && !page.moreComing) {
       // What the cloud doesn't have any more was deleted while nobody could tell.
       fetchesAll_ = false;
@@ -99,13 +123,13 @@ NSError CloudApplier::applyPage(const CKZoneChanges &page, const CKCallContext &
     }
   });
   finishBatch();
-  return NSError();
 }
 
 void CloudApplier::applyRecords(const std::vector<CKRecord> &records, const CKCallContext &call) {
   std::vector<DocumentRecord> documents;
   for (const CKRecord &record : records)
     if (auto document = ReadRecord(record)) documents.push_back(std::move(*document));
+  mayWait_ = false;
   context_.store.transaction([&] { applyAll(documents, call); });
   finishBatch();
 }
@@ -165,12 +189,15 @@ bool CloudApplier::openPlace(const std::string &parentRecord, Place *place) {
 }
 
 void CloudApplier::apply(const DocumentRecord &document) {
+  context_.store.dropOrphan(document.record);
   auto row = context_.store.byRecord(document.record);
   if (row && row->tag == document.tag) return;
-  if (row && row->hasNewer() && row->newerTag == document.tag) return;
+  // A version that waits already; unless something was written here meanwhile, which it can't replace.
+  if (row && row->newerTag == document.tag && !context_.store.queued(row->item)) return;
   Place place;
   if (!openPlace(document.parent, &place)) {
     context_.store.keepOrphan(document.record, document.parent);
+    if (context_.store.byRecord(document.parent)) putOff(0);
     return;
   }
   ++applied_;
@@ -203,10 +230,12 @@ DocumentMarker CloudApplier::markerOf(const DocumentRecord &document) const {
 // --- Deletions.
 
 void CloudApplier::remove(const std::string &record) {
+  context_.store.dropOrphan(record);
   const auto row = context_.store.byRecord(record);
   if (!row) return;
   ++applied_;
   const auto location = row->item != 0 ? context_.files.locate(row->item, nullptr) : std::nullopt;
+  if (!location && row->item != 0 && context_.files.item(row->item) && putOff(row->item)) return;
   if (!location) {
     if (row->item != 0) context_.store.dropQueued(row->item);
     // Made a moment ago, and not seen by the keeper yet.
@@ -279,7 +308,11 @@ void CloudApplier::removeFolders() {
     const bool isGone = result == 0 || errno == ENOENT;
     context_.store.erase(folder.record);
     touch(folder.path);
-    if (!isGone && row && row->item != 0) context_.store.enqueue(row->item, false, false);
+    if (isGone) continue;
+    // It gets another record, which what is in it has to be told to be in.
+    if (row && row->item != 0) context_.store.enqueue(row->item, false, false);
+    for (const SyncRow &child : context_.store.childrenOf(folder.record, UINT32_MAX))
+      if (child.item != 0) context_.store.enqueue(child.item, false, false);
   }
 }
 

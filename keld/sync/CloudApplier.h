@@ -33,7 +33,8 @@ class CloudApplier {
     std::string folderPath;
   };
 
-  NSError applyPage(const CKZoneChanges &page, const CKCallContext &call);
+  void applyPage(const CKZoneChanges &page, const CKCallContext &call);
+  bool putOff(ItemNumber item);
   void applyAll(const std::vector<DocumentRecord> &documents, const CKCallContext &call);
   void apply(const DocumentRecord &document);
   void adoptOrphans(const CKCallContext &call);
@@ -73,6 +74,8 @@ class CloudApplier {
   std::vector<std::string> foldersToRemove_;  // records
   std::uint64_t applied_ = 0;
   bool fetchesAll_ = false;
+  bool mayWait_ = false;       // whether what can't be found now may be put off
+  bool isIncomplete_ = false;  // something of the page was
   std::set<std::string> seen_;  // while everything is fetched anew
 };
 

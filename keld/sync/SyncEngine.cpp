@@ -2,11 +2,13 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <future>
 #include <system_error>
 #include <utility>
 
 #include "keld/sync/CloudErrors.h"
 #include "platform/dispatch/dispatch.h"
+#include "tessaly/QVContainer.h"
 #include "tessaly/QVErrors.h"
 #include "tessaly/QVLog.h"
 
@@ -17,9 +19,11 @@ namespace {
 constexpr std::chrono::milliseconds kFirstPause{500};
 constexpr std::chrono::milliseconds kLongestPause{60'000};
 constexpr std::chrono::milliseconds kCallTimeout{60'000};
+constexpr std::chrono::seconds kLongestEnd{5};
 constexpr std::uint64_t kVersionsAtATime = 1000;
 constexpr char kCloudIdentifier[] = "cloudIdentifier";
 constexpr char kItemDatabase[] = "itemDatabase";
+constexpr char kEndedWell[] = "endedWell";
 
 std::unique_ptr<ContentsStorage> openStorage(const std::string &replicaPath,
                                              const ContentsSettings &settings) {
@@ -63,6 +67,9 @@ SyncEngine::~SyncEngine() {
 
 void SyncEngine::start(const std::string &itemDatabase) {
   bindAnew(itemDatabase);
+  // What was examined last may not have reached the item table's flags before the process was killed.
+  if (store_.number(kEndedWell) == 0) store_.setNumber("examinedRank", 0);
+  store_.setNumber(kEndedWell, 0);
   storage_->recover();
   nextPoll_ = std::chrono::steady_clock::now();
   thread_ = std::thread([this] { run(); });
@@ -77,7 +84,10 @@ void SyncEngine::stop() {
   stopping_->cancel();
   if (assets_) assets_->stop();
   if (downloads_) downloads_->stop();
-  if (thread_.joinable()) thread_.join();
+  if (thread_.joinable()) {
+    thread_.join();
+    noteEnd();
+  }
   subscription_.reset();
   std::vector<Waiter> waiters;
   std::vector<std::function<void(const NSError &)>> fetchers;
@@ -92,6 +102,19 @@ void SyncEngine::stop() {
   for (Waiter &waiter : waiters)
     dispatch_async_global([done = std::move(waiter.done), error] { done(error); });
   for (auto &done : fetchers) dispatch_async_global([done = std::move(done), error] { done(error); });
+}
+
+// The keeper, which still runs, does things in order: when it has looked, all flags before are in its table.
+void SyncEngine::noteEnd() {
+  const auto seen = std::make_shared<std::promise<void>>();
+  states_.flush();
+  states_.lookAt({QVUbiquitousDefaultContainerID}, [seen] { seen->set_value(); });
+  if (seen->get_future().wait_for(kLongestEnd) != std::future_status::ready) return;
+  try {
+    store_.setNumber(kEndedWell, 1);
+  } catch (const SqlError &error) {
+    os_log_error(qvc_default_log(), "[ERROR] the sync's database failed at the end: %s", error.what());
+  }
 }
 
 void SyncEngine::bindAnew(const std::string &itemDatabase) {

@@ -84,6 +84,7 @@ class SyncEngine {
 
   void run();
   bool prepareCloud();
+  void noteEnd();
   void bindAnew(const std::string &itemDatabase);
   void round();
   void fetch();

@@ -232,6 +232,11 @@ void SyncStore::keepOrphan(const std::string &record, const std::string &parent)
   statement("INSERT OR REPLACE INTO orphans VALUES (?, ?)").bindText(1, record).bindText(2, parent).run();
 }
 
+void SyncStore::dropOrphan(const std::string &record) {
+  const RecursiveLock lock(mutex_);
+  statement("DELETE FROM orphans WHERE record = ?").bindText(1, record).run();
+}
+
 std::vector<std::string> SyncStore::takeOrphansOf(const std::string &parent) {
   const RecursiveLock lock(mutex_);
   SqlStatement &asked = statement("SELECT record FROM orphans WHERE parent = ?");
@@ -241,6 +246,17 @@ std::vector<std::string> SyncStore::takeOrphansOf(const std::string &parent) {
   asked.reset();
   if (!records.empty()) statement("DELETE FROM orphans WHERE parent = ?").bindText(1, parent).run();
   return records;
+}
+
+std::vector<std::string> SyncStore::parentsOfOrphans() {
+  const RecursiveLock lock(mutex_);
+  SqlStatement &asked = statement(
+      "SELECT DISTINCT parent FROM orphans WHERE parent IN (SELECT record FROM rows) OR parent LIKE "
+      "'container:%'");
+  std::vector<std::string> parents;
+  while (asked.step()) parents.emplace_back(asked.bytes(0));
+  asked.reset();
+  return parents;
 }
 
 std::uint64_t SyncStore::countOrphans() {

@@ -92,8 +92,10 @@ class SyncStore {
 
   // Records that came before their parents.
   void keepOrphan(const std::string &record, const std::string &parent);
+  void dropOrphan(const std::string &record);
   std::vector<std::string> takeOrphansOf(const std::string &parent);
   std::uint64_t countOrphans();
+  std::vector<std::string> parentsOfOrphans();  // that are here now
 
   // The queue of uploads, in the order of the changes.
   void enqueue(ItemNumber item, bool isDeletion, bool isHeld);

@@ -2,8 +2,14 @@
 
 #include <filesystem>
 #include <regex>
+#include <thread>
+#include <utility>
 
 namespace droxa::crash {
+
+namespace {
+constexpr std::chrono::seconds kLongestWriting{10};
+}  // namespace
 
 std::string Difference(const Tree &one, const Tree &other) {
   std::string lines;
@@ -37,8 +43,7 @@ void Checker::check() {
     trees.at(index) = ReadTree(device.documents());
     checkContents(device, trees.at(index));
     checkNames(device, trees.at(index));
-    checkItemDatabase(device, trees.at(index));
-    checkSyncDatabase(device, trees.at(index));
+    checkDatabases(device);
   }
   const std::string difference = Difference(trees[0], trees[1]);
   if (!difference.empty()) model_.finding("the trees differ:\n" + difference);
@@ -48,6 +53,20 @@ void Checker::check() {
       model_.finding(path + " has other contents on each device");
   }
   checkCloud(trees[0]);
+}
+
+// The daemon writes down what it has just done a moment later.
+void Checker::checkDatabases(CrashDevice &device) {
+  const auto end = std::chrono::steady_clock::now() + kLongestWriting;
+  for (;;) {
+    found_.clear();
+    const Tree tree = ReadTree(device.documents());
+    checkItemDatabase(device, tree);
+    checkSyncDatabase(device, tree);
+    if (found_.empty() || std::chrono::steady_clock::now() > end) break;
+    std::this_thread::sleep_for(std::chrono::milliseconds(20));
+  }
+  for (const std::string &text : std::exchange(found_, {})) finding(device, text);
 }
 
 // --- Files.
@@ -81,9 +100,14 @@ void Checker::checkContents(CrashDevice &device, const Tree &tree) {
     if (entry.mark && entry.mark->digest != TextDigest(*text))
       finding(device, path + " isn't what its mark says");
   }
-  for (const Model::Expected &expected : model_.mustExist())
-    if (found.count(expected.name) == 0)
-      finding(device, "lost: " + expected.name.description() + " (" + expected.history + ")");
+  for (const VersionName &expected : model_.mustExist()) {
+    if (found.count(expected) > 0) continue;
+    std::string text = "lost: " + expected.description() + "\n" + model_.history(expected.document);
+    for (const VersionName &other : found)
+      if (other.document == expected.document)
+        text += "    found: version " + std::to_string(other.version) + "\n";
+    finding(device, text);
+  }
 }
 
 void Checker::checkNames(CrashDevice &device, const Tree &tree) {

@@ -4,6 +4,7 @@
 #include <memory>
 #include <set>
 #include <string>
+#include <vector>
 
 #include "platform/cloudkit/CKCloud.h"
 #include "tests/crash/CrashDevice.h"
@@ -27,6 +28,7 @@ class Checker {
   void checkDataless(CrashDevice &device, const Tree &tree);
   void checkContents(CrashDevice &device, const Tree &tree);
   void checkNames(CrashDevice &device, const Tree &tree);
+  void checkDatabases(CrashDevice &device);
   void checkItemDatabase(CrashDevice &device, const Tree &tree);
   void checkSyncDatabase(CrashDevice &device, const Tree &tree);
   void checkCloud(const Tree &tree);
@@ -35,6 +37,7 @@ class Checker {
   const std::array<CrashDevice *, 2> devices_;
   const std::shared_ptr<CKCloud> cloud_;
   Model &model_;
+  std::vector<std::string> found_;  // in one device's databases
 };
 
 // What two trees differ in, a line each; "" when they are alike. Contents aren't looked at.

@@ -84,11 +84,15 @@ class CrashRun {
     for (std::size_t index = 0; index < 2; ++index) {
       if (!round.kills[index]) continue;
       devices[index]->kill();
+      model_.note("killed " + devices[index]->name());
       ++report_.kills;
     }
     pauseFor(round.untilStart);
     for (std::size_t index = 0; index < 2; ++index)
-      if (round.kills[index]) devices[index]->start();
+      if (round.kills[index]) {
+        model_.note("starting " + devices[index]->name());
+        devices[index]->start();
+      }
     work.join();
   }
 
@@ -141,6 +145,7 @@ class CrashRun {
       std::filesystem::remove_all(folder_, ignored);
     } else {
       report_.folder = folder_;
+      testing::writeFile(folder_ + "/workload.txt", model_.notes());
     }
     return report_;
   }

@@ -82,26 +82,26 @@ std::string shownPath(const std::string &path) {
 void Checker::checkItemDatabase(CrashDevice &device, const Tree &tree) {
   std::string problem;
   const auto items = readItems(device.home(), &problem);
-  if (!problem.empty()) return finding(device, "the item database can't be read: " + problem);
+  if (!problem.empty()) return found_.push_back("the item database can't be read: " + problem);
   std::set<std::string> seen;
   for (const auto &[id, item] : items) {
     const std::string path = pathOf(items, id);
-    if (path.compare(0, 1, "?") == 0) finding(device, "item " + id + " is below nothing: " + path);
+    if (path.compare(0, 1, "?") == 0) found_.push_back("item " + id + " is below nothing: " + path);
     const std::string shown = shownPath(path);
     if (shown.empty()) continue;
     seen.insert(shown);
     const auto file = tree.find(shown);
     if (file == tree.end()) {
-      finding(device, "item " + id + " has no file: " + shown);
+      found_.push_back("item " + id + " has no file: " + shown);
       continue;
     }
     if (std::to_string(file->second.inode) != item.inode)
-      finding(device, "item " + id + " is another file than " + shown);
+      found_.push_back("item " + id + " is another file than " + shown);
     if (!file->second.isFolder && std::to_string(file->second.size) != item.size)
-      finding(device, "item " + id + " has another size than " + shown);
+      found_.push_back("item " + id + " has another size than " + shown);
   }
   for (const auto &[path, entry] : tree)
-    if (seen.count(path) == 0) finding(device, "no item stands for " + path);
+    if (seen.count(path) == 0) found_.push_back("no item stands for " + path);
 }
 
 void Checker::checkSyncDatabase(CrashDevice &device, const Tree &tree) {
@@ -113,29 +113,29 @@ void Checker::checkSyncDatabase(CrashDevice &device, const Tree &tree) {
                                     &rows, &problem) &&
                       database.rows("SELECT item, errorText FROM uploads", &uploads, &problem) &&
                       database.rows("SELECT record, parent FROM orphans", &orphans, &problem);
-  if (!isRead) return finding(device, "the sync's database can't be read: " + problem);
+  if (!isRead) return found_.push_back("the sync's database can't be read: " + problem);
   std::set<std::string> seen;
   for (const auto &row : rows) {
     const std::string what = "the sync's row " + row[0] + " (" + row[3] + ")";
     const std::string path = items.count(row[1]) > 0 ? shownPath(pathOf(items, row[1])) : "";
     const auto file = tree.find(path);
     if (file == tree.end()) {
-      finding(device, what + " has no file; its item is " + row[1]);
+      found_.push_back(what + " has no file; its item is " + row[1]);
       continue;
     }
-    if (!seen.insert(path).second) finding(device, "two rows of the sync's stand for " + path);
-    if (row[2].empty()) finding(device, what + " was never agreed with the cloud");
-    if (!row[5].empty()) finding(device, what + " still waits for a newer version");
+    if (!seen.insert(path).second) found_.push_back("two rows of the sync's stand for " + path);
+    if (row[2].empty()) found_.push_back(what + " was never agreed with the cloud");
+    if (!row[5].empty()) found_.push_back(what + " still waits for a newer version");
     if (!file->second.isFolder && file->second.mark && row[4] != file->second.mark->digest)
-      finding(device, what + " has other contents than the file's mark says");
-    if (row[6] != "0") finding(device, what + " says that the file is dataless");
+      found_.push_back(what + " has other contents than the file's mark says");
+    if (row[6] != "0") found_.push_back(what + " says that the file is dataless");
   }
   for (const auto &[path, entry] : tree)
-    if (seen.count(path) == 0) finding(device, "the sync has no row for " + path);
+    if (seen.count(path) == 0) found_.push_back("the sync has no row for " + path);
   for (const auto &upload : uploads)
-    finding(device, "item " + upload[0] + " still waits to be sent: " + upload[1]);
+    found_.push_back("item " + upload[0] + " still waits to be sent: " + upload[1]);
   for (const auto &orphan : orphans)
-    finding(device, "record " + orphan[0] + " waits for its parent " + orphan[1]);
+    found_.push_back("record " + orphan[0] + " waits for its parent " + orphan[1]);
 }
 
 }  // namespace droxa::crash

@@ -1,6 +1,26 @@
 #include "tests/crash/Model.h"
 
+#include <array>
+#include <cstdio>
+#include <ctime>
+
 namespace droxa::crash {
+
+namespace {
+
+// To be found in the daemons' logs.
+std::string timeOfDay() {
+  timespec now{};
+  ::clock_gettime(CLOCK_REALTIME, &now);
+  tm parts{};
+  ::localtime_r(&now.tv_sec, &parts);
+  std::array<char, 32> text{};
+  std::snprintf(text.data(), text.size(), "%02d:%02d:%02d.%03ld ", parts.tm_hour, parts.tm_min, parts.tm_sec,
+                now.tv_nsec / 1'000'000);
+  return text.data();
+}
+
+}  // namespace
 
 VersionName Model::begin(std::optional<VersionName> parent, std::uint64_t length, const std::string &where) {
   VersionName name;
@@ -14,7 +34,7 @@ VersionName Model::begin(std::optional<VersionName> parent, std::uint64_t length
   Version &version = versions_[name];
   version.parent = parent;
   version.digest = digest;
-  version.history = where + (parent ? " on " + parent->description() : "");
+  version.history = timeOfDay() + where + (parent ? ", on version " + std::to_string(parent->version) : "");
   digests_[digest] = name;
   return name;
 }
@@ -30,7 +50,7 @@ void Model::deleted(const VersionName &name, const std::string &where) {
   const Lock lock(mutex_);
   Version &version = versions_.at(name);
   version.isDeleted = true;
-  version.history += "; deleted: " + where;
+  version.history += "; " + timeOfDay() + where;
 }
 
 std::optional<VersionName> Model::byDigest(const std::string &digest) const {
@@ -40,19 +60,22 @@ std::optional<VersionName> Model::byDigest(const std::string &digest) const {
   return known->second;
 }
 
-std::vector<Model::Expected> Model::mustExist() const {
+std::vector<VersionName> Model::mustExist() const {
   const Lock lock(mutex_);
-  std::vector<Expected> expected;
+  std::vector<VersionName> expected;
   for (const auto &[name, version] : versions_)
-    if (version.isAcknowledged && !version.isSuperseded && !version.isDeleted)
-      expected.push_back({name, version.digest, version.history});
+    if (version.isAcknowledged && !version.isSuperseded && !version.isDeleted) expected.push_back(name);
   return expected;
 }
 
-std::string Model::history(const VersionName &name) const {
+std::string Model::history(std::uint64_t document) const {
   const Lock lock(mutex_);
-  const auto known = versions_.find(name);
-  return known == versions_.end() ? "never written" : known->second.history;
+  std::string lines;
+  for (const auto &[name, version] : versions_)
+    if (name.document == document)
+      lines += "    version " + std::to_string(name.version) + ": " + version.history +
+               (version.isAcknowledged ? "\n" : " (not finished)\n");
+  return lines;
 }
 
 void Model::finding(const std::string &text) {
@@ -63,6 +86,16 @@ void Model::finding(const std::string &text) {
 std::vector<std::string> Model::findings() const {
   const Lock lock(mutex_);
   return findings_;
+}
+
+void Model::note(const std::string &what) {
+  const Lock lock(mutex_);
+  notes_ += timeOfDay() + what + "\n";
+}
+
+std::string Model::notes() const {
+  const Lock lock(mutex_);
+  return notes_;
 }
 
 void Model::count(const char *what) {

@@ -23,18 +23,15 @@ class Model {
   void deleted(const VersionName &version, const std::string &where);
 
   std::optional<VersionName> byDigest(const std::string &digest) const;
-  struct Expected {
-    VersionName name;
-    std::string digest;
-    std::string history;  // for people
-  };
-  std::vector<Expected> mustExist() const;
-  std::string history(const VersionName &version) const;
+  std::vector<VersionName> mustExist() const;
+  std::string history(std::uint64_t document) const;  // for people: a line for each version
 
   // What was promised and not kept. Each is one line.
   void finding(const std::string &text);
   std::vector<std::string> findings() const;
 
+  void note(const std::string &what);  // for people, with the time
+  std::string notes() const;
   void count(const char *what);
   std::map<std::string, std::uint64_t> counts() const;
 
@@ -50,6 +47,7 @@ class Model {
   std::map<std::string, VersionName> digests_ GUARDED_BY(mutex_);
   std::map<std::uint64_t, std::uint64_t> newest_ GUARDED_BY(mutex_);  // by document
   std::uint64_t lastDocument_ GUARDED_BY(mutex_) = 0;
+  std::string notes_ GUARDED_BY(mutex_);
   std::vector<std::string> findings_ GUARDED_BY(mutex_);
   std::map<std::string, std::uint64_t> counts_ GUARDED_BY(mutex_);
 };

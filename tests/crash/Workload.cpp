@@ -146,6 +146,15 @@ bool Workload::writeWhole(int file, const std::string &text) const {
   return ::fsync(file) == 0;
 }
 
+void Workload::noteWriting(const Open &document, const std::string &path, const VersionName &name) {
+  struct stat own = {}, there = {};
+  ::fstat(document.file, &own);
+  ::stat(path.c_str(), &there);
+  model_.note("wrote " + name.description() + " into inode " + std::to_string(own.st_ino) + " with " +
+              std::to_string(own.st_nlink) + " names, which " + (document.hasContents ? "had" : "had no") +
+              " contents; " + path + " is inode " + std::to_string(there.st_ino));
+}
+
 void Workload::create(CrashDevice &device, const Tree &tree, const Step &step) {
   const std::string path = below(pickFolder(tree, step.pick), documentName(step.otherPick));
   const int file = ::open(device.at(path).c_str(), O_CREAT | O_EXCL | O_RDWR | O_CLOEXEC | O_NOFOLLOW, 0644);
@@ -171,6 +180,7 @@ bool Workload::editInPlace(CrashDevice &device, const std::string &path, const S
                        ::ftruncate(document->file, static_cast<off_t>(text.size())) == 0 &&
                        ::fsync(document->file) == 0;
   if (written) model_.acknowledge(name);
+  noteWriting(*document, device.at(path), name);
   model_.count("edited in place");
   return true;
 }
@@ -183,6 +193,7 @@ bool Workload::editByTruncating(CrashDevice &device, const std::string &path, co
   const bool written =
       ::ftruncate(document->file, 0) == 0 && writeWhole(document->file, DocumentText(name, step.length));
   if (written) model_.acknowledge(name);
+  noteWriting(*document, device.at(path), name);
   model_.count("edited by truncating");
   return true;
 }
@@ -234,8 +245,10 @@ void Workload::move(CrashDevice &device, const std::string &from, const std::str
                     const std::string &name) {
   const std::string to = below(folder, name);
   if (to == from || to.compare(0, from.size() + 1, from + "/") == 0) return;
-  if (::renameat2(AT_FDCWD, device.at(from).c_str(), AT_FDCWD, device.at(to).c_str(), RENAME_NOREPLACE) == 0)
-    model_.count("moved");
+  if (::renameat2(AT_FDCWD, device.at(from).c_str(), AT_FDCWD, device.at(to).c_str(), RENAME_NOREPLACE) != 0)
+    return;
+  model_.note(device.name() + " moved " + from + " to " + to);
+  model_.count("moved");
 }
 
 // --- Deleting. What is deleted leaves the drive in one step, so that what was deleted is known exactly.
@@ -281,7 +294,9 @@ bool Workload::cloudHas(const std::string &digest, std::uint64_t size) const {
 }
 
 void Workload::download(CrashDevice &device, const std::string &path) {
-  if (device.download(path)) return;
+  const NSError error = device.download(path);
+  model_.note(device.name() + " downloaded " + path + ": " + error.description());
+  if (error) return;
   model_.count("downloads acknowledged");
   const int file = ::open(device.at(path).c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC);
   if (file < 0) return;  // moved or deleted from elsewhere
@@ -297,7 +312,9 @@ void Workload::download(CrashDevice &device, const std::string &path) {
 }
 
 void Workload::evict(CrashDevice &device, const std::string &path) {
-  if (device.evict(path)) return;
+  const NSError error = device.evict(path);
+  model_.note(device.name() + " evicted " + path + ": " + error.description());
+  if (error) return;
   model_.count("evictions acknowledged");
   const int file = ::open(device.at(path).c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC);
   if (file < 0) return;

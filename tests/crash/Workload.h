@@ -37,6 +37,7 @@ class Workload {
   };
   std::unique_ptr<Open> open(const std::string &path, int flags) const;
 
+  void noteWriting(const Open &document, const std::string &path, const VersionName &name);
   void create(CrashDevice &device, const Tree &tree, const Step &step);
   bool editInPlace(CrashDevice &device, const std::string &path, const Step &step);
   bool editByTruncating(CrashDevice &device, const std::string &path, const Step &step);
