@@ -19,6 +19,7 @@ void CloudApplier::change(const DocumentRecord &document, const Place &place, Sy
   if (!location) {
     // Its folder can't be opened now; the next fetch tries again.
     context_.store.fetchAgain(document.record);
+    touch(context_.files.pathOf(item.id));
     return;
   }
   const bool isMoved = document.parent != row.parent || document.name != row.name;

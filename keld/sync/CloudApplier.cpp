@@ -223,6 +223,7 @@ bool CloudApplier::openPlace(const std::string &parentRecord, Place *place) {
 }
 
 void CloudApplier::apply(const DocumentRecord &document) {
+  context_.store.dropOrphan(document.record);
   auto row = context_.store.byRecord(document.record);
   if (row && row->tag == document.tag) return;
   // Its contents are on their way; unless something was written here meanwhile.
@@ -231,7 +232,11 @@ void CloudApplier::apply(const DocumentRecord &document) {
     return;
   Place place;
   if (!openPlace(document.parent, &place)) {
-    context_.store.keepOrphan(document.record, document.parent);
+    // A folder that can't be opened now was moved a moment ago, as a rule; the next fetch tries again.
+    if (context_.store.byRecord(document.parent))
+      context_.store.fetchAgain(document.record);
+    else
+      context_.store.keepOrphan(document.record, document.parent);
     return;
   }
   ++applied_;
@@ -264,10 +269,15 @@ DocumentMarker CloudApplier::markerOf(const DocumentRecord &document) const {
 // --- Deletions.
 
 void CloudApplier::remove(const std::string &record) {
+  context_.store.dropOrphan(record);
   const auto row = context_.store.byRecord(record);
   if (!row) return;
   ++applied_;
   const auto location = row->item != 0 ? context_.files.locate(row->item, nullptr) : std::nullopt;
+  if (!location && row->item != 0 && context_.files.item(row->item)) {
+    touch(context_.files.pathOf(row->item));
+    return context_.store.fetchAgain(record);
+  }
   if (!location) {
     if (row->item != 0) context_.store.dropQueued(row->item);
     // Made a moment ago, and not seen by the keeper yet.
@@ -343,7 +353,11 @@ void CloudApplier::removeFolders() {
     const bool isGone = result == 0 || errno == ENOENT;
     context_.store.erase(folder.record);
     touch(folder.path);
-    if (!isGone && row && row->item != 0) context_.store.enqueue(row->item, false, false);
+    if (isGone) continue;
+    // It gets another record, which what is in it has to be told to be in.
+    if (row && row->item != 0) context_.store.enqueue(row->item, false, false);
+    for (const SyncRow &child : context_.store.childrenOf(folder.record, UINT32_MAX))
+      if (child.item != 0) context_.store.enqueue(child.item, false, false);
   }
 }
 

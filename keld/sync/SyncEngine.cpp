@@ -10,6 +10,7 @@
 
 #include "keld/sync/CloudErrors.h"
 #include "platform/dispatch/dispatch.h"
+#include "tessaly/QVContainer.h"
 #include "tessaly/QVErrors.h"
 #include "tessaly/QVLog.h"
 
@@ -20,12 +21,15 @@ namespace {
 constexpr std::chrono::milliseconds kFirstPause{500};
 constexpr std::chrono::milliseconds kLongestPause{60'000};
 constexpr std::chrono::milliseconds kCallTimeout{60'000};
+constexpr std::chrono::milliseconds kNoPause{0}, kFirstAgain{25}, kLongestAgain{5'000};
+constexpr std::chrono::seconds kLongestEnd{5};
 constexpr std::uint64_t kVersionsAtATime = 1000;
 constexpr std::chrono::milliseconds kScanPoll{100};
 constexpr char kCloudIdentifier[] = "cloudIdentifier";
 constexpr char kItemDatabase[] = "itemDatabase";
 constexpr char kReplica[] = "replica";
 constexpr char kIdentityName[] = "identity";
+constexpr char kEndedWell[] = "endedWell";
 
 std::unique_ptr<ContentsStorage> openStorage(const std::string &replicaPath,
                                              const ContentsSettings &settings) {
@@ -80,6 +84,9 @@ SyncEngine::~SyncEngine() {
 void SyncEngine::start(const std::string &itemDatabase) {
   checkReplica();
   bindAnew(itemDatabase);
+  // What was examined last may not have reached the item table's flags before the process was killed.
+  if (store_.number(kEndedWell) == 0) store_.setNumber("examinedRank", 0);
+  store_.setNumber(kEndedWell, 0);
   storage_->recover();
   nextPoll_ = std::chrono::steady_clock::now();
   thread_ = std::thread([this] { run(); });
@@ -92,7 +99,8 @@ void SyncEngine::stop() {
     wake_.notify_all();
   }
   stopping_->cancel();
-  if (thread_.joinable()) thread_.join();
+  const bool wasRunning = thread_.joinable();
+  if (wasRunning) thread_.join();
   {
     // Whoever waits for it is told by that.
     std::vector<std::function<void()>> never;
@@ -101,6 +109,7 @@ void SyncEngine::stop() {
   }
   assets_->stop();
   downloads_->stop();
+  if (wasRunning) noteEnd();
   subscription_.reset();
   std::vector<Waiter> waiters;
   std::vector<std::function<void(const NSError &)>> fetchers;
@@ -143,6 +152,20 @@ bool SyncEngine::isReplicaItself() const {
   struct stat status = {};
   const std::string path = files_.replicaPath() + "/" + kContentsStorageName;
   return ::stat(path.c_str(), &status) == 0 && status.st_ino == storageInode_;
+}
+
+// The keeper, which still runs, does things in order: when it has looked, all flags before are in its
+// table.
+void SyncEngine::noteEnd() {
+  const auto seen = std::make_shared<std::promise<void>>();
+  states_.flush();
+  states_.lookAt({QVUbiquitousDefaultContainerID}, [seen] { seen->set_value(); });
+  if (seen->get_future().wait_for(kLongestEnd) != std::future_status::ready) return;
+  try {
+    store_.setNumber(kEndedWell, 1);
+  } catch (const SqlError &error) {
+    os_log_error(qvc_default_log(), "[ERROR] the sync's database failed at the end: %s", error.what());
+  }
 }
 
 void SyncEngine::bindAnew(const std::string &itemDatabase) {
@@ -428,6 +451,10 @@ void SyncEngine::fetch() {
   nextPoll_ = std::chrono::steady_clock::now() + options_.pollInterval;
   const NSError error = applier_.fetchAndApply(call(kCallTimeout));
   noteCloudProblem(fetching, error);
+  // What stood in the way of a change is gone before long, as a rule: the keeper was about to look.
+  const bool isIncomplete = !error && store_.countToFetch() > 0;
+  againPause_ = isIncomplete ? std::clamp(againPause_ * 2, kFirstAgain, kLongestAgain) : kNoPause;
+  if (isIncomplete) nextPoll_ = std::min(nextPoll_, std::chrono::steady_clock::now() + againPause_);
   answerFetchers(error);
 }
 

@@ -93,6 +93,7 @@ class SyncEngine {
   bool isReplicaItself() const;
   void afterFirstScan();
   void answerFetchers(const NSError &error);
+  void noteEnd();
   void bindAnew(const std::string &itemDatabase);
   void round();
   void fetch();
@@ -127,7 +128,8 @@ class SyncEngine {
   bool moreIsDue_ = false;
   std::vector<Waiter> waiting_;
   std::chrono::milliseconds retryPause_{0};
-  NSError problems_[2];  // by direction
+  std::chrono::milliseconds againPause_{0};  // before what couldn't be applied is fetched again
+  NSError problems_[2];                      // by direction
   bool hasSeenReplica_ = false;
   std::chrono::steady_clock::time_point nextPoll_;
 

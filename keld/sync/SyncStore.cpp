@@ -289,6 +289,11 @@ void SyncStore::keepOrphan(const std::string &record, const std::string &parent)
   statement("INSERT OR REPLACE INTO orphans VALUES (?, ?)").bindText(1, record).bindText(2, parent).run();
 }
 
+void SyncStore::dropOrphan(const std::string &record) {
+  const RecursiveLock lock(mutex_);
+  statement("DELETE FROM orphans WHERE record = ?").bindText(1, record).run();
+}
+
 void SyncStore::fetchAgain(const std::string &record) {
   keepOrphan(record, "");
 }

@@ -100,6 +100,7 @@ class SyncStore {
   void keepOrphan(const std::string &record, const std::string &parent);
   std::uint64_t countOrphans();
   std::uint64_t fetchOrphansOf(const std::string &parent);  // how many
+  void dropOrphan(const std::string &record);
   void fetchAgain(const std::string &record);
   std::vector<std::string> toFetch(std::uint64_t limit);
   void fetched(const std::string &record);
