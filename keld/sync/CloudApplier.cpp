@@ -231,7 +231,11 @@ void CloudApplier::apply(const DocumentRecord &document) {
     return;
   Place place;
   if (!openPlace(document.parent, &place)) {
-    context_.store.keepOrphan(document.record, document.parent);
+    // A container's folder can't be opened only for a while.
+    if (ContainerOfRecord(document.parent))
+      context_.store.fetchAgain(document.record);
+    else
+      context_.store.keepOrphan(document.record, document.parent);
     return;
   }
   ++applied_;
