@@ -39,7 +39,7 @@ TEST_F(CloudChanges, afterTheTokenHasExpiredEverythingIsFetchedAndDeletionsAreFo
 
 TEST_F(CloudChanges, deletionsAreFoundThoughTheFetchOfEverythingIsCutShort) {
   for (int index = 0; index < 250; ++index) hand.put(std::to_string(index), "x");
-  ASSERT_TRUE(eventually([&] { return device.keld.namesIn("").size() == 250; }));
+  ASSERT_TRUE(eventually([&] { return device.names().size() == 250; }));
   device.keld.stop();
   hand.remove("0");
   cloud->onNextCall(Call::fetchZoneChanges, expired());
@@ -145,7 +145,7 @@ TEST_F(CloudChanges, recordsThatMakeNoSenseAreLeftAlone) {
   hostile.name = "itself";
   hand.save(MakeRecord(hostile));
   dataless("good", "x");
-  EXPECT_EQ(device.keld.namesIn(""), std::vector<std::string>{"good"});
+  EXPECT_EQ(device.names(), std::vector<std::string>{"good"});
   EXPECT_TRUE(device.transfers().isCloudReachable);
 }
 
@@ -229,9 +229,12 @@ TEST_F(CloudChanges, twoRecordsOfOneNameAreBothThere) {
     twin.content.mode = 0644;
     hand.save(MakeRecordWithContent(twin));
   }
-  ASSERT_TRUE(eventually([&] { return device.keld.namesIn("").size() == 2; }));
+  ASSERT_TRUE(eventually([&] { return device.names().size() == 2; }));
   std::vector<std::string> found;
-  for (const std::string &name : device.keld.namesIn("")) found.push_back(device.contents(name));
+  for (const std::string &name : device.names()) {
+    ASSERT_TRUE(device.knowsSoon(name));
+    found.push_back(device.contents(name));
+  }
   std::sort(found.begin(), found.end());
   EXPECT_EQ(found, (std::vector<std::string>{"one", "two"}));
   EXPECT_FALSE(device.waitForUploads());
@@ -269,10 +272,13 @@ TEST_F(TwoDevices, documentsOfOneNameMadeAtOnceAreBothKept) {
   anna.keld.write("plan.txt", "anna's plan");
   ben.keld.write("plan.txt", "ben's own plan");
   ASSERT_TRUE(eventually([&] {
-    return anna.keld.namesIn("").size() == 2 && ben.keld.namesIn("") == anna.keld.namesIn("");
+    return anna.names().size() == 2 && ben.names() == anna.names();
   }));
   std::vector<std::string> found;
-  for (const std::string &name : ben.keld.namesIn("")) found.push_back(ben.contents(name));
+  for (const std::string &name : ben.names()) {
+    ASSERT_TRUE(ben.knowsSoon(name));
+    found.push_back(ben.contents(name));
+  }
   std::sort(found.begin(), found.end());
   EXPECT_EQ(found, (std::vector<std::string>{"anna's plan", "ben's own plan"}));
 }
