@@ -151,9 +151,9 @@ void CloudApplier::changeContents(const DocumentRecord &document, SyncRow row, c
 // Whether what was written here was written over that very version: the file's marker says so, or this device
 // sent that version itself and lost the reply.
 bool CloudApplier::isBasedOn(const DocumentRecord &document, const SyncRow &row, const DocumentLook &look) {
-  if (look.marker && look.marker->recordName == row.record)
-    return look.marker->digest == document.content.digest &&
-           (look.kind == DocumentClass::edited || look.kind == DocumentClass::overwritten);
+  const bool isMarked = look.marker && look.marker->recordName == row.record &&
+                        (look.kind == DocumentClass::edited || look.kind == DocumentClass::overwritten);
+  if (isMarked && look.marker->digest == document.content.digest) return true;
   return document.device == context_.cloud.deviceName() &&
          context_.store.wasSent(document.record, document.content.digest);
 }

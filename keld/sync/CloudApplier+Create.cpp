@@ -132,7 +132,7 @@ CloudApplier::Taken CloudApplier::resolveTaken(const DocumentRecord &document, c
     if (folder) WriteMarker(folder.get(), markerOf(document));
     if (other && other->record != document.record) context_.store.erase(other->record);
     row->item = there.item.id;
-    if (row->item != 0) context_.store.dropQueued(row->item);
+    if (row->item != 0) context_.store.enqueue(row->item, false, false);  // shown as sent, if it is that
     return Taken::isIt;
   }
   const bool isLink =
@@ -143,7 +143,7 @@ CloudApplier::Taken CloudApplier::resolveTaken(const DocumentRecord &document, c
     if (length > 0 && document.target == std::string_view(target, static_cast<std::size_t>(length))) {
       if (other && other->record != document.record) context_.store.erase(other->record);
       row->item = there.item.id;
-      if (row->item != 0) context_.store.dropQueued(row->item);
+      if (row->item != 0) context_.store.enqueue(row->item, false, false);  // shown as sent, if it is that
       return Taken::isIt;
     }
   }
@@ -195,7 +195,7 @@ CloudApplier::Taken CloudApplier::resolveTakenByDocument(const DocumentRecord &d
     row->item = there.item.id;
     row->local = LocalFileOf(found.facts);
     row->isDataless = found.kind == DocumentClass::dataless;
-    if (row->item != 0) context_.store.dropQueued(row->item);
+    if (row->item != 0) context_.store.enqueue(row->item, false, false);  // shown as sent, if it is that
     if (other && other->record != document.record) context_.store.erase(other->record);
     touch(there.path);
     return Taken::isIt;

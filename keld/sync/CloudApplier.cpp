@@ -222,6 +222,31 @@ bool CloudApplier::openPlace(const std::string &parentRecord, Place *place) {
   return static_cast<bool>(place->folder);
 }
 
+// A link bears no marker: the one that was made here a moment ago is found by its name.
+void CloudApplier::findLink(SyncRow *row) {
+  const auto path = context_.files.path(*row);
+  ItemRecord there;
+  if (!path || !context_.files.itemAtPath(*path, &there) || context_.store.byItem(there.id)) return;
+  const bool isLink = there.facts.kind == NSFileProviderItemKind::symbolicLink ||
+                      there.facts.kind == NSFileProviderItemKind::alias;
+  if (!isLink) return;
+  row->item = there.id;
+  row->local.inode = there.facts.inode;
+}
+
+void CloudApplier::waitForPlace(const DocumentRecord &document) {
+  const auto parent = context_.store.byRecord(document.parent);
+  const bool wasDeleted = parent && parent->item != 0 && !context_.files.item(parent->item);
+  // A folder that is there can't be opened only for a while: it was moved a moment ago, as a rule.
+  if (ContainerOfRecord(document.parent) || (parent && !wasDeleted))
+    return context_.store.fetchAgain(document.record);
+  context_.store.keepOrphan(document.record, document.parent);
+  if (!wasDeleted) return;
+  // Deleted here, and given something new elsewhere, a folder lives.
+  context_.store.dropQueued(parent->item);
+  bringBack(*parent);
+}
+
 void CloudApplier::apply(const DocumentRecord &document) {
   context_.store.dropOrphan(document.record);
   auto row = context_.store.byRecord(document.record);
@@ -232,14 +257,11 @@ void CloudApplier::apply(const DocumentRecord &document) {
     return;
   Place place;
   if (!openPlace(document.parent, &place)) {
-    // A folder that can't be opened now was moved a moment ago, as a rule; the next fetch tries again.
-    if (context_.store.byRecord(document.parent))
-      context_.store.fetchAgain(document.record);
-    else
-      context_.store.keepOrphan(document.record, document.parent);
+    waitForPlace(document);
     return;
   }
   ++applied_;
+  if (row && row->item == 0 && !row->tag.empty() && !document.target.empty()) findLink(&*row);
   const auto item = row && row->item != 0 ? context_.files.item(row->item) : std::nullopt;
   if (item) {
     change(document, place, *row, *item);
@@ -353,9 +375,9 @@ void CloudApplier::removeFolders() {
     const bool isGone = result == 0 || errno == ENOENT;
     context_.store.erase(folder.record);
     touch(folder.path);
-    if (isGone) continue;
-    // It gets another record, which what is in it has to be told to be in.
-    if (row && row->item != 0) context_.store.enqueue(row->item, false, false);
+    if (isGone || !row || row->item == 0) continue;
+    // It gets a record of its own, which what is left in it has to be told.
+    context_.store.enqueue(row->item, false, false);
     for (const SyncRow &child : context_.store.childrenOf(folder.record, UINT32_MAX))
       if (child.item != 0) context_.store.enqueue(child.item, false, false);
   }

@@ -48,6 +48,8 @@ class CloudApplier {
   void removeUnseen();
   void sendAgain(const std::string &record);
   void apply(const DocumentRecord &document);
+  void findLink(SyncRow *row);
+  void waitForPlace(const DocumentRecord &document);
   bool openPlace(const std::string &parentRecord, Place *place);
 
   void create(const DocumentRecord &document, const Place &place, SyncRow row);

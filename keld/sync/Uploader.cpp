@@ -67,6 +67,7 @@ Uploader::Round Uploader::sendDue(const CKCallContext &call) {
     if (cloudProblem_ || inlineBytes_ >= kInlineBytes || call.isCancelled()) break;
   }
   round.cloudProblem = cloudProblem_;
+  context_.states.flush();
   if (call.isCancelled() || (saves.empty() && removals.empty())) {
     round.moreIsDue = !cloudProblem_ && due.size() == kRecordsAtATime;
     return round;

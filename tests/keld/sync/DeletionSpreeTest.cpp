@@ -156,8 +156,8 @@ TEST_F(DeletionSpree, aReplicaThatIsTakenAwayWhileTheDaemonRunsDeletesNothing) {
   device.keld.write("only", "one document");
   ASSERT_FALSE(device.waitForUploads());
   std::filesystem::rename(device.keld.replica(), device.keld.replica() + "-away");
-  hand.put("news", "from anna");
   const int calls = cloud->count(Call::fetchZoneChanges);
+  hand.put("news", "from anna");
   ASSERT_TRUE(eventually([&] { return cloud->count(Call::fetchZoneChanges) > calls; }));
   device.keld.stop();
   EXPECT_TRUE(hand.at("only"));

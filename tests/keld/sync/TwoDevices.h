@@ -1,5 +1,6 @@
 #pragma once
 
+#include <algorithm>
 #include <chrono>
 #include <memory>
 #include <string>
@@ -28,6 +29,14 @@ class Device {
   std::string read(const std::string &path) {
     std::ifstream file(keld.at(path), std::ios::binary);
     return {std::istreambuf_iterator<char>(file), {}};
+  }
+  // What is in the folder, as the disk has it.
+  std::vector<std::string> names(const std::string &path = "") {
+    std::vector<std::string> names;
+    for (const auto &entry : std::filesystem::directory_iterator(keld.at(path)))
+      names.push_back(entry.path().filename().string());
+    std::sort(names.begin(), names.end());
+    return names;
   }
   bool exists(const std::string &path) {
     return std::filesystem::exists(std::filesystem::symlink_status(keld.at(path)));
