@@ -91,6 +91,20 @@ void CloudApplier::changeContents(const DocumentRecord &document, const Place &p
     touch(location.path);
     return;
   }
+  const bool isThere = look.kind == DocumentClass::present && look.marker->recordName == row.record &&
+                       look.marker->digest == document.content.digest;
+  if (isThere) {
+    // It was put in place already, and the process ended before that was written down.
+    row.tag = document.tag;
+    row.content = document.content;
+    row.local = LocalFileOf(look.facts);
+    row.isDataless = false;
+    row.newerTag.clear();
+    context_.store.put(row);
+    context_.store.enqueue(row.item, false, false);
+    touch(location.path);
+    return;
+  }
   if (isIntact) {
     // The newer version is fetched first, and then put in its place at once.
     row.newerTag = document.tag;

@@ -101,6 +101,14 @@ Downloads::Try Downloads::attempt(std::uint64_t number, ItemNumber item,
     return Try::ended;
   }
   const bool isPresent = look.kind == DocumentClass::present || look.kind == DocumentClass::plain;
+  const bool isThere = isNewer && look.kind == DocumentClass::present &&
+                       look.marker->recordName == row->record && look.marker->digest == row->newer.digest;
+  if (isThere) {
+    // It was put in place already, and the process ended before that was written down.
+    takeNewer(item, row->newerTag, LocalFileOf(look.facts));
+    states_.show({item, false, true, LocalFileOf(look.facts), true});
+    return Try::ended;
+  }
   if (isNewer && isPresent && !IsSameContents(LocalFileOf(look.facts), row->local)) {
     // Written here meanwhile: the sync keeps both.
     store_.enqueue(item, false, false);
@@ -115,19 +123,24 @@ Downloads::Try Downloads::attempt(std::uint64_t number, ItemNumber item,
   };
   const Try outcome = fill(number, *location, wanted, publish, cancellation, error);
   if (outcome == Try::ended && !*error && isNewer) {
-    // What it was replaced by is what the cloud has.
-    store_.transaction([&] {
-      auto now = store_.byItem(item);
-      if (!now || now->newerTag != row->newerTag) return;
-      now->tag = now->newerTag;
-      now->content = now->newer;
-      now->newerTag.clear();
-      now->newer = {};
-      now->isDataless = false;
-      store_.put(*now);
-    });
+    takeNewer(item, row->newerTag, std::nullopt);
   }
   return outcome;
+}
+
+// The document is now what the cloud has.
+void Downloads::takeNewer(ItemNumber item, const std::string &tag, std::optional<LocalFile> file) {
+  store_.transaction([&] {
+    auto now = store_.byItem(item);
+    if (!now || now->newerTag != tag) return;
+    now->tag = now->newerTag;
+    now->content = now->newer;
+    now->newerTag.clear();
+    now->newer = {};
+    now->isDataless = false;
+    if (file) now->local = *file;
+    store_.put(*now);
+  });
 }
 
 Downloads::Try Downloads::fill(std::uint64_t number, const FileLocation &location,

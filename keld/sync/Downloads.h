@@ -94,6 +94,7 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
   Try fill(std::uint64_t number, const FileLocation &location, const DocumentMarker &wanted,
            const std::function<ContentsResult(PartFile &part, PartUse use)> &publish,
            const std::shared_ptr<CKCancellation> &cancellation, NSError *error);
+  void takeNewer(ItemNumber item, const std::string &tag, std::optional<LocalFile> file);
   NSError receive(std::uint64_t number, const CKAssetReference &asset, PartFile &part,
                   const std::shared_ptr<CKCancellation> &cancellation);
   void published(ItemNumber item, const FileLocation &location, const ContentsResult &result);
