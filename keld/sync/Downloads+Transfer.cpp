@@ -113,6 +113,14 @@ Downloads::Try Downloads::attempt(std::uint64_t number, ItemNumber item,
     *error = qvc_error(QVErrorDatabase, location->path + ": nothing says which contents it has");
     return Try::ended;
   }
+  const bool isThere = isNewer && look.kind == DocumentClass::present &&
+                       look.marker->recordName == row->record && look.marker->digest == row->newer.digest;
+  if (isThere) {
+    // It was put in place already, and the process ended before that was written down.
+    becameNewer(row->newerTag);
+    states_.show({item, false, true, LocalFileOf(look.facts), true});
+    return Try::ended;
+  }
   const bool isDataless = look.kind == DocumentClass::dataless;
   const bool isConflict = isNewer && !isDataless && !IsSameContents(LocalFileOf(look.facts), row->local) &&
                           look.kind != DocumentClass::present;

@@ -54,13 +54,13 @@ std::unique_ptr<Workload::Open> Workload::open(const std::string &path, int flag
   if (opened->file < 0 || ::fstat(opened->file, &status) != 0 || !S_ISREG(status.st_mode)) return nullptr;
   opened->inode = status.st_ino;
   const auto mark = ReadMark(opened->file);
-  const bool isAway = mark && (mark->state == 'd' || mark->state == 'e');
-  opened->hasContents = !isAway;
-  if (isAway) {
-    opened->version = model_.byDigest(mark->digest);
-  } else if (const auto text = ReadAll(opened->file)) {
-    opened->version = ReadDocumentText(*text);
-  }
+  // What was written since the mark was set counts, and not what the mark says.
+  const auto text = ReadAll(opened->file);
+  opened->version = text ? ReadDocumentText(*text) : std::nullopt;
+  opened->hasContents = opened->version && !(mark && mark->state == 'e');
+  const bool isAway =
+      mark && (mark->state == 'e' || (mark->state == 'd' && ::lseek(opened->file, 0, SEEK_DATA) < 0));
+  if (!opened->version && isAway && status.st_size > 0) opened->version = model_.byDigest(mark->digest);
   return opened;
 }
 
