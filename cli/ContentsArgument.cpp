@@ -106,8 +106,9 @@ int forEachContents(CommandContext &context, const std::vector<std::string> &arg
   return first;
 }
 
-CallResult<QVContentsStatus> contentsStatus(CommandContext &context, const ContentsArgument &contents) {
-  DaemonClient daemon(context.daemon, context.timeout);
+CallResult<QVContentsStatus> contentsStatus(CommandContext &context, const ContentsArgument &contents,
+                                            std::optional<std::chrono::milliseconds> patience) {
+  DaemonClient daemon(context.daemon, patience.value_or(context.timeout));
   CallResult<QVContentsStatus> sum;
   for (std::size_t index = 0; index < contents.urls.size(); ++index) {
     const auto part = daemon.contentsStatus(contents.urls[index]);

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <chrono>
 #include <functional>
 #include <optional>
 #include <string>
@@ -30,7 +31,9 @@ std::optional<ContentsArgument> resolveContents(CommandContext &context, const s
 int forEachContents(CommandContext &context, const std::vector<std::string> &arguments,
                     const std::function<int(const ContentsArgument &)> &command);
 
-// Takes everything below the root's URLs together.
-CallResult<QVContentsStatus> contentsStatus(CommandContext &context, const ContentsArgument &contents);
+// Takes everything below the root's URLs together. Waits for each answer as long as any question may take, or
+// for `patience`: where somebody may press Ctrl-C meanwhile.
+CallResult<QVContentsStatus> contentsStatus(CommandContext &context, const ContentsArgument &contents,
+                                            std::optional<std::chrono::milliseconds> patience = {});
 
 }  // namespace droxa

@@ -37,14 +37,14 @@ int download(CommandContext &context, const ContentsArgument &contents, bool jso
       materialise(context, contents,
                   {true, true, [&progress](const QVContentsStatus &status) { progress.show(status); }});
   progress.clear();
-  const auto after = contentsStatus(context, contents);
-  const QVContentsStatus &status = after.error ? before.value : after.value;
   if (end.wasStopped) {
-    if (json) context.out << contentsJSON(contents, status, "cancelled") << std::endl;
+    if (json) context.out << contentsJSON(contents, before.value, "cancelled") << std::endl;
     context.err << "droxa: " << escapedText(contents.argument)
                 << ": cancelled; documents that are here stay, and the same command goes on" << std::endl;
     return kExitInterrupted;
   }
+  const auto after = contentsStatus(context, contents);
+  const QVContentsStatus &status = after.error ? before.value : after.value;
   if (end.error) {
     if (json) context.out << contentsJSON(contents, status, "failed") << std::endl;
     const int exitStatus = reportError(context, contents.argument, end.error);

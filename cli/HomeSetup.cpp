@@ -21,6 +21,7 @@ bool isEmpty(const std::string &folder) {
 
 bool importFolder(const HomeSetupRequest &request, HomeSetup *setup, std::string *problem) {
   const FolderImportResult result = request.import(*request.folder);
+  setup->imported = result.documents;
   setup->isStopped = result.end == FolderImportResult::End::stopped;
   if (result.end == FolderImportResult::End::failed)
     *problem =

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstdint>
 #include <functional>
 #include <optional>
 #include <string>
@@ -10,9 +11,10 @@
 namespace droxa {
 
 struct HomeSetup {
-  bool isNew = false;      // documents were put into it, or its cloud, now
-  bool isStopped = false;  // by Ctrl-C, in the middle
-  std::string summary;     // one line about where its documents come from
+  bool isNew = false;          // documents were put into it, or its cloud, now
+  bool isStopped = false;      // by Ctrl-C, in the middle
+  std::uint64_t imported = 0;  // documents that were put into the cloud
+  std::string summary;         // one line about where its documents come from
 };
 
 struct HomeSetupRequest {

@@ -17,6 +17,7 @@ using Clock = std::chrono::steady_clock;
 
 constexpr auto kLook = 50ms;
 constexpr auto kCancelPatience = 2s;
+constexpr auto kQuestionPatience = 1s;
 constexpr std::chrono::nanoseconds kProgressInterval = 200ms;
 
 // One providing under way.
@@ -52,7 +53,7 @@ class Wait {
   void tellProgress() {
     const auto began = Clock::now();
     if (!options_.progress || began < nextQuestion_) return;
-    const auto status = contentsStatus(context_, contents_);
+    const auto status = contentsStatus(context_, contents_, kQuestionPatience);
     const auto now = Clock::now();
     nextQuestion_ = now + std::max<std::chrono::nanoseconds>(kProgressInterval, 10 * (now - began));
     if (!status.error) options_.progress(status.value);

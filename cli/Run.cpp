@@ -24,6 +24,7 @@ namespace fs = std::filesystem;
 using namespace std::chrono_literals;
 
 constexpr auto kStartPatience = 30s;
+constexpr auto kShowPatience = 10s;
 constexpr auto kForever = std::chrono::hours(24 * 365);
 
 std::string programBeside(const char *name) {
@@ -60,7 +61,8 @@ class Run {
 
   int serve(const HomeSetup &setup) {
     std::string problem;
-    const Outcome outcome = startAll(setup.isNew, &problem);
+    Outcome outcome = startAll(setup.isNew, &problem);
+    if (outcome == Outcome::ready) outcome = awaitDocuments(setup.imported);
     if (outcome == Outcome::stopped) return kExitSuccess;
     if (outcome == Outcome::failed) {
       supervisor_.stop();
@@ -124,6 +126,20 @@ class Run {
     if (!child.lastEnd().empty()) *problem += " (" + child.lastEnd() + ")";
     *problem += "; its log: " + child.logFile();
     return Outcome::failed;
+  }
+
+  // A drive is ready when what was put into its cloud is shown; of very many documents the rest follows.
+  Outcome awaitDocuments(std::uint64_t imported) {
+    const auto isShown = [this, imported] {
+      const auto status = daemon_.status();
+      const auto transfers = daemon_.transferStatus();
+      return !status.error && !transfers.error && status.value.documents >= imported &&
+             transfers.value.uploads.queued + transfers.value.uploads.active == 0;
+    };
+    const auto until = ChildProcess::Clock::now() + kShowPatience;
+    while (imported > 0 && !isShown() && ChildProcess::Clock::now() < until)
+      if (supervisor_.keepRunning(50ms)) return Outcome::stopped;
+    return Outcome::ready;
   }
 
   bool signInSomebody(std::string *problem) {

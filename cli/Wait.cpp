@@ -6,6 +6,7 @@
 #include "cli/DaemonClient.h"
 #include "cli/ExitStatus.h"
 #include "cli/Text.h"
+#include "tessaly/QVErrors.h"
 
 namespace droxa {
 
@@ -17,6 +18,7 @@ using Clock = std::chrono::steady_clock;
 
 constexpr auto kLook = 100ms;
 constexpr auto kBetweenQuestions = 2s;
+constexpr auto kQuestionPatience = 1s;
 
 // One thing that is waited for.
 struct Awaited {
@@ -33,7 +35,7 @@ class Hindrance {
   void tell() {
     if (Clock::now() < nextQuestion_) return;
     nextQuestion_ = Clock::now() + kBetweenQuestions;
-    const auto status = DaemonClient(context_.daemon, context_.timeout).transferStatus();
+    const auto status = DaemonClient(context_.daemon, kQuestionPatience).transferStatus();
     if (status.error || status.value.cloudProblem == told_) return;
     told_ = status.value.cloudProblem;
     if (!told_.empty())
@@ -59,9 +61,13 @@ void printEnd(CommandContext &context, const WaitOptions &options, const Awaited
   }
 }
 
-// The cloud knows what is wrong with a document better than what it is to be done about: its words are kept.
+// Elsewhere the advice for what isn't sent is to wait; here the daemon's words say what can't be.
 int reportUnsent(CommandContext &context, const Awaited &awaited, const NSError &error) {
-  return reportError(context, awaited.name.empty() ? "not everything is in the cloud" : awaited.name, error);
+  const std::string asked = awaited.name.empty() ? "not everything is in the cloud" : awaited.name;
+  if (!error.is(QVTessalyErrorDomain, QVErrorUnsentChanges)) return reportError(context, asked, error);
+  context.err << "droxa: " << escapedText(asked) << ": " << escapedText(error.localizedDescription())
+              << std::endl;
+  return kExitFailure;
 }
 
 int await(CommandContext &context, const WaitOptions &options, const Awaited &awaited,

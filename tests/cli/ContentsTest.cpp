@@ -238,6 +238,9 @@ TEST_F(Contents, waitSaysWhatFailed) {
   keld->replies().failNext("waitForUploadAtURL", NSError(NSCocoaErrorDomain, 4354));
   EXPECT_EQ(wait({{"a.txt"}, {}, false}), 73);
   EXPECT_TRUE(said("a.txt: the cloud has no room")) << err.str();
+  keld->replies().failNext("waitForUploadAtURL", qvc_error(QVErrorUnsentChanges, "deletions are held"));
+  EXPECT_EQ(wait({}), 1);
+  EXPECT_EQ(err.str(), "droxa: not everything is in the cloud: deletions are held\n");
 }
 
 TEST_F(Contents, statusOfItemsTellsWhereTheyAre) {

@@ -156,6 +156,30 @@ TEST_F(Contents, aReaderThatIsKilledEndsItsDownload) {
   EXPECT_EQ(cat->output(), "");
 }
 
+TEST_F(Contents, aReaderThatGoesEndsCatAsAnyCommandOfAPipe) {
+  writeFile(source() + "/long", std::string(3'000'000, 'x'));
+  startWithSource();
+  ASSERT_TRUE(drive.waitForName("long"));
+  const std::string script = std::string(DROXA_BIN_DIR) + "/droxa --home " + drive.home() +
+                             " cat long | head -c 5; echo \" ${PIPESTATUS[0]}\"";
+  Process pipe({"/bin/bash", "-c", script}, drive.home() + "/output", "pipe");
+  EXPECT_EQ(pipe.wait(), 0);
+  EXPECT_EQ(pipe.output(), "xxxxx 141\n") << pipe.errors();
+}
+
+TEST_F(Contents, ctrlCEndsADownloadFromADaemonThatHangs) {
+  writeFile(source() + "/large", "");
+  fs::resize_file(source() + "/large", 700'000'000);
+  startWithSource();
+  ASSERT_TRUE(drive.waitForName("large"));
+  const auto download = drive.droxaInBackground({"download", "large"}, "download");
+  ASSERT_TRUE(eventually([&] { return contentsOf("large") == "downloading"; })) << download->output();
+  drive.keld().signal(SIGSTOP);
+  download->signal(SIGINT);
+  EXPECT_EQ(download->wait(15s), 130) << download->errors();
+  drive.keld().signal(SIGCONT);
+}
+
 TEST_F(Contents, aCloudThatIsAwayIsSaidWithStatus75) {
   writeFile(source() + "/a.txt", "a");
   startWithSource();
