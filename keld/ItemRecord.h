@@ -69,6 +69,14 @@ struct ItemRecord {
   bool isFolder() const { return facts.kind == NSFileProviderItemKind::folder; }
 };
 
+// A link on the disk; whether it is an alias depends on what is at its target.
+inline bool IsLink(NSFileProviderItemKind kind) {
+  return kind == NSFileProviderItemKind::symbolicLink || kind == NSFileProviderItemKind::alias;
+}
+inline bool IsSameKind(NSFileProviderItemKind a, NSFileProviderItemKind b) {
+  return a == b || (IsLink(a) && IsLink(b));
+}
+
 inline QVFileObjectID FileObjectID(ItemNumber id, NSFileProviderItemKind kind) {
   const bool isDocument =
       kind == NSFileProviderItemKind::document || kind == NSFileProviderItemKind::symbolicLink;

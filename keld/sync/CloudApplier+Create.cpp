@@ -135,8 +135,7 @@ CloudApplier::Taken CloudApplier::resolveTaken(const DocumentRecord &document, c
     if (row->item != 0) context_.store.enqueue(row->item, false, false);  // shown as sent, if it is that
     return Taken::isIt;
   }
-  const bool isLink =
-      facts->kind == NSFileProviderItemKind::symbolicLink || facts->kind == NSFileProviderItemKind::alias;
+  const bool isLink = IsLink(facts->kind);
   if (isLink && !document.target.empty()) {
     char target[4096];
     const ssize_t length = ::readlinkat(there.folder.get(), name.c_str(), target, sizeof target);

@@ -227,8 +227,7 @@ void CloudApplier::findLink(SyncRow *row) {
   const auto path = context_.files.path(*row);
   ItemRecord there;
   if (!path || !context_.files.itemAtPath(*path, &there) || context_.store.byItem(there.id)) return;
-  const bool isLink = there.facts.kind == NSFileProviderItemKind::symbolicLink ||
-                      there.facts.kind == NSFileProviderItemKind::alias;
+  const bool isLink = IsLink(there.facts.kind);
   if (!isLink) return;
   row->item = there.id;
   row->local.inode = there.facts.inode;
@@ -330,8 +329,7 @@ void CloudApplier::remove(const std::string &record) {
 
 void CloudApplier::removeDocument(const SyncRow &row, const FileLocation &location) {
   const auto facts = ReadFileFacts(location.folder.get(), location.name, 0);
-  const bool isLink = facts && (facts->kind == NSFileProviderItemKind::symbolicLink ||
-                                facts->kind == NSFileProviderItemKind::alias);
+  const bool isLink = facts && (IsLink(facts->kind));
   bool isUnchanged = isLink || !facts;
   if (row.kind == NSFileProviderItemKind::document) {
     const DocumentLook look = context_.storage.classify(location.folder.get(), location.name);

@@ -186,11 +186,10 @@ void LocalExaminer::examineLive(const ItemRecord &item) {
 }
 
 bool LocalExaminer::isClean(const ItemRecord &item, SyncRow &row, const std::string &parent) {
-  if (row.tag.empty() || row.parent != parent || row.name != item.name || row.kind != item.facts.kind)
+  if (row.tag.empty() || row.parent != parent || row.name != item.name ||
+      !IsSameKind(row.kind, item.facts.kind))
     return false;
-  const bool isLink = item.facts.kind == NSFileProviderItemKind::symbolicLink ||
-                      item.facts.kind == NSFileProviderItemKind::alias;
-  if (isLink) return row.local.inode == 0 || row.local.inode == item.facts.inode;
+  if (IsLink(item.facts.kind)) return row.local.inode == 0 || row.local.inode == item.facts.inode;
   if ((row.content.mode & 0777) != (item.facts.mode & 0777)) return false;
   return item.facts.kind == NSFileProviderItemKind::folder || hasSyncedContents(item, row);
 }
@@ -220,7 +219,7 @@ bool LocalExaminer::bind(const ItemRecord &item, const std::string &parent) {
   const bool isFolder = item.facts.kind == NSFileProviderItemKind::folder;
   if (!isDocument && !isFolder) {
     const auto row = store_.byName(parent, item.name);
-    return row && row->item == 0 && row->kind == item.facts.kind && bindLink(item, *row);
+    return row && row->item == 0 && IsLink(row->kind) && bindLink(item, *row);
   }
   const auto location = files_.locate(item.id, nullptr);
   if (!location) return false;

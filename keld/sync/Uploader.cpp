@@ -202,7 +202,7 @@ Uploader::Prepared Uploader::prepareSave(const ItemRecord &item, Plan *plan, con
 bool Uploader::changesAnything(const Plan &plan) {
   const SyncRow &row = plan.row;
   return row.tag.empty() || plan.changesTarget || row.parent != plan.document.parent ||
-         row.name != plan.document.name || row.kind != plan.document.kind ||
+         row.name != plan.document.name || !IsSameKind(row.kind, plan.document.kind) ||
          (row.content.mode & 0777) != (plan.document.content.mode & 0777);
 }
 
