@@ -94,6 +94,7 @@ TEST_F(Contents, aPinnedDocumentStaysAndAFolderPinsWhatIsInIt) {
   writeFile(source() + "/kept/a.txt", "a");
   startWithSource();
   ASSERT_TRUE(drive.waitForName("a.txt", "kept"));
+  ASSERT_TRUE(eventually([&] { return contentsOf("kept/a.txt") == "dataless"; }));
   ASSERT_EQ(drive.droxa({"pin", "kept"}).status, 0);
   EXPECT_TRUE(eventually([&] { return contentsOf("kept/a.txt") == "present"; }));
   for (const char *path : {"kept", "kept/a.txt"}) {
