@@ -101,6 +101,7 @@ class Import {
     }
     std::vector<std::string> words = command;
     std::vector<char *> argv;
+    argv.reserve(words.size() + 1);
     for (std::string &word : words) argv.push_back(word.data());
     argv.push_back(nullptr);
     posix_spawn_file_actions_t actions;
