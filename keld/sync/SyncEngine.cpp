@@ -260,7 +260,9 @@ void SyncEngine::round() {
     answerWaiters();
     return;
   }
+  const bool isPoll = std::chrono::steady_clock::now() >= nextPoll_;
   if (fetches) fetch();
+  if (isPoll) bringBackUnseen();
   const std::uint64_t before = uploader_.totals().bytes;
   const Uploader::Round sent = uploader_.sendDue(call(kCallTimeout));
   {
@@ -341,6 +343,16 @@ void SyncEngine::noteCloudProblem(const NSError &error) {
   if (isNews) os_log_error(qvc_default_log(), "[ERROR] the cloud: %@", error);
   retryPause_ = std::min(std::max(retryPause_ * 2, kFirstPause), kLongestPause);
   nextPoll_ = std::chrono::steady_clock::now() + retryPause_;
+}
+
+// What was made here and was gone again before the keeper saw it: no deletion is known of it, so it comes
+// back. Whatever the keeper is about to see has been seen one poll later.
+void SyncEngine::bringBackUnseen() {
+  std::set<std::string> before = std::exchange(unbound_, {});
+  for (const SyncRow &row : store_.unbound(kVersionsAtATime)) {
+    unbound_.insert(row.record);
+    if (before.count(row.record) > 0) applier_.bringBack(row);
+  }
 }
 
 // The versions that wait to replace what is here are fetched by the downloads.

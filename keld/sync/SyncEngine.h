@@ -5,6 +5,7 @@
 #include <functional>
 #include <memory>
 #include <optional>
+#include <set>
 #include <string>
 #include <thread>
 #include <vector>
@@ -91,6 +92,7 @@ class SyncEngine {
   void noteCloudProblem(const NSError &error);
   void answerWaiters();
   void startWaitingVersions();
+  void bringBackUnseen();
   void waitForWork();
   CKCallContext call(std::chrono::milliseconds timeout) const;
 
@@ -114,6 +116,7 @@ class SyncEngine {
   bool isCloudReady_ = false;
   bool moreIsDue_ = false;
   std::vector<Waiter> waiting_;
+  std::set<std::string> unbound_;  // records at the last poll
   std::chrono::milliseconds retryPause_{0};
   std::chrono::steady_clock::time_point nextPoll_;
 

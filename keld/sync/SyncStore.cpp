@@ -31,6 +31,7 @@ CREATE TABLE IF NOT EXISTS rows(
 ) WITHOUT ROWID;
 CREATE UNIQUE INDEX IF NOT EXISTS rows_item ON rows(item) WHERE item <> 0;
 CREATE INDEX IF NOT EXISTS rows_name ON rows(parent, name);
+CREATE INDEX IF NOT EXISTS rows_unbound ON rows(record) WHERE item = 0;
 CREATE INDEX IF NOT EXISTS rows_newer ON rows(newerTag) WHERE newerTag <> '';
 CREATE TABLE IF NOT EXISTS orphans(record TEXT PRIMARY KEY, parent TEXT NOT NULL) WITHOUT ROWID;
 CREATE INDEX IF NOT EXISTS orphans_parent ON orphans(parent);
@@ -160,6 +161,13 @@ std::vector<SyncRow> SyncStore::childrenOf(const std::string &parent, std::uint6
   const RecursiveLock lock(mutex_);
   SqlStatement &asked = statement("SELECT " ROW_COLUMNS " FROM rows WHERE parent = ? LIMIT ?");
   asked.bindText(1, parent).bind(2, limit);
+  return all(asked);
+}
+
+std::vector<SyncRow> SyncStore::unbound(std::uint64_t limit) {
+  const RecursiveLock lock(mutex_);
+  SqlStatement &asked = statement("SELECT " ROW_COLUMNS " FROM rows WHERE item = 0 AND tag <> '' LIMIT ?");
+  asked.bind(1, limit);
   return all(asked);
 }
 

@@ -83,6 +83,7 @@ class SyncStore {
   std::optional<SyncRow> byItem(ItemNumber item);
   std::optional<SyncRow> byName(const std::string &parent, const std::string &name);
   std::vector<SyncRow> childrenOf(const std::string &parent, std::uint64_t limit);
+  std::vector<SyncRow> unbound(std::uint64_t limit);  // in the cloud, and no item stands for them yet
   std::vector<SyncRow> withNewerVersion(std::uint64_t limit);
   void put(const SyncRow &row);
   void erase(const std::string &record);
