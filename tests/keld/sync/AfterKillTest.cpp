@@ -45,6 +45,18 @@ TEST_F(AfterKill, whatTheTableDoesNotSayIsWorkedOutAnew) {
       eventually([&] { return ben.keld.record("notes.txt")->flags == (kDatalessFlag | kUploadedFlag); }));
 }
 
+TEST_F(AfterKill, whatWasMadeAndNotWrittenDownIsShownAsDataless) {
+  share("notes.txt", "hello");
+  ben.keld.stop();
+  change(ben, "keld.sqlite", "UPDATE items SET flags = 0 WHERE name = CAST('notes.txt' AS BLOB)");
+  change(ben, "sync.sqlite", "DELETE FROM rows; DELETE FROM meta WHERE key = 'changeToken'");
+  ben.keld.start();
+  ben.keld.waitForFirstScan();
+  EXPECT_TRUE(
+      eventually([&] { return ben.keld.record("notes.txt")->flags == (kDatalessFlag | kUploadedFlag); }));
+  EXPECT_EQ(ben.contents("notes.txt"), "hello");
+}
+
 TEST_F(TwoDevices, whatWasDeletedInARenamedFolderGoes) {
   anna.keld.folder("work");
   share("work/one.txt", "1");
