@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "keld/sync/CloudErrors.h"
+#include "keld/sync/ReplicaBarrier.h"
 #include "platform/dispatch/dispatch.h"
 #include "tessaly/QVContainer.h"
 #include "tessaly/QVErrors.h"
@@ -71,6 +72,7 @@ void SyncEngine::start(const std::string &itemDatabase) {
   if (store_.number(kEndedWell) == 0) store_.setNumber("examinedRank", 0);
   store_.setNumber(kEndedWell, 0);
   storage_->recover();
+  RemoveOldMarks(files_.replicaPath());
   nextPoll_ = std::chrono::steady_clock::now();
   thread_ = std::thread([this] { run(); });
 }

@@ -45,6 +45,14 @@ TEST_F(AfterKill, whatTheTableDoesNotSayIsWorkedOutAnew) {
       eventually([&] { return ben.keld.record("notes.txt")->flags == (kDatalessFlag | kUploadedFlag); }));
 }
 
+TEST_F(AfterKill, aMarkOfAWaitIsRemoved) {
+  ben.keld.stop();
+  const std::string mark = ben.keld.at("") + "/../.mark-1-1";
+  ben.keld.write(mark);
+  ben.keld.start();
+  EXPECT_FALSE(std::filesystem::exists(mark));
+}
+
 TEST_F(AfterKill, whatWasMadeAndNotWrittenDownIsShownAsDataless) {
   share("notes.txt", "hello");
   ben.keld.stop();
@@ -90,7 +98,7 @@ TEST_F(TwoDevices, whatIsInAFolderThatWasDeletedElsewhereStaysOnBoth) {
   EXPECT_EQ(ben.read("shared/new.txt"), "new");
 }
 
-// A device whose downloads hang while the test wants them to.
+// A device whose downloads fail while the test wants them to.
 class WaitingVersion : public testing::Test {
  protected:
   static KeldOptions optionsWith(std::shared_ptr<CKCloud> cloud) {
@@ -124,12 +132,13 @@ TEST_F(WaitingVersion, anEditUnderAVersionThatWaitsIsKeptBesideIt) {
   ASSERT_FALSE(anna.waitForUploads());
   ASSERT_TRUE(ben.knowsSoon("notes.txt"));
   ASSERT_EQ(ben.contents("notes.txt"), "base");
-  FaultyCloud::Fault hanging;
-  hanging.hangs = true;
-  faulty->onEveryCall(FaultyCloud::Call::readAsset, hanging);
+  FaultyCloud::Fault failing;
+  failing.error = CKErrorMake(CKErrorCode::networkFailure, "no way there");
+  faulty->onEveryCall(FaultyCloud::Call::readAsset, failing);
+  const int before = faulty->count(FaultyCloud::Call::readAsset);
   anna.keld.write("notes.txt", "from anna");
   ASSERT_FALSE(anna.waitForUploads());
-  ASSERT_TRUE(eventually([&] { return faulty->hanging() > 0; }));
+  ASSERT_TRUE(eventually([&] { return faulty->count(FaultyCloud::Call::readAsset) > before; }));
   ben.keld.write("notes.txt", "from ben!!");
   EXPECT_FALSE(ben.waitForUploads());
   faulty->clearFaults();
