@@ -55,6 +55,8 @@ TEST_F(AfterKill, aMarkOfAWaitIsRemoved) {
 
 TEST_F(AfterKill, whatWasMadeAndNotWrittenDownIsShownAsDataless) {
   share("notes.txt", "hello");
+  ASSERT_TRUE(
+      eventually([&] { return ben.keld.record("notes.txt")->flags == (kDatalessFlag | kUploadedFlag); }));
   ben.keld.stop();
   change(ben, "keld.sqlite", "UPDATE items SET flags = 0 WHERE name = CAST('notes.txt' AS BLOB)");
   change(ben, "sync.sqlite", "DELETE FROM rows; DELETE FROM meta WHERE key = 'changeToken'");
