@@ -118,15 +118,18 @@ int CopyContents(int from, int to, std::uint64_t size) {
   return 0;
 }
 
-void CopyForeignAttributes(int from, int to) {
+bool CopyForeignAttributes(int from, int to) {
+  bool copied = false;
   for (const auto &name : attributeNames(from)) {
     if (!isForeign(name)) continue;
     const ssize_t room = ::fgetxattr(from, name.c_str(), nullptr, 0);
     if (room < 0) continue;
     std::vector<char> value(static_cast<std::size_t>(room));
     const ssize_t length = ::fgetxattr(from, name.c_str(), value.data(), value.size());
-    if (length >= 0) ::fsetxattr(to, name.c_str(), value.data(), static_cast<std::size_t>(length), 0);
+    if (length < 0) continue;
+    if (::fsetxattr(to, name.c_str(), value.data(), static_cast<std::size_t>(length), 0) == 0) copied = true;
   }
+  return copied;
 }
 
 void RemoveAttributes(int descriptor) {

@@ -27,8 +27,8 @@ int SetModified(int descriptor, std::int64_t nanoseconds);
 int CopyContents(int from, int to, std::uint64_t size);
 
 // The user's own attributes (and access lists) follow a document into its new file. What can't be copied is
-// left behind.
-void CopyForeignAttributes(int from, int to);
+// left behind. Whether any was copied.
+bool CopyForeignAttributes(int from, int to);
 void RemoveAttributes(int descriptor);
 
 // Gives back all of a file's blocks; its size stays. 0 or an errno.

@@ -12,6 +12,7 @@
 namespace droxa::keld {
 
 namespace {
+constexpr std::uint64_t kWorthKeeping = 1 << 20;
 
 constexpr std::size_t kReadBytes = 128 * 1024;
 
@@ -92,7 +93,8 @@ ContentsResult PartFile::finish() {
   }
   isFinished_ = true;
   hash_.reset();
-  SyncFolder(partsFolder_);  // a part whose name is lost is downloaded again
+  // A part whose name is lost is downloaded again, which for a small one costs no more than this.
+  if (size_ >= kWorthKeeping) SyncFolder(partsFolder_);
   return {};
 }
 

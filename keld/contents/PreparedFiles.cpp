@@ -176,8 +176,8 @@ PreparedResult ContentsStorage::prepareContents(PartFile &part, PartUse use, Doc
   prepared.marker_ = marker;
   prepared.mode_ = mode & 07777;
   int error = use == PartUse::consume ? takePart(part, &prepared) : copyPart(part, &prepared);
+  // Its name here needn't be durable yet: a note makes it so before the document may come under it.
   if (error == 0) error = completeFile(prepared.file_.get(), marker, mode);
-  if (error == 0) error = SyncFolder(temporaries_.get());
   if (error != 0) {
     if (prepared && use == PartUse::consume) giveBack(prepared, part);
     return failedPreparation(error);

@@ -65,8 +65,8 @@ ContentsResult ContentsStorage::replaceOpened(int folder, const std::string &nam
   if (!capabilities_.exchange || prepared.kind_ == PreparedFile::Kind::promise)
     return replaceByTakingOut(folder, name, prepared, outgoing);
   if (prepared.kind_ == PreparedFile::Kind::contents && capabilities_.extendedAttributes) {
-    CopyForeignAttributes(outgoing.descriptor(), prepared.file_.get());
-    if (::fsync(prepared.file_.get()) != 0) return ContentsResult::failedWith(errno);
+    const bool hasChanged = CopyForeignAttributes(outgoing.descriptor(), prepared.file_.get());
+    if (hasChanged && ::fsync(prepared.file_.get()) != 0) return ContentsResult::failedWith(errno);
   }
   const int error = writeNote(prepared.temporary_, folder, name, outgoing, prepared.facts_);
   if (error != 0) return ContentsResult::failedWith(error);

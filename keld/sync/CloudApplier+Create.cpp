@@ -43,6 +43,9 @@ void CloudApplier::create(const DocumentRecord &document, const Place &place, Sy
     context_.store.fetchAgain(document.record);
   }
   context_.store.put(row);
+  // What was here already won't be looked at again: nothing about its file has changed.
+  const bool isDocument = row.kind == NSFileProviderItemKind::document;
+  if (made && row.item != 0) context_.states.show({row.item, row.isDataless, true, row.local, isDocument});
 }
 
 bool CloudApplier::createFolder(const DocumentRecord &document, const Place &place, SyncRow *row) {

@@ -99,8 +99,14 @@ void ContentsService::startDownloadAtURL(const NSURL &url, std::uint64_t options
     if (!item) return reply(nullptr, error);
     const bool isFolder = item->isFolder();
     std::vector<std::unique_ptr<Downloads::Interest>> interests;
-    for (const ItemRecord &document : self->documentsBelow(
-             *item, [&](const ItemRecord &child) { return !isFolder || (child.flags & kDatalessFlag) != 0; }))
+    // What the table shows of a document may be a moment behind what the sync knows.
+    const auto isWanted = [&](const ItemRecord &child) {
+      if (!isFolder || (child.flags & kDatalessFlag) != 0) return true;
+      if ((child.flags & kUploadedFlag) != 0) return false;
+      const auto row = self->engine_->store().byItem(child.id);
+      return row && row->isDataless;
+    };
+    for (const ItemRecord &document : self->documentsBelow(*item, isWanted))
       interests.push_back(self->engine_->downloads()->want(document.id, document.facts.size, priority));
     reply(DownloadTransfer::of(std::move(interests)), NSError());
   });

@@ -4,8 +4,10 @@
 #include <cerrno>
 #include <chrono>
 #include <fcntl.h>
+#include <filesystem>
 #include <thread>
 #include <unistd.h>
+#include <vector>
 
 #include "tessaly/QVContainer.h"
 
@@ -35,6 +37,16 @@ NSError WaitUntilReplicaIsSeen(const std::string &replicaPath, const ReplicaFile
   ::unlink(path.c_str());
   if (problem || isSeen) return problem;
   return NSError::errorWithPOSIXCode(ETIMEDOUT, replicaPath + ": the changes there aren't noticed");
+}
+
+void RemoveOldMarks(const std::string &replicaPath) {
+  std::error_code problem;
+  const std::string folder = replicaPath + "/" + QVUbiquitousDefaultContainerID;
+  std::vector<std::filesystem::path> marks;
+  for (std::filesystem::directory_iterator entry(folder, problem), end; !problem && entry != end;
+       entry.increment(problem))
+    if (entry->path().filename().string().compare(0, 6, ".mark-") == 0) marks.push_back(entry->path());
+  for (const auto &mark : marks) ::unlink(mark.c_str());
 }
 
 }  // namespace droxa::keld

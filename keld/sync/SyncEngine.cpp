@@ -9,6 +9,7 @@
 #include <utility>
 
 #include "keld/sync/CloudErrors.h"
+#include "keld/sync/ReplicaBarrier.h"
 #include "platform/dispatch/dispatch.h"
 #include "tessaly/QVContainer.h"
 #include "tessaly/QVErrors.h"
@@ -88,6 +89,7 @@ void SyncEngine::start(const std::string &itemDatabase) {
   if (store_.number(kEndedWell) == 0) store_.setNumber("examinedRank", 0);
   store_.setNumber(kEndedWell, 0);
   storage_->recover();
+  RemoveOldMarks(files_.replicaPath());
   nextPoll_ = std::chrono::steady_clock::now();
   thread_ = std::thread([this] { run(); });
 }
@@ -371,7 +373,9 @@ void SyncEngine::round() {
     answerWaiters();
     return;
   }
+  const bool isPoll = std::chrono::steady_clock::now() >= nextPoll_;
   if (fetches) fetch();
+  if (isPoll) bringBackUnseen();
   // What is new here may be known there, until all of that was seen.
   if (applier_.hasFetchedAll()) send();
   downloads_->retryDue();
@@ -492,6 +496,16 @@ void SyncEngine::noteCloudProblem(Direction direction, const NSError &error) {
   retryPause_ = std::min(std::max(retryPause_ * 2, kFirstPause), kLongestPause);
   if (const auto asked = CKErrorRetryAfter(error)) retryPause_ = std::max(retryPause_, *asked);
   nextPoll_ = std::chrono::steady_clock::now() + retryPause_;
+}
+
+// What was made here and was gone again before the keeper saw it: no deletion is known of it, so it comes
+// back. Whatever the keeper is about to see has been seen one poll later.
+void SyncEngine::bringBackUnseen() {
+  std::set<std::string> before = std::exchange(unbound_, {});
+  for (const SyncRow &row : store_.unbound(kVersionsAtATime)) {
+    unbound_.insert(row.record);
+    if (before.count(row.record) > 0) applier_.bringBack(row);
+  }
 }
 
 // The versions that wait to replace what is here are fetched by the downloads.

@@ -5,6 +5,7 @@
 #include <functional>
 #include <memory>
 #include <optional>
+#include <set>
 #include <string>
 #include <thread>
 #include <vector>
@@ -102,6 +103,7 @@ class SyncEngine {
   void noteCloudProblem(Direction direction, const NSError &error);
   void answerWaiters();
   void startWaitingVersions();
+  void bringBackUnseen();
   void waitForWork();
   CKCallContext call(std::chrono::milliseconds timeout) const;
 
@@ -127,6 +129,7 @@ class SyncEngine {
   bool isCloudReady_ = false;
   bool moreIsDue_ = false;
   std::vector<Waiter> waiting_;
+  std::set<std::string> unbound_;  // records at the last poll
   std::chrono::milliseconds retryPause_{0};
   std::chrono::milliseconds againPause_{0};  // before what couldn't be applied is fetched again
   NSError problems_[2];                      // by direction

@@ -33,6 +33,7 @@ CREATE TABLE IF NOT EXISTS rows(
 ) WITHOUT ROWID;
 CREATE UNIQUE INDEX IF NOT EXISTS rows_item ON rows(item) WHERE item <> 0;
 CREATE INDEX IF NOT EXISTS rows_name ON rows(parent, name);
+CREATE INDEX IF NOT EXISTS rows_unbound ON rows(record) WHERE item = 0;
 CREATE INDEX IF NOT EXISTS rows_newer ON rows(newerTag) WHERE newerTag <> '';
 CREATE TABLE IF NOT EXISTS orphans(record TEXT PRIMARY KEY, parent TEXT NOT NULL) WITHOUT ROWID;
 CREATE INDEX IF NOT EXISTS orphans_parent ON orphans(parent);
@@ -177,6 +178,13 @@ std::optional<SyncRow> SyncStore::byNewerTag(const std::string &tag) {
   SqlStatement &asked = statement("SELECT " ROW_COLUMNS " FROM rows WHERE newerTag = ? AND newerTag <> ''");
   asked.bindText(1, tag);
   return one(asked);
+}
+
+std::vector<SyncRow> SyncStore::unbound(std::uint64_t limit) {
+  const RecursiveLock lock(mutex_);
+  SqlStatement &asked = statement("SELECT " ROW_COLUMNS " FROM rows WHERE item = 0 AND tag <> '' LIMIT ?");
+  asked.bind(1, limit);
+  return all(asked);
 }
 
 std::vector<SyncRow> SyncStore::withNewerVersion(std::uint64_t limit) {

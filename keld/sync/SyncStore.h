@@ -84,6 +84,7 @@ class SyncStore {
   std::optional<SyncRow> byName(const std::string &parent, const std::string &name);
   std::vector<SyncRow> childrenOf(const std::string &parent, std::uint64_t limit);
   std::optional<SyncRow> byNewerTag(const std::string &tag);
+  std::vector<SyncRow> unbound(std::uint64_t limit);  // in the cloud, and no item stands for them yet
   std::vector<SyncRow> withNewerVersion(std::uint64_t limit);
   void put(const SyncRow &row);
   void erase(const std::string &record);

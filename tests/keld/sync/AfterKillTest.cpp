@@ -1,0 +1,152 @@
+// What a kill leaves behind, made by hand: the files, the databases and the cloud as they are then.
+
+#include "keld/Sql.h"
+#include "tests/keld/sync/TwoDevices.h"
+#include "tests/support/FaultyCloud.h"
+
+namespace droxa::keld {
+namespace {
+
+class AfterKill : public TwoDevices {
+ protected:
+  // Changes a device's database while its daemon is stopped.
+  void change(Device &device, const std::string &database, const char *sql) {
+    SqlDatabase opened(DroxaHome(device.keld.home().root()).state() + "/" + database,
+                       SqlDatabase::Access::readWrite, 100);
+    opened.execute(sql);
+  }
+};
+
+TEST_F(AfterKill, aVersionThatIsInPlaceAlreadyIsNoEdit) {
+  share("notes.txt", "hello");
+  ASSERT_EQ(ben.contents("notes.txt"), "hello");
+  ben.keld.stop();
+  change(ben, "sync.sqlite",
+         "UPDATE rows SET newerTag = tag, newerSize = size, newerModified = modified, newerDigest = digest,"
+         " newerMode = mode, tag = 'older', size = 1, digest = 'older', localSize = 1, localModified = 1,"
+         " dataless = 1; UPDATE meta SET value = 0 WHERE key IN ('endedWell', 'examinedRank')");
+  ben.keld.start();
+  const NSError error = ben.waitForUploads();
+  EXPECT_FALSE(error) << error.description();
+  EXPECT_EQ(ben.read("notes.txt"), "hello");
+  EXPECT_EQ(ben.keld.namesIn("").size(), anna.keld.namesIn("").size()) << "no copy was made";
+}
+
+TEST_F(AfterKill, whatTheTableDoesNotSayIsWorkedOutAnew) {
+  share("notes.txt", "hello");
+  ASSERT_TRUE(
+      eventually([&] { return ben.keld.record("notes.txt")->flags == (kDatalessFlag | kUploadedFlag); }));
+  ben.keld.stop();
+  change(ben, "keld.sqlite", "UPDATE items SET flags = 0 WHERE name = CAST('notes.txt' AS BLOB)");
+  change(ben, "sync.sqlite", "UPDATE meta SET value = 0 WHERE key = 'endedWell'");
+  ben.keld.start();
+  ben.keld.waitForFirstScan();
+  EXPECT_TRUE(
+      eventually([&] { return ben.keld.record("notes.txt")->flags == (kDatalessFlag | kUploadedFlag); }));
+}
+
+TEST_F(AfterKill, aMarkOfAWaitIsRemoved) {
+  ben.keld.stop();
+  const std::string mark = ben.keld.at("") + "/../.mark-1-1";
+  ben.keld.write(mark);
+  ben.keld.start();
+  EXPECT_FALSE(std::filesystem::exists(mark));
+}
+
+TEST_F(AfterKill, whatWasMadeAndNotWrittenDownIsShownAsDataless) {
+  share("notes.txt", "hello");
+  ASSERT_TRUE(
+      eventually([&] { return ben.keld.record("notes.txt")->flags == (kDatalessFlag | kUploadedFlag); }));
+  ben.keld.stop();
+  change(ben, "keld.sqlite", "UPDATE items SET flags = 0 WHERE name = CAST('notes.txt' AS BLOB)");
+  change(ben, "sync.sqlite", "DELETE FROM rows; DELETE FROM meta WHERE key = 'changeToken'");
+  ben.keld.start();
+  ben.keld.waitForFirstScan();
+  EXPECT_TRUE(
+      eventually([&] { return ben.keld.record("notes.txt")->flags == (kDatalessFlag | kUploadedFlag); }));
+  EXPECT_EQ(ben.contents("notes.txt"), "hello");
+}
+
+TEST_F(TwoDevices, whatWasDeletedInARenamedFolderGoes) {
+  anna.keld.folder("work");
+  share("work/one.txt", "1");
+  share("work/two.txt", "2");
+  ben.keld.stop();
+  anna.keld.rename("work", "plans");
+  ASSERT_FALSE(anna.waitForUploads());
+  anna.keld.remove("plans/one.txt");
+  ASSERT_FALSE(anna.waitForUploads());
+  anna.keld.write("plans/two.txt", "two");
+  ASSERT_FALSE(anna.waitForUploads());
+  ben.keld.start();
+  ASSERT_TRUE(ben.knowsSoon("plans/two.txt"));
+  EXPECT_TRUE(ben.losesSoon("plans/one.txt"));
+  EXPECT_TRUE(eventually([&] { return ben.status("plans/two.txt").size == 3; }));
+  EXPECT_EQ(ben.contents("plans/two.txt"), "two");
+}
+
+TEST_F(TwoDevices, whatIsInAFolderThatWasDeletedElsewhereStaysOnBoth) {
+  anna.keld.folder("shared");
+  share("shared/old.txt", "old");
+  anna.keld.stop();
+  ben.keld.write("shared/new.txt", "new");
+  ASSERT_FALSE(ben.waitForUploads());
+  anna.keld.remove("shared");
+  anna.keld.start();
+  ASSERT_FALSE(anna.waitForUploads());
+  ASSERT_TRUE(anna.knowsSoon("shared/new.txt"));
+  EXPECT_EQ(anna.contents("shared/new.txt"), "new");
+  EXPECT_TRUE(ben.losesSoon("shared/old.txt"));
+  EXPECT_EQ(ben.read("shared/new.txt"), "new");
+}
+
+// A device whose downloads fail while the test wants them to.
+class WaitingVersion : public testing::Test {
+ protected:
+  static KeldOptions optionsWith(std::shared_ptr<CKCloud> cloud) {
+    KeldOptions options;
+    options.sync.cloud = std::move(cloud);
+    return options;
+  }
+  std::shared_ptr<CKCloud> open(const std::string &device) {
+    NSError error;
+    auto cloud = EmbeddedCloud::open(folder.path() + "/cloud", "ada", device, &error);
+    EXPECT_TRUE(cloud) << error.description();
+    return cloud;
+  }
+  // What the documents say whose names begin with "notes".
+  static std::vector<std::string> notesOn(Device &device) {
+    std::vector<std::string> found;
+    for (const auto &entry : std::filesystem::directory_iterator(device.keld.at(""))) {
+      const std::string name = entry.path().filename();
+      if (name.find("notes") == 0 && !device.download(name)) found.push_back(device.read(name));
+    }
+    std::sort(found.begin(), found.end());
+    return found;
+  }
+  const TemporaryFolder folder;
+  const std::shared_ptr<FaultyCloud> faulty = std::make_shared<FaultyCloud>(open("ben"));
+  Device anna{optionsWith(open("anna"))}, ben{optionsWith(faulty)};
+};
+
+TEST_F(WaitingVersion, anEditUnderAVersionThatWaitsIsKeptBesideIt) {
+  anna.keld.write("notes.txt", "base");
+  ASSERT_FALSE(anna.waitForUploads());
+  ASSERT_TRUE(ben.knowsSoon("notes.txt"));
+  ASSERT_EQ(ben.contents("notes.txt"), "base");
+  FaultyCloud::Fault failing;
+  failing.error = CKErrorMake(CKErrorCode::networkFailure, "no way there");
+  faulty->onEveryCall(FaultyCloud::Call::readAsset, failing);
+  const int before = faulty->count(FaultyCloud::Call::readAsset);
+  anna.keld.write("notes.txt", "from anna");
+  ASSERT_FALSE(anna.waitForUploads());
+  ASSERT_TRUE(eventually([&] { return faulty->count(FaultyCloud::Call::readAsset) > before; }));
+  ben.keld.write("notes.txt", "from ben!!");
+  EXPECT_FALSE(ben.waitForUploads());
+  faulty->clearFaults();
+  const std::vector<std::string> both{"from anna", "from ben!!"};
+  EXPECT_TRUE(eventually([&] { return notesOn(anna) == both && notesOn(ben) == both; }));
+}
+
+}  // namespace
+}  // namespace droxa::keld
