@@ -2,7 +2,6 @@
 
 #include "keld/Sql.h"
 #include "tests/keld/sync/TwoDevices.h"
-#include "tests/support/FaultyCloud.h"
 
 namespace droxa::keld {
 namespace {
@@ -98,54 +97,6 @@ TEST_F(TwoDevices, whatIsInAFolderThatWasDeletedElsewhereStaysOnBoth) {
   EXPECT_EQ(anna.contents("shared/new.txt"), "new");
   EXPECT_TRUE(ben.losesSoon("shared/old.txt"));
   EXPECT_EQ(ben.read("shared/new.txt"), "new");
-}
-
-// A device whose downloads fail while the test wants them to.
-class WaitingVersion : public testing::Test {
- protected:
-  static KeldOptions optionsWith(std::shared_ptr<CKCloud> cloud) {
-    KeldOptions options;
-    options.sync.cloud = std::move(cloud);
-    return options;
-  }
-  std::shared_ptr<CKCloud> open(const std::string &device) {
-    NSError error;
-    auto cloud = EmbeddedCloud::open(folder.path() + "/cloud", "ada", device, &error);
-    EXPECT_TRUE(cloud) << error.description();
-    return cloud;
-  }
-  // What the documents say whose names begin with "notes".
-  static std::vector<std::string> notesOn(Device &device) {
-    std::vector<std::string> found;
-    for (const auto &entry : std::filesystem::directory_iterator(device.keld.at(""))) {
-      const std::string name = entry.path().filename();
-      if (name.find("notes") == 0 && !device.download(name)) found.push_back(device.read(name));
-    }
-    std::sort(found.begin(), found.end());
-    return found;
-  }
-  const TemporaryFolder folder;
-  const std::shared_ptr<FaultyCloud> faulty = std::make_shared<FaultyCloud>(open("ben"));
-  Device anna{optionsWith(open("anna"))}, ben{optionsWith(faulty)};
-};
-
-TEST_F(WaitingVersion, anEditUnderAVersionThatWaitsIsKeptBesideIt) {
-  anna.keld.write("notes.txt", "base");
-  ASSERT_FALSE(anna.waitForUploads());
-  ASSERT_TRUE(ben.knowsSoon("notes.txt"));
-  ASSERT_EQ(ben.contents("notes.txt"), "base");
-  FaultyCloud::Fault failing;
-  failing.error = CKErrorMake(CKErrorCode::networkFailure, "no way there");
-  faulty->onEveryCall(FaultyCloud::Call::readAsset, failing);
-  const int before = faulty->count(FaultyCloud::Call::readAsset);
-  anna.keld.write("notes.txt", "from anna");
-  ASSERT_FALSE(anna.waitForUploads());
-  ASSERT_TRUE(eventually([&] { return faulty->count(FaultyCloud::Call::readAsset) > before; }));
-  ben.keld.write("notes.txt", "from ben!!");
-  EXPECT_FALSE(ben.waitForUploads());
-  faulty->clearFaults();
-  const std::vector<std::string> both{"from anna", "from ben!!"};
-  EXPECT_TRUE(eventually([&] { return notesOn(anna) == both && notesOn(ben) == both; }));
 }
 
 }  // namespace

@@ -98,6 +98,20 @@ class Device {
     return read(path);
   }
 
+  // The same while the document is still moving: what isn't there now is asked for again.
+  bool saysSoon(const std::string &path, const std::string &text) {
+    return eventually([&] {
+      Once<std::shared_ptr<QVTransfer>, NSError> answer("download of " + path);
+      keld.session()->startDownloadAtURL(url(path), QVDownloadForReader, answer.completion());
+      if (const auto transfer = answer.value<0>()) {
+        Once<NSError> ended("end of the download of " + path);
+        transfer->waitWithReply(ended.completion());
+        (void)ended.wait();
+      }
+      return read(path) == text;
+    });
+  }
+
   KeldFixture keld;
 };
 

@@ -100,8 +100,7 @@ TEST_F(TwoDevices, anEditOnBothSidesKeepsBoth) {
   ASSERT_TRUE(eventually([&] { return !conflictCopy(ben).empty(); }));
   const std::string copy = conflictCopy(ben);
   EXPECT_EQ(ben.read(copy), "from ben!");
-  ASSERT_TRUE(eventually([&] { return ben.exists("notes.txt"); }));
-  EXPECT_EQ(ben.contents("notes.txt"), "from anna");
+  EXPECT_TRUE(ben.saysSoon("notes.txt", "from anna"));
   ASSERT_TRUE(anna.knowsSoon(copy));
   EXPECT_EQ(anna.contents(copy), "from ben!");
   EXPECT_EQ(anna.read("notes.txt"), "from anna");
