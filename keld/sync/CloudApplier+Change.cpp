@@ -168,8 +168,7 @@ bool CloudApplier::isBasedOn(const DocumentRecord &document, const SyncRow &row,
 // Another target is another link: the item of that is found by its name.
 void CloudApplier::changeLink(const DocumentRecord &document, SyncRow *row, const FileLocation &location) {
   char target[4096];
-  const ssize_t length =
-      ::readlinkat(location.folder.get(), location.name.c_str(), target, sizeof target);
+  const ssize_t length = ::readlinkat(location.folder.get(), location.name.c_str(), target, sizeof target);
   if (length <= 0 || document.target == std::string_view(target, static_cast<std::size_t>(length))) return;
   if (::unlinkat(location.folder.get(), location.name.c_str(), 0) != 0 ||
       ::symlinkat(document.target.c_str(), location.folder.get(), location.name.c_str()) != 0) {

@@ -18,7 +18,7 @@ namespace {
 
 constexpr std::size_t kRecordsAtATime = 200;
 constexpr char kToken[] = "changeToken";
-constexpr char kFetchesAll[] = "fetchesAll";    // 1 until the last page of everything was applied
+constexpr char kFetchesAll[] = "fetchesAll";     // 1 until the last page of everything was applied
 constexpr char kHasFetchedAll[] = "fetchedAll";  // 1 since the first time
 
 }  // namespace

@@ -225,8 +225,8 @@ void Downloads::noteOutcome(const Transfer &transfer, const NSError &error) {
   Retry &retry = retries_[transfer.item];
   retry.size = transfer.total;
   if (isCancelled || pausedBecause_) return;
-  const auto pause = std::min<std::chrono::seconds>(kFirstRetry * (1 << std::min(retry.failures, 20)),
-                                                    kLongestRetry);
+  const auto pause =
+      std::min<std::chrono::seconds>(kFirstRetry * (1 << std::min(retry.failures, 20)), kLongestRetry);
   ++retry.failures;
   retry.when = std::chrono::steady_clock::now() + pause;
 }

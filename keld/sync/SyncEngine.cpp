@@ -330,8 +330,8 @@ bool SyncEngine::prepareCloud() {
   const UUID identifier = cloud_->cloudIdentifier();
   const std::string text = identifier.description();
   if (identifier.isNull()) {
-    noteCloudProblem(fetching, CKErrorMake(CKErrorCode::serviceUnavailable,
-                                           cloud_->description() + " can't be reached"));
+    noteCloudProblem(
+        fetching, CKErrorMake(CKErrorCode::serviceUnavailable, cloud_->description() + " can't be reached"));
     return false;
   }
   // Each time: it may have been replaced while this runs.

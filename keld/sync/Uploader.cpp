@@ -17,7 +17,7 @@ constexpr std::uint64_t kRecordsAtATime = 100;
 constexpr std::uint64_t kInlineSize = 4 << 20;    // larger contents are sent beside this thread
 constexpr std::uint64_t kInlineBytes = 16 << 20;  // of one round
 constexpr std::chrono::seconds kTransferTimeout{60};
-constexpr std::int64_t kSoon = 300;               // milliseconds
+constexpr std::int64_t kSoon = 300;  // milliseconds
 constexpr std::int64_t kLongestPause = 300'000;
 
 std::int64_t nowMilliseconds() {
@@ -219,6 +219,7 @@ Uploader::Prepared Uploader::prepareDocument(const FileLocation &location, Plan 
                                              const CKCallContext &call) {
   const DocumentLook look = context_.storage.classify(location.folder.get(), location.name);
   SyncRow &row = plan->row;
+  plan->marker = look.marker;
   const bool isFile = look.kind != DocumentClass::missing && look.kind != DocumentClass::notADocument;
   if (isFile && !look.isPromised && look.facts.inode != location.item.facts.inode) {
     // Another file is at its place; whose that is the keeper finds out.
@@ -366,6 +367,11 @@ void Uploader::markFile(const Plan &plan, SyncRow *row) {
   }
   const auto facts = ReadFolderFacts(file.get(), 0);
   if (!facts || !IsSameContents(LocalFileOf(*facts), plan.file)) return;
+  if (ReadMarker(file.get()) != plan.marker) {
+    // A tool that copies a document writes its contents first and its attributes then: those say what it is.
+    context_.store.enqueue(plan.entry.item, false, false);
+    return;
+  }
   DocumentMarker marker;
   marker.state = row->isDataless ? MarkerState::dataless : MarkerState::present;
   marker.recordName = row->record;
@@ -422,7 +428,8 @@ void Uploader::removeFailed(const Plan &plan, const NSError &error, Round *round
 }
 
 void Uploader::failed(const Plan &plan, const NSError &error) {
-  const NSError told = ErrorForClients(error, context_.files.absolute(context_.files.pathOf(plan.entry.item)));
+  const NSError told =
+      ErrorForClients(error, context_.files.absolute(context_.files.pathOf(plan.entry.item)));
   Plan again = plan;
   laterWith(&again, told);
   const Lock lock(mutex_);

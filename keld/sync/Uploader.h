@@ -46,7 +46,8 @@ class Uploader {
     QueuedUpload entry;
     SyncRow row;
     DocumentRecord document;
-    LocalFile file;  // that is sent
+    LocalFile file;                        // that is sent
+    std::optional<DocumentMarker> marker;  // that it bore then
     bool isDeletion = false;
     bool hasContent = false;
     bool isDataless = false;

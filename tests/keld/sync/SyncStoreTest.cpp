@@ -1,7 +1,6 @@
-#include "keld/sync/SyncStore.h"
-
 #include <gtest/gtest.h>
 
+#include "keld/sync/SyncStore.h"
 #include "platform/cloudkit/CKError.h"
 #include "tests/platform/TemporaryFolder.h"
 
