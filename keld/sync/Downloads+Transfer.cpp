@@ -199,7 +199,7 @@ Downloads::Try Downloads::fill(std::uint64_t number, const FileLocation &locatio
   const ContentsResult result = publish(*opened.part, isShared ? PartUse::keep : PartUse::consume);
   switch (result.outcome) {
     case ContentsOutcome::done:
-      published(location.item.id, result);
+      published(location.item.id, wanted.digest, result);
       return Try::ended;
     case ContentsOutcome::gone:
     case ContentsOutcome::folderGone:
@@ -250,7 +250,15 @@ NSError Downloads::receive(std::uint64_t number, const CKAssetReference &asset, 
   }
 }
 
-void Downloads::published(ItemNumber item, const ContentsResult &result) {
+void Downloads::published(ItemNumber item, const std::string &digest, const ContentsResult &result) {
+  // Known at once, so that it can be let go of again at once.
+  store_.transaction([&] {
+    auto row = store_.byItem(item);
+    if (!row || (row->content.digest != digest && row->newer.digest != digest)) return;
+    row->local = LocalFileOf(result.facts);
+    row->isDataless = false;
+    store_.put(*row);
+  });
   states_.show({item, false, true, LocalFileOf(result.facts), true});
 }
 

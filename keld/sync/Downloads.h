@@ -114,7 +114,7 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
   NSError receive(std::uint64_t number, const CKAssetReference &asset, PartFile &part,
                   const std::shared_ptr<CKCancellation> &cancellation);
   void becameNewer(const std::string &tag);
-  void published(ItemNumber item, const ContentsResult &result);
+  void published(ItemNumber item, const std::string &digest, const ContentsResult &result);
   NSError nothingThere(ItemNumber item, std::uint64_t number) const;
 
   const std::shared_ptr<CKCloud> cloud_;

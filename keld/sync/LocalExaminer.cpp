@@ -218,6 +218,10 @@ bool LocalExaminer::bind(const ItemRecord &item, const std::string &parent) {
   const bool isDocument = item.facts.kind == NSFileProviderItemKind::document;
   const bool isFolder = item.facts.kind == NSFileProviderItemKind::folder;
   if (!isDocument && !isFolder) {
+    const auto place = files_.locate(item.id, nullptr);
+    const auto facts = place ? ReadFileFacts(place->folder.get(), place->name, 0) : std::nullopt;
+    // Another link is there by now: the keeper tells of that one.
+    if (!facts || facts->inode != item.facts.inode) return true;
     const auto row = store_.byName(parent, item.name);
     return row && row->item == 0 && IsLink(row->kind) && bindLink(item, *row);
   }

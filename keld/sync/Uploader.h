@@ -48,7 +48,8 @@ class Uploader {
     QueuedUpload entry;
     SyncRow row;
     DocumentRecord document;
-    LocalFile file;  // that is sent
+    LocalFile file;                        // that is sent
+    std::optional<DocumentMarker> marker;  // that it bore then
     bool isDeletion = false;
     bool hasContent = false;
     bool isDataless = false;
@@ -63,6 +64,8 @@ class Uploader {
   Prepared nothingToSend(const Plan &plan);
   Prepared prepareSave(const ItemRecord &item, Plan *plan, const CKCallContext &call);
   Prepared prepareDocument(const FileLocation &location, Plan *plan, const CKCallContext &call);
+  std::optional<Prepared> prepareStranger(const FileLocation &location, const DocumentLook &look, Plan *plan,
+                                          const CKCallContext &call);
   Prepared prepareLink(const FileLocation &location, Plan *plan);
   Prepared sendContents(const FileLocation &location, Plan *plan, const CKCallContext &call);
   Prepared restorePartlyWritten(const FileLocation &location, const DocumentLook &look, Plan *plan);

@@ -3,6 +3,7 @@
 #include <sys/time.h>
 
 #include "tests/keld/KeldFixture.h"
+#include "tests/platform/TemporaryFolder.h"
 #include "tests/support/DaemonConformance.h"
 
 namespace droxa {
@@ -11,7 +12,7 @@ namespace {
 
 class KeldWorld final : public DaemonWorld {
  public:
-  explicit KeldWorld(keld::WatcherKind watcher) : fixture_(keld::WatchedBy(watcher), false) {
+  explicit KeldWorld(keld::WatcherKind watcher) : fixture_(onCloud(watcher, cloudFolder()), false) {
     std::filesystem::create_directories(fixture_.documents(kConformanceContainer));
     fixture_.start();
   }
@@ -36,8 +37,37 @@ class KeldWorld final : public DaemonWorld {
   void rename(const NSURL &from, const NSURL &to) override { fixture_.rename(from.path(), to.path()); }
   void remove(const NSURL &url) override { fixture_.remove(url.path()); }
   void settle() override { fixture_.settle(); }
+  // As users get one: the cloud has the document, and its contents are let go of here.
+  bool addDatalessDocument(const NSURL &url, const std::string &contents) override {
+    fixture_.write(url.path(), contents);
+    const auto isDone = [&](const std::function<NSError()> &attempt) {
+      NSError error;
+      const bool done = eventually([&] { return !(error = attempt()); });
+      EXPECT_TRUE(done) << url.path() << ": " << error.description();
+      return done;
+    };
+    return isDone([&] {
+             Once<NSError> sent("upload of " + url.path());
+             fixture_.session()->waitForUploadAtURL(url, sent.completion());
+             return sent.value<0>();
+           }) &&
+           isDone([&] {
+             Once<QVContentsResult, NSError> evicted("eviction of " + url.path());
+             fixture_.session()->evictItemAtURL(url, evicted.completion());
+             return evicted.value<1>();
+           });
+  }
 
  private:
+  std::string cloudFolder() const { return folder_.path() + "/cloud"; }
+  static keld::KeldOptions onCloud(keld::WatcherKind watcher, const std::string &cloudFolder) {
+    keld::KeldOptions options = keld::WatchedBy(watcher);
+    options.sync.cloudFolder = cloudFolder;
+    options.sync.device = "conformance";
+    return options;
+  }
+
+  const TemporaryFolder folder_;
   keld::KeldFixture fixture_;
 };
 

@@ -1,8 +1,7 @@
-#include "keld/sync/CloudErrors.h"
-
 #include <cerrno>
 #include <gtest/gtest.h>
 
+#include "keld/sync/CloudErrors.h"
 #include "platform/cloudkit/CKError.h"
 #include "tessaly/QVErrors.h"
 
@@ -22,9 +21,9 @@ TEST(CloudErrors, aFullQuotaIsToldAsThat) {
 }
 
 TEST(CloudErrors, aCloudThatCantBeReachedIsToldAsThat) {
-  for (const CKErrorCode code : {CKErrorCode::networkFailure, CKErrorCode::networkUnavailable,
-                                 CKErrorCode::serviceUnavailable, CKErrorCode::requestRateLimited,
-                                 CKErrorCode::zoneBusy, CKErrorCode::internalError})
+  for (const CKErrorCode code :
+       {CKErrorCode::networkFailure, CKErrorCode::networkUnavailable, CKErrorCode::serviceUnavailable,
+        CKErrorCode::requestRateLimited, CKErrorCode::zoneBusy, CKErrorCode::internalError})
     EXPECT_TRUE(told(code).is(NSCocoaErrorDomain, 4355)) << static_cast<int>(code);
 }
 

@@ -1,6 +1,6 @@
-#include "keld/sync/ConflictName.h"
-
 #include <gtest/gtest.h>
+
+#include "keld/sync/ConflictName.h"
 
 namespace droxa::keld {
 namespace {

@@ -1,6 +1,6 @@
-#include "keld/sync/DocumentRecord.h"
-
 #include <gtest/gtest.h>
+
+#include "keld/sync/DocumentRecord.h"
 
 namespace droxa::keld {
 namespace {

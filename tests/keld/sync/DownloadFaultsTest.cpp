@@ -43,8 +43,8 @@ class DownloadFaults : public FaultyDrive {
   }
   std::uint64_t partLength() {
     std::uint64_t length = 0;
-    for (const auto &entry : std::filesystem::recursive_directory_iterator(
-             device.keld.replica() + "/" + std::string(kContentsStorageName)))
+    for (const auto &entry : std::filesystem::recursive_directory_iterator(device.keld.replica() + "/" +
+                                                                           std::string(kContentsStorageName)))
       if (entry.path().extension() == ".part") length += std::filesystem::file_size(entry.path());
     return length;
   }
@@ -314,14 +314,13 @@ TEST(DownloadSpace, aFullDiskIsToldAndTheNextTryWorks) {
     std::string path;
     ~Unmount() { ::umount2(path.c_str(), MNT_DETACH); }
   } unmount{keld.replica()};
-  {
-    Device device(options);
-  }
+  { Device device(options); }
   hand.put("large", bytes(3 << 20));
   keld.start();
   keld.waitForFirstScan();
   ASSERT_TRUE(eventually([&] { return keld.knows("large"); }));
-  std::ofstream(keld.replica() + "/" + std::string(QVUbiquitousDefaultContainerID) + "/fill", std::ios::binary)
+  std::ofstream(keld.replica() + "/" + std::string(QVUbiquitousDefaultContainerID) + "/fill",
+                std::ios::binary)
       << std::string(2 << 20, 'f');
   const auto download = [&] {
     Once<std::shared_ptr<QVTransfer>, NSError> started("download");
@@ -396,7 +395,8 @@ TEST_F(DownloadFaults, progressGoesUpToTheEnd) {
 // --- Ends.
 
 TEST_F(DownloadFaults, stoppingTheDaemonAnswersEverybodyOnce) {
-  for (int index = 0; index < 6; ++index) dataless(std::to_string(index), "contents " + std::to_string(index));
+  for (int index = 0; index < 6; ++index)
+    dataless(std::to_string(index), "contents " + std::to_string(index));
   cloud->onEveryCall(Call::readAsset, hanging());
   std::vector<std::shared_ptr<QVTransfer>> transfers;
   std::vector<std::unique_ptr<Once<NSError>>> ends;

@@ -12,8 +12,8 @@
 
 namespace droxa::keld {
 
-// What another device does with the cloud, without a daemon. Paths are below the default container's documents
-// folder. Thread contract: the test's thread.
+// What another device does with the cloud, without a daemon. Paths are below the default container's
+// documents folder. Thread contract: the test's thread.
 class CloudHand {
  public:
   explicit CloudHand(const std::string &cloudFolder, const std::string &device = "anna") {
@@ -96,13 +96,12 @@ class CloudHand {
     const auto document = at(path);
     std::string bytes;
     if (!document) return "nothing is there";
-    const NSError error = cloud->readAsset(
-        {document->content.size, document->content.digest}, 0,
-        [&](std::span<const std::uint8_t> more) {
-          bytes.append(more.begin(), more.end());
-          return NSError();
-        },
-        nullptr, {});
+    const NSError error = cloud->readAsset({document->content.size, document->content.digest}, 0,
+                                           [&](std::span<const std::uint8_t> more) {
+                                             bytes.append(more.begin(), more.end());
+                                             return NSError();
+                                           },
+                                           nullptr, {});
     EXPECT_FALSE(error) << error.description();
     return bytes;
   }
@@ -150,7 +149,9 @@ class FaultyDrive : public testing::Test {
   using Fault = FaultyCloud::Fault;
 
   explicit FaultyDrive(KeldOptions options = {})
-      : hand(cloudFolder), cloud(std::make_shared<FaultyCloud>(open())), device(withCloud(std::move(options))) {}
+      : hand(cloudFolder),
+        cloud(std::make_shared<FaultyCloud>(open())),
+        device(withCloud(std::move(options))) {}
 
   // A document that ben has without its contents.
   void dataless(const std::string &path, const std::string &contents) {

@@ -24,8 +24,7 @@ class LostDatabase : public FaultyDrive {
   void lose(const std::vector<std::string> &names) {
     device.keld.stop();
     for (const std::string &name : names)
-      for (const char *suffix : {"", "-wal", "-shm"})
-        std::filesystem::remove(state() + "/" + name + suffix);
+      for (const char *suffix : {"", "-wal", "-shm"}) std::filesystem::remove(state() + "/" + name + suffix);
     uploads = cloud->count(Call::uploadAsset);
     reads = cloud->count(Call::readAsset);
     device.keld.start();

@@ -1,7 +1,6 @@
-#include "keld/sync/SyncStore.h"
-
 #include <gtest/gtest.h>
 
+#include "keld/sync/SyncStore.h"
 #include "platform/cloudkit/CKError.h"
 #include "tests/platform/TemporaryFolder.h"
 
@@ -77,7 +76,7 @@ TEST_F(SyncStoreTest, anItemStandsForOneRecord) {
 }
 
 TEST_F(SyncStoreTest, uploadsAreDueInTheOrderOfTheirFirstChange) {
-  for (const ItemNumber item : {3, 1, 2}) store.enqueue(item, false, false);
+  for (const ItemNumber item : Items{3, 1, 2}) store.enqueue(item, false, false);
   store.enqueue(3, false, false);
   EXPECT_EQ(due(), (Items{3, 1, 2}));
   EXPECT_EQ(store.countQueued(), 3U);
@@ -136,7 +135,7 @@ TEST_F(SyncStoreTest, anotherChangeForgetsTheFailure) {
 }
 
 TEST_F(SyncStoreTest, retriesCanBeMadeDueAtOnce) {
-  for (const ItemNumber item : {1, 2}) {
+  for (const ItemNumber item : Items{1, 2}) {
     store.enqueue(item, false, false);
     store.uploadFailed(*store.queued(item), CKErrorMake(CKErrorCode::internalError, ""), 2000);
   }

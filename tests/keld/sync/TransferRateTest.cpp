@@ -1,6 +1,6 @@
-#include "keld/sync/TransferRate.h"
-
 #include <gtest/gtest.h>
+
+#include "keld/sync/TransferRate.h"
 
 namespace droxa::keld {
 namespace {

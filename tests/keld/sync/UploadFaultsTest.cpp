@@ -16,9 +16,7 @@ class UploadFaults : public FaultyDrive {
  protected:
   UploadFaults() : FaultyDrive(quickToGiveUp()) {}
 
-  int recordsNamed(const std::string &path) {
-    return static_cast<int>(hand.all().count(path));
-  }
+  int recordsNamed(const std::string &path) { return static_cast<int>(hand.all().count(path)); }
   EmbeddedCloud &quota() { return *hand.cloud; }
 };
 
