@@ -247,8 +247,6 @@ Uploader::Prepared Uploader::prepareDocument(const FileLocation &location, Plan 
     case DocumentClass::partlyWritten:
       return restorePartlyWritten(location, look, plan);
     case DocumentClass::dataless:
-      if (row.tag.empty() && !context_.store.byRecord(look.marker->recordName))
-        if (const auto stranger = prepareStranger(location, look, plan, call)) return *stranger;
       // Its contents are in the cloud, under this record's name or, for a copy of a placeholder, another's.
       plan->file = LocalFileOf(look.facts);
       plan->isDataless = true;
@@ -276,30 +274,6 @@ Uploader::Prepared Uploader::prepareDocument(const FileLocation &location, Plan 
   plan->changesMarker = true;
   plan->document.tag = row.tag;  // of the version that was written over: a newer one is a conflict
   return sendContents(location, plan, call);
-}
-
-// A placeholder of a record that this device knows nothing of was made just before the process was killed.
-// Either the record is fetched, or it was deleted meanwhile, and the placeholder stands for nothing.
-std::optional<Uploader::Prepared> Uploader::prepareStranger(const FileLocation &location,
-                                                            const DocumentLook &look, Plan *plan,
-                                                            const CKCallContext &call) {
-  const std::string &record = look.marker->recordName;
-  const CKFetchReply reply = context_.cloud.fetchRecords({RecordID(record)}, std::nullopt, call);
-  const bool isAnswered = reply.results.size() == 1;
-  const bool isGone = isAnswered && CKErrorIs(reply.results[0].error, CKErrorCode::unknownItem);
-  if (!isGone && (!isAnswered || reply.results[0].error)) {
-    cloudProblem_ = isAnswered ? reply.results[0].error : reply.error;
-    return Prepared::later;
-  }
-  if (!plan->row.record.empty()) context_.store.erase(plan->row.record);
-  context_.store.uploaded(plan->entry);
-  if (isGone) {
-    ::unlinkat(location.folder.get(), location.name.c_str(), 0);
-    context_.states.lookAt({location.path});
-  } else {
-    context_.store.fetchAgain(record);
-  }
-  return Prepared::nothing;
 }
 
 Uploader::Prepared Uploader::sendContents(const FileLocation &location, Plan *plan,

@@ -64,8 +64,6 @@ class Uploader {
   Prepared nothingToSend(const Plan &plan);
   Prepared prepareSave(const ItemRecord &item, Plan *plan, const CKCallContext &call);
   Prepared prepareDocument(const FileLocation &location, Plan *plan, const CKCallContext &call);
-  std::optional<Prepared> prepareStranger(const FileLocation &location, const DocumentLook &look, Plan *plan,
-                                          const CKCallContext &call);
   Prepared prepareLink(const FileLocation &location, Plan *plan);
   Prepared sendContents(const FileLocation &location, Plan *plan, const CKCallContext &call);
   Prepared restorePartlyWritten(const FileLocation &location, const DocumentLook &look, Plan *plan);

@@ -12,7 +12,9 @@ namespace {
 
 class KeldWorld final : public DaemonWorld {
  public:
-  explicit KeldWorld(keld::WatcherKind watcher) : fixture_(onCloud(watcher, cloudFolder()), false) {
+  // With a cloud, what becomes of documents there is told like every other change.
+  KeldWorld(keld::WatcherKind watcher, bool hasCloud)
+      : fixture_(hasCloud ? onCloud(watcher, cloudFolder()) : keld::WatchedBy(watcher), false) {
     std::filesystem::create_directories(fixture_.documents(kConformanceContainer));
     fixture_.start();
   }
@@ -71,27 +73,21 @@ class KeldWorld final : public DaemonWorld {
   keld::KeldFixture fixture_;
 };
 
-std::unique_ptr<DaemonWorld> byFanotify() {
-  return std::make_unique<KeldWorld>(keld::WatcherKind::best);
+template <keld::WatcherKind watcher, bool hasCloud>
+std::unique_ptr<DaemonWorld> world() {
+  return std::make_unique<KeldWorld>(watcher, hasCloud);
 }
-std::unique_ptr<DaemonWorld> byInotify() {
-  return std::make_unique<KeldWorld>(keld::WatcherKind::inotify);
-}
-std::unique_ptr<DaemonWorld> byScanning() {
-  return std::make_unique<KeldWorld>(keld::WatcherKind::scan);
+
+template <bool hasCloud>
+auto worlds() {
+  return testing::Values(DaemonWorldMaker{"BestWatcher", world<keld::WatcherKind::best, hasCloud>},
+                         DaemonWorldMaker{"Inotify", world<keld::WatcherKind::inotify, hasCloud>},
+                         DaemonWorldMaker{"Scanning", world<keld::WatcherKind::scan, hasCloud>});
 }
 
 }  // namespace
 
-INSTANTIATE_TEST_SUITE_P(Keld, DaemonConformance,
-                         testing::Values(DaemonWorldMaker{"BestWatcher", byFanotify},
-                                         DaemonWorldMaker{"Inotify", byInotify},
-                                         DaemonWorldMaker{"Scanning", byScanning}),
-                         ConformanceName);
-INSTANTIATE_TEST_SUITE_P(Keld, DaemonContentsConformance,
-                         testing::Values(DaemonWorldMaker{"BestWatcher", byFanotify},
-                                         DaemonWorldMaker{"Inotify", byInotify},
-                                         DaemonWorldMaker{"Scanning", byScanning}),
-                         ConformanceName);
+INSTANTIATE_TEST_SUITE_P(Keld, DaemonConformance, worlds<false>(), ConformanceName);
+INSTANTIATE_TEST_SUITE_P(Keld, DaemonContentsConformance, worlds<true>(), ConformanceName);
 
 }  // namespace droxa

@@ -85,7 +85,14 @@ class KeldFixture {
   }
   void folder(const std::string &path) { std::filesystem::create_directories(at(path)); }
   void rename(const std::string &from, const std::string &to) { std::filesystem::rename(at(from), at(to)); }
-  void remove(const std::string &path) { std::filesystem::remove_all(at(path)); }
+  // The daemon may be making something in it anew at the same time.
+  void remove(const std::string &path) {
+    EXPECT_TRUE(eventually([&] {
+      std::error_code code;
+      std::filesystem::remove_all(at(path), code);
+      return !code;
+    })) << path;
+  }
 
   // --- Questions.
   std::optional<ItemRecord> record(const std::string &path) {

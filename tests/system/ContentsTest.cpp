@@ -216,7 +216,9 @@ TEST_F(Contents, manyDeletionsAreHeldUntilTheyAreAnswered) {
   EXPECT_NE(drive.droxa({"status"}).output.find("droxa deletions"), std::string::npos);
   const Result restore = drive.droxa({"deletions", "restore"});
   EXPECT_EQ(restore.status, 0) << restore.errors;
-  EXPECT_TRUE(eventually([&] { return documents() == 60; })) << documents();
+  EXPECT_TRUE(eventually([&] {
+    return documents() == 60 && drive.contents("many").value("unsent", 60) == 0;
+  })) << documents();
   deleteAll();
   EXPECT_EQ(drive.droxa({"deletions", "carry-out"}).status, 0);
   EXPECT_EQ(drive.droxa({"deletions"}).output, "no deletions are held\n");
