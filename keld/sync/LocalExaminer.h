@@ -40,6 +40,8 @@ class LocalExaminer {
   // Whether the cloud has the item as it is here, by what the row says of the cloud; learns the file that
   // stands for the contents.
   bool isClean(const ItemRecord &item, SyncRow &row, const std::string &parent);
+  // Finds the record that an item without one stands for; false when it is new.
+  bool bind(const ItemRecord &item, const std::string &parent);
   // Has `item` stand for the record, whatever stood for it before.
   void bindTo(const std::string &record, ItemNumber item);
   // Called, on the examining thread, for each file that was found to stand for a record.
@@ -65,7 +67,6 @@ class LocalExaminer {
   std::vector<Change> nextChanges(std::uint64_t after);
   void examineLive(const ItemRecord &item);
   void examineDeath(ItemNumber item);
-  bool bind(const ItemRecord &item, const std::string &parent);
   bool bindLink(const ItemRecord &item, SyncRow row);
   bool hasSyncedContents(const ItemRecord &item, SyncRow &row);
   std::optional<SyncRow> findUnmarked(const ItemRecord &item, const std::string &parent);

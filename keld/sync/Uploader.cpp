@@ -171,6 +171,12 @@ Uploader::Prepared Uploader::prepareSave(const ItemRecord &item, Plan *plan, con
     context_.states.show({item.id, row.isDataless, true, LocalFileOf(location->item.facts), hasFile});
     return Prepared::nothing;
   }
+  // Its folder may have been unknown when it was examined.
+  if (row.record.empty() && examiner_.bind(location->item, parent)) {
+    context_.store.uploaded(plan->entry);
+    return Prepared::nothing;
+  }
+  if (auto bound = context_.store.byItem(item.id)) row = std::move(*bound);
   if (row.record.empty()) {
     // Written down before it is sent, so that a lost reply doesn't make a second record.
     row.record = NewRecordName();

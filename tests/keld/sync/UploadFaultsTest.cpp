@@ -136,7 +136,9 @@ TEST_F(UploadFaults, aFileThatChangesWhileItIsSentIsSentAsItIsInTheEnd) {
 
 TEST_F(UploadFaults, aLargeUploadThatHangsIsGivenUpAndTriedAgain) {
   cloud->onNextCall(Call::uploadAsset, hanging());
-  device.keld.write("large", std::string(6 << 20, 'l'));
+  // At once of its full size, so that it is never taken for a small one.
+  device.keld.write("large.tmp", std::string(6 << 20, 'l'));
+  device.keld.rename("large.tmp", "large");
   ASSERT_TRUE(eventually([&] { return cloud->hanging() == 1; }));
   device.keld.write("small", "s");
   EXPECT_FALSE(device.waitForUploads("small")) << "a long upload holds up nothing else";
