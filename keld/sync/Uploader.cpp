@@ -62,8 +62,10 @@ Uploader::Round Uploader::sendDue(const CKCallContext &call) {
     Plan plan;
     plan.entry = entry;
     const Prepared prepared = prepare(entry, &plan, call);
-    if (prepared == Prepared::save) saves.push_back(std::move(plan));
-    if (prepared == Prepared::remove) removals.push_back(std::move(plan));
+    if (prepared == Prepared::save)
+      saves.push_back(std::move(plan));
+    else if (prepared == Prepared::remove)
+      removals.push_back(std::move(plan));
     if (cloudProblem_ || inlineBytes_ >= kInlineBytes || call.isCancelled()) break;
   }
   round.cloudProblem = cloudProblem_;

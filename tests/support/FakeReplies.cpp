@@ -21,7 +21,8 @@ FakeReplies::FakeReplies() : queue_(dispatch_queue_create("fake-daemon", DISPATC
 
 // A misspelt operation would make a test pass for the wrong reason.
 void FakeReplies::checkName(const std::string &operation) {
-  static const std::set<std::string> known = {
+  // Never destroyed: replies are given by threads that outlive the process's end.
+  static const std::set<std::string> &known = *new std::set<std::string>{
       "enumerateItemsInFolder",
       "enumerateAllFoldersWithSortOrder",
       "currentNotifRankWithReply",
