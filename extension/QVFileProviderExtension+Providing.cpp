@@ -60,7 +60,7 @@ void QVFileProviderExtension::startProvidingItemAtURL(const NSURL &url, std::uin
 void QVFileProviderExtension::downloadItemAtURL(const NSURL &url, std::uint64_t readingOptions,
                                                 std::uint64_t section,
                                                 NSFileProviderErrorCompletion completion) {
-  const std::string path = url.path();
+  const std::string &path = url.path();
   const auto operation = QVFileProvidingOperation::initWithURL(url, readingOptions);
   operation->setFileProvidingCompletion(
       [extension = std::static_pointer_cast<QVFileProviderExtension>(shared_from_this()), path, section,
@@ -103,7 +103,7 @@ std::shared_ptr<NSOperation> QVFileProviderExtension::downloadAtPath(const std::
 }
 
 void QVFileProviderExtension::stopProvidingItemAtURL(const NSURL &url) {
-  const std::string path = url.path();
+  const std::string &path = url.path();
   os_log_debug(qvc_default_log(), "[DEBUG] stop providing %@", path);
   if (isDownloadForced(url)) return;
   // Its completion removes the entry and tells the framework.

@@ -61,7 +61,7 @@ class Providings::Client final : public FPDProviding {
 Providings::Providings(std::shared_ptr<ExtensionCalls> calls) : calls_(std::move(calls)) {}
 
 std::shared_ptr<FPDProviding> Providings::start(const NSURL &url, std::uint64_t readingOptions) {
-  const std::string path = url.path();
+  const std::string &path = url.path();
   std::shared_ptr<Client> client;
   bool isFirst = false;
   {
