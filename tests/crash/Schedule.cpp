@@ -34,7 +34,7 @@ constexpr std::uint64_t shares() {
 
 }  // namespace
 
-Step Schedule::nextStep() {
+Step Schedule::followingStep() {
   Step step;
   std::uint64_t drawn = random_() % shares();
   for (const auto &[action, share] : kShares) {
@@ -58,7 +58,7 @@ Step Schedule::nextStep() {
 Round Schedule::next() {
   Round round;
   const std::uint64_t count = 4 + upTo(14);
-  for (std::uint64_t i = 0; i < count; ++i) round.steps.push_back(nextStep());
+  for (std::uint64_t i = 0; i < count; ++i) round.steps.push_back(followingStep());
   round.untilKill = std::chrono::microseconds(upTo(3) == 0 ? upTo(40'000) : upTo(500'000));
   round.untilStart = std::chrono::microseconds(upTo(3) == 0 ? upTo(300'000) : upTo(5'000));
   const std::uint64_t who = upTo(4);

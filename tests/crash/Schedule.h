@@ -49,7 +49,7 @@ class Schedule {
 
  private:
   std::uint64_t upTo(std::uint64_t most) { return random_() % (most + 1); }
-  Step nextStep();
+  Step followingStep();
   std::mt19937_64 random_;
 };
 
