@@ -16,8 +16,14 @@ inline constexpr char NSPOSIXErrorDomain[] = "NSPOSIXErrorDomain";
 inline constexpr char NSUnderlyingErrorKey[] = "NSUnderlyingError";
 inline constexpr char NSLocalizedDescriptionKey[] = "NSLocalizedDescription";
 
+inline constexpr std::int64_t NSFileNoSuchFileError = 4;
 inline constexpr std::int64_t NSFileReadNoSuchFileError = 260;
+inline constexpr std::int64_t NSFileWriteUnknownError = 512;
+inline constexpr std::int64_t NSFileWriteNoPermissionError = 513;
+inline constexpr std::int64_t NSFileWriteInvalidFileNameError = 514;
 inline constexpr std::int64_t NSFileWriteFileExistsError = 516;
+inline constexpr std::int64_t NSFileWriteOutOfSpaceError = 640;
+inline constexpr std::int64_t NSFileWriteVolumeReadOnlyError = 642;
 inline constexpr std::int64_t NSUserCancelledError = 3072;
 // Transport errors, all in NSCocoaErrorDomain.
 inline constexpr std::int64_t NSXPCConnectionInterrupted = 4097;  // the peer went away in the middle

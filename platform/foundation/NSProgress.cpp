@@ -1,0 +1,74 @@
+#include "platform/foundation/NSProgress.h"
+
+#include <utility>
+
+namespace droxa {
+namespace {
+
+std::shared_ptr<NSProgress> &Current() {
+  thread_local std::shared_ptr<NSProgress> current;
+  return current;
+}
+
+}  // namespace
+
+std::int64_t NSProgress::totalUnitCount() const {
+  const Lock lock(mutex_);
+  return total_;
+}
+
+void NSProgress::setTotalUnitCount(std::int64_t count) {
+  const Lock lock(mutex_);
+  total_ = count;
+}
+
+std::int64_t NSProgress::completedUnitCount() const {
+  const Lock lock(mutex_);
+  return completed_;
+}
+
+void NSProgress::setCompletedUnitCount(std::int64_t count) {
+  const Lock lock(mutex_);
+  completed_ = count;
+}
+
+void NSProgress::cancel() {
+  std::function<void()> handler;
+  {
+    const Lock lock(mutex_);
+    if (isCancelled_) return;
+    isCancelled_ = true;
+    handler = std::exchange(cancellationHandler_, nullptr);
+  }
+  if (handler) handler();
+}
+
+bool NSProgress::isCancelled() const {
+  const Lock lock(mutex_);
+  return isCancelled_;
+}
+
+void NSProgress::setCancellationHandler(std::function<void()> handler) {
+  {
+    const Lock lock(mutex_);
+    if (!isCancelled_) {
+      // The one that is replaced is released without the lock.
+      cancellationHandler_.swap(handler);
+      return;
+    }
+  }
+  if (handler) handler();
+}
+
+std::shared_ptr<NSProgress> NSProgress::currentProgress() {
+  return Current();
+}
+
+NSCurrentProgress::NSCurrentProgress(std::shared_ptr<NSProgress> progress)
+    : previous_(std::exchange(Current(), std::move(progress))) {}
+
+NSCurrentProgress::~NSCurrentProgress() {
+  Current() = previous_;
+}
+
+}  // namespace droxa

@@ -1,0 +1,54 @@
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+
+#include "platform/foundation/ThreadSafety.h"
+
+namespace droxa {
+
+// How far a piece of work has come, and the way to stop it. Work that can be watched takes the progress that
+// is current on the thread that begins it. Thread contract: any thread; the cancellation handler runs on the
+// thread that cancels, once, and without a lock held.
+class NSProgress final {
+ public:
+  NSProgress() = default;
+  NSProgress(const NSProgress &) = delete;
+  NSProgress &operator=(const NSProgress &) = delete;
+
+  // In units of the work's own choice: bytes, where contents are moved. -1: not known yet.
+  std::int64_t totalUnitCount() const;
+  void setTotalUnitCount(std::int64_t count);
+  std::int64_t completedUnitCount() const;
+  void setCompletedUnitCount(std::int64_t count);
+
+  void cancel();
+  bool isCancelled() const;
+  // Called by cancel(); at once, when that has been. A later handler replaces an earlier one.
+  void setCancellationHandler(std::function<void()> handler);
+
+  // The progress of the work that the calling thread begins; null: nobody watches.
+  static std::shared_ptr<NSProgress> currentProgress();
+
+ private:
+  mutable Mutex mutex_;
+  std::int64_t total_ GUARDED_BY(mutex_) = -1;
+  std::int64_t completed_ GUARDED_BY(mutex_) = 0;
+  bool isCancelled_ GUARDED_BY(mutex_) = false;
+  std::function<void()> cancellationHandler_ GUARDED_BY(mutex_);
+};
+
+// Makes `progress` the current one of this thread for as long as it lives.
+class NSCurrentProgress final {
+ public:
+  explicit NSCurrentProgress(std::shared_ptr<NSProgress> progress);
+  ~NSCurrentProgress();
+  NSCurrentProgress(const NSCurrentProgress &) = delete;
+  NSCurrentProgress &operator=(const NSCurrentProgress &) = delete;
+
+ private:
+  const std::shared_ptr<NSProgress> previous_;
+};
+
+}  // namespace droxa
