@@ -17,22 +17,6 @@ bool Exists(int folder, const std::string &path) {
   return fstatat(folder, path.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0;
 }
 
-// For file systems that can't rename without replacing. A folder's rename replaces at most an empty folder;
-// any other item gets its second name before it loses the first, which fails where the name is taken.
-int MoveWithoutTheKernelsHelp(int fromFolder, const std::string &from, int toFolder, const std::string &to) {
-  struct stat status {};
-  if (fstatat(fromFolder, from.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) return errno;
-  if (!S_ISDIR(status.st_mode)) {
-    if (linkat(fromFolder, from.c_str(), toFolder, to.c_str(), 0) == 0) {
-      return unlinkat(fromFolder, from.c_str(), 0) == 0 ? 0 : errno;
-    }
-    const bool hasNoLinks = errno == EPERM || errno == EOPNOTSUPP || errno == ENOSYS || errno == EMLINK;
-    if (!hasNoLinks) return errno;
-  }
-  if (Exists(toFolder, to)) return EEXIST;
-  return renameat(fromFolder, from.c_str(), toFolder, to.c_str()) == 0 ? 0 : errno;
-}
-
 bool FolderHasEntry(const std::string &folder, const std::string &name) {
   DIR *const entries = opendir(folder.c_str());
   if (!entries) return true;
@@ -64,11 +48,28 @@ int MoveToOtherCase(const std::string &from, const std::string &to) {
 
 }  // namespace
 
+int FPMoveAtByReplacing(int fromFolder, const std::string &from, int toFolder, const std::string &to) {
+  struct stat status {};
+  if (fstatat(fromFolder, from.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) return errno;
+  if (!S_ISDIR(status.st_mode)) {
+    if (linkat(fromFolder, from.c_str(), toFolder, to.c_str(), 0) == 0) {
+      if (unlinkat(fromFolder, from.c_str(), 0) == 0) return 0;
+      const int error = errno;
+      (void)unlinkat(toFolder, to.c_str(), 0);
+      return error;
+    }
+    const bool hasNoLinks = errno == EPERM || errno == EOPNOTSUPP || errno == ENOSYS || errno == EMLINK;
+    if (!hasNoLinks) return errno;
+  }
+  if (Exists(toFolder, to)) return EEXIST;
+  return renameat(fromFolder, from.c_str(), toFolder, to.c_str()) == 0 ? 0 : errno;
+}
+
 int FPMoveAt(int fromFolder, const std::string &from, int toFolder, const std::string &to) {
   if (renameat2(fromFolder, from.c_str(), toFolder, to.c_str(), RENAME_NOREPLACE) == 0) return 0;
   // EINVAL is also the answer for a folder moved below itself, which the second try repeats.
   if (errno != EINVAL && errno != ENOSYS) return errno;
-  return MoveWithoutTheKernelsHelp(fromFolder, from, toFolder, to);
+  return FPMoveAtByReplacing(fromFolder, from, toFolder, to);
 }
 
 int FPMove(const std::string &from, const std::string &to) {

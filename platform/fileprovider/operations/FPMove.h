@@ -10,5 +10,8 @@ namespace droxa {
 int FPMove(const std::string &from, const std::string &to);
 // The same from one open folder to another.
 int FPMoveAt(int fromFolder, const std::string &from, int toFolder, const std::string &to);
+// Its form for file systems whose renames always replace: a document gets its second name before it loses
+// the first, so that a kill in between leaves both; a folder's rename replaces an empty folder at most.
+int FPMoveAtByReplacing(int fromFolder, const std::string &from, int toFolder, const std::string &to);
 
 }  // namespace droxa
