@@ -23,7 +23,8 @@ class NSUbiquitousItemProviding {
   // The folder where work on the item at `url` may be prepared: on the same file system, unseen by others,
   // and there already. nil: beside the item, under a hidden name.
   virtual NSURL itemReplacementDirectoryForURL(const NSURL &url);
-  // The person asked for the item at `url` to be deleted, with all below it; it is still there.
+  // The person asked for the item at `url` to be deleted, with all below it; it is still there. Called under
+  // the coordinated access for its deletion, so it must not wait for somebody who asks for another.
   virtual void willDeleteItemAtURL(const NSURL &url);
   // What is on the disk for the document at `url`: the url, unless another file stands for it.
   virtual NSURL physicalURLForURL(const NSURL &url);

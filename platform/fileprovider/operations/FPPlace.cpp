@@ -16,6 +16,10 @@ NSURL PromiseOfName(const NSURL &folder, const std::string &name) {
   return provider ? provider->physicalURLForName(folder, name) : folder.URLByAppendingPathComponent(name);
 }
 
+NSURL PromiseOf(const NSURL &url) {
+  return PromiseOfName(url.URLByDeletingLastPathComponent(), url.lastPathComponent());
+}
+
 }  // namespace
 
 FPPlace FPPlaceOfURL(const NSURL &url) {
@@ -39,14 +43,13 @@ bool FPExists(const std::string &path, mode_t *mode) {
 
 bool FPIsTakenByOtherForm(const FPPlace &place) {
   if (place.isPromise()) return FPExists(place.logical.path());
-  const NSURL folder = place.logical.URLByDeletingLastPathComponent();
-  const NSURL promise = PromiseOfName(folder, place.logical.lastPathComponent());
+  const NSURL promise = PromiseOf(place.logical);
   return !(promise == place.logical) && FPExists(promise.path());
 }
 
-void FPAddWriting(const FPPlace &place, std::vector<NSFileAccessIntent> *intents) {
-  intents->push_back(NSFileAccessIntent::writingIntent(place.logical));
-  if (place.isPromise()) intents->push_back(NSFileAccessIntent::writingIntent(place.onDisk));
+void FPAddWriting(const NSURL &url, std::vector<NSFileAccessIntent> *intents) {
+  intents->push_back(NSFileAccessIntent::writingIntent(url));
+  intents->push_back(NSFileAccessIntent::writingIntent(PromiseOf(url)));
 }
 
 bool FPIsFolder(const NSURL &url, NSError *error) {

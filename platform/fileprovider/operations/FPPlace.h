@@ -19,7 +19,8 @@ struct FPPlace {
   bool isPromise() const { return !(logical == onDisk); }
 };
 
-// The place that `url` means: its own file, or with the physical property the file that stands for it.
+// The place that `url` means: its own file, or with the physical property the file that stands for it, which
+// changes when a document's contents come or go. Asked under coordination.
 FPPlace FPPlaceOfURL(const NSURL &url);
 // The place of the item of that name in `folder`, of the same kind as `like`.
 FPPlace FPPlaceOfName(const NSURL &folder, const std::string &name, const FPPlace &like);
@@ -29,8 +30,8 @@ bool FPExists(const std::string &path, mode_t *mode = nullptr);
 // Whether an item of the place's name is there already in the other form: as itself where the place is a
 // promise's, and the reverse. A file at the place itself is left to the step that never replaces one.
 bool FPIsTakenByOtherForm(const FPPlace &place);
-// The accesses for writing to all that the place has.
-void FPAddWriting(const FPPlace &place, std::vector<NSFileAccessIntent> *intents);
+// The accesses for writing to both forms of the item of that name.
+void FPAddWriting(const NSURL &url, std::vector<NSFileAccessIntent> *intents);
 
 // Whether there is a folder at `url`, also through a link; otherwise `error` is set.
 bool FPIsFolder(const NSURL &url, NSError *error);

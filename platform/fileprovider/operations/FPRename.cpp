@@ -13,14 +13,15 @@ FPOutcome FPRename(const NSURL &url, const std::string &name, const FPProgress &
   if (!url.isFileURL() || url.path() == "/") return {{}, FPNoSuchFileError(url)};
   NSError error = FPCheckName(name);
   if (error) return {{}, error};
-  const FPPlace from = FPPlaceOfURL(url);
-  const FPPlace to = FPPlaceOfName(url.URLByDeletingLastPathComponent(), name, from);
+  const NSURL folder = url.URLByDeletingLastPathComponent();
   std::vector<NSFileAccessIntent> intents;
-  FPAddWriting(from, &intents);
-  FPAddWriting(to, &intents);
+  FPAddWriting(url, &intents);
+  FPAddWriting(folder.URLByAppendingPathComponent(name), &intents);
   const FPAccess access =
       NSFileCoordinator::defaultCoordinator()->coordinateAccess(intents, progress, &error);
   if (!access) return {{}, error};
+  const FPPlace from = FPPlaceOfURL(url);
+  const FPPlace to = FPPlaceOfName(folder, name, from);
   if (!FPExists(from.onDisk.path())) return {{}, FPNoSuchFileError(url)};
   if (name == url.lastPathComponent()) return {to.logical, {}};
   if (FPIsTakenByOtherForm(to)) return {{}, FPCollisionError(to.logical)};

@@ -15,21 +15,24 @@ namespace {
 // So many names are tried before a folder is taken for one that has them all.
 constexpr int kMostBounces = 10'000;
 
-NSError MoveTo(const FPPlace &from, const FPPlace &to, const FPProgress &progress) {
+// Under the name in the folder, or not at all.
+FPOutcome MoveTo(const NSURL &url, const NSURL &folder, const std::string &name, const FPProgress &progress) {
   std::vector<NSFileAccessIntent> intents;
-  FPAddWriting(from, &intents);
-  FPAddWriting(to, &intents);
+  FPAddWriting(url, &intents);
+  FPAddWriting(folder.URLByAppendingPathComponent(name), &intents);
   NSError error;
   const FPAccess access =
       NSFileCoordinator::defaultCoordinator()->coordinateAccess(intents, progress, &error);
-  if (!access) return error;
-  if (!FPExists(from.onDisk.path())) return FPNoSuchFileError(from.logical);
-  if (from.logical == to.logical) return {};
-  if (FPIsTakenByOtherForm(to)) return FPCollisionError(to.logical);
+  if (!access) return {{}, error};
+  const FPPlace from = FPPlaceOfURL(url);
+  const FPPlace to = FPPlaceOfName(folder, name, from);
+  if (!FPExists(from.onDisk.path())) return {{}, FPNoSuchFileError(url)};
+  if (from.logical == to.logical) return {to.logical, {}};
+  if (FPIsTakenByOtherForm(to)) return {{}, FPCollisionError(to.logical)};
   const int code = FPMove(from.onDisk.path(), to.onDisk.path());
-  if (code == EEXIST) return FPCollisionError(to.logical);
-  if (code == EXDEV) return FPMoveAcross(from, to, progress);
-  return FPErrorFromPOSIX(code, from.logical.path() + " can't be moved to " + to.logical.path());
+  if (code == EEXIST) return {{}, FPCollisionError(to.logical)};
+  if (code == EXDEV) return {to.logical, FPMoveAcross(from, to, progress)};
+  return {to.logical, FPErrorFromPOSIX(code, url.path() + " can't be moved to " + to.logical.path())};
 }
 
 bool IsCollision(const NSError &error) {
@@ -37,20 +40,20 @@ bool IsCollision(const NSError &error) {
 }
 
 // Under the first name that is free. Names that are seen to be taken are passed over without coordination.
-FPOutcome Bounce(const FPPlace &from, const NSURL &folder, const std::string &name,
-                 const FPProgress &progress) {
+FPOutcome Bounce(const NSURL &url, const NSURL &folder, const std::string &name, const FPProgress &progress) {
   mode_t mode = 0;
+  const FPPlace from = FPPlaceOfURL(url);
   FPBouncedNames names(name, FPExists(from.onDisk.path(), &mode) && S_ISDIR(mode));
-  NSError error;
+  FPOutcome outcome;
   for (int tried = 0; tried < kMostBounces; ++tried) {
-    const FPPlace to = FPPlaceOfName(folder, names.next(), from);
-    error = FPCollisionError(to.logical);
+    const std::string next = names.next();
+    const FPPlace to = FPPlaceOfName(folder, next, from);
+    outcome = {{}, FPCollisionError(to.logical)};
     if (FPExists(to.onDisk.path()) || FPIsTakenByOtherForm(to)) continue;
-    error = MoveTo(from, to, progress);
-    if (!error) return {to.logical, {}};
-    if (!IsCollision(error)) break;
+    outcome = MoveTo(url, folder, next, progress);
+    if (!IsCollision(outcome.error)) break;
   }
-  return {{}, error};
+  return outcome;
 }
 
 }  // namespace
@@ -61,16 +64,15 @@ FPOutcome FPReparent(const NSURL &url, const NSURL &folder, const std::optional<
   const std::string name = newName.value_or(url.lastPathComponent());
   NSError error = FPCheckName(name);
   if (error || !FPIsFolder(folder, &error)) return {{}, error};
-  const FPPlace from = FPPlaceOfURL(url);
-  if (!FPExists(from.onDisk.path())) return {{}, FPNoSuchFileError(url)};
-  if (FPIsWithin(folder, from.onDisk)) {
+  const NSURL onDisk = FPPlaceOfURL(url).onDisk;
+  if (!FPExists(onDisk.path())) return {{}, FPNoSuchFileError(url)};
+  if (FPIsWithin(folder, onDisk)) {
     const std::string text = url.path() + " can't be moved into itself, to " + folder.path();
     return {{}, FPErrorFromPOSIX(EINVAL, text)};
   }
-  const FPPlace to = FPPlaceOfName(folder, name, from);
-  error = MoveTo(from, to, progress);
-  if (!error) return {to.logical, {}};
-  return allowBouncing && IsCollision(error) ? Bounce(from, folder, name, progress) : FPOutcome{{}, error};
+  const FPOutcome outcome = MoveTo(url, folder, name, progress);
+  if (!allowBouncing || !IsCollision(outcome.error)) return outcome;
+  return Bounce(url, folder, name, progress);
 }
 
 }  // namespace droxa

@@ -2,12 +2,14 @@
 
 #include <cerrno>
 #include <fcntl.h>
+#include <iterator>
+#include <string_view>
 #include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
-#include <vector>
 
 #include "platform/fileprovider/FPReplacements.h"
+#include "platform/fileprovider/operations/FPDescriptor.h"
 #include "platform/fileprovider/operations/FPErrors.h"
 #include "platform/fileprovider/operations/FPMove.h"
 #include "platform/fileprovider/operations/FPRemoveTree.h"
@@ -25,13 +27,25 @@ os_log_t Log() {
   return log;
 }
 
-std::string NewPath(const std::string &parent) {
-  return (parent == "/" ? "" : parent) + "/" + kPrefix + UUID::generate().description();
+std::string NewName() {
+  return kPrefix + UUID::generate().description();
+}
+
+int OpenFolder(const std::string &path) {
+  return open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+}
+
+// Whether NewName() may have made the name; nothing else is ever removed.
+bool IsOfAnOperation(std::string_view name) {
+  if (!name.starts_with(kPrefix)) return false;
+  name.remove_prefix(std::size(kPrefix) - 1);
+  return name.size() == UUID().description().size() &&
+         name.find_first_not_of("0123456789ABCDEF-") == std::string_view::npos;
 }
 
 // The folder, open and locked; -1 with errno set where there is none, or EWOULDBLOCK where another holds it.
-int OpenLocked(const std::string &path) {
-  const int folder = open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
+int OpenLocked(int parent, const std::string &name) {
+  const int folder = openat(parent, name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
   if (folder < 0) return -1;
   if (flock(folder, LOCK_EX | LOCK_NB) == 0) return folder;
   const int error = errno;
@@ -40,20 +54,21 @@ int OpenLocked(const std::string &path) {
   return -1;
 }
 
-// Whether the open folder is the one at the path still.
-bool IsAt(int folder, const std::string &path) {
+// Whether the open folder is the one of that name still.
+bool IsStill(int folder, int parent, const std::string &name) {
   struct stat opened {};
   struct stat named {};
-  return fstat(folder, &opened) == 0 && lstat(path.c_str(), &named) == 0 && opened.st_dev == named.st_dev &&
-         opened.st_ino == named.st_ino;
+  return fstat(folder, &opened) == 0 && fstatat(parent, name.c_str(), &named, AT_SYMLINK_NOFOLLOW) == 0 &&
+         opened.st_dev == named.st_dev && opened.st_ino == named.st_ino;
 }
 
-void RemoveLocked(int folder, const std::string &path) {
+bool RemoveLocked(int folder, int parent, const std::string &name) {
   int error = FPRemoveAllIn(folder);
-  if (error == 0 && rmdir(path.c_str()) != 0 && errno != ENOENT) error = errno;
-  if (error == 0) return;
-  os_log_error(Log(), "[ERROR] %s can't be removed, and is left for later: %@", path.c_str(),
+  if (error == 0 && unlinkat(parent, name.c_str(), AT_REMOVEDIR) != 0 && errno != ENOENT) error = errno;
+  if (error == 0) return true;
+  os_log_error(Log(), "[ERROR] %s can't be removed, and is left for later: %@", name.c_str(),
                NSError::errorWithPOSIXCode(error));
+  return false;
 }
 
 bool AreOnOneFileSystem(const std::string &a, const std::string &b) {
@@ -64,20 +79,23 @@ bool AreOnOneFileSystem(const std::string &a, const std::string &b) {
 
 }  // namespace
 
-std::unique_ptr<FPReplacement> FPReplacement::makeIn(const std::string &parent, int *error) {
+std::unique_ptr<FPReplacement> FPReplacement::makeIn(const std::string &parentPath, int *error) {
+  const int parent = OpenFolder(parentPath);
+  *error = parent < 0 ? errno : EAGAIN;
   // The cleaner may come between the folder's making and its lock, and remove it.
-  for (int attempt = 0; attempt < 16; ++attempt) {
-    const std::string path = NewPath(parent);
-    if (mkdir(path.c_str(), S_IRWXU) != 0) {
+  for (int attempt = 0; parent >= 0 && attempt < 16; ++attempt) {
+    const std::string name = NewName();
+    if (mkdirat(parent, name.c_str(), S_IRWXU) != 0) {
       *error = errno;
-      return nullptr;
+      break;
     }
-    const int folder = OpenLocked(path);
-    if (folder < 0) continue;
-    std::unique_ptr<FPReplacement> replacement(new FPReplacement(path, folder));
-    if (IsAt(folder, path)) return replacement;
+    const int folder = OpenLocked(parent, name);
+    if (folder >= 0 && IsStill(folder, parent, name)) {
+      return std::unique_ptr<FPReplacement>(new FPReplacement(parent, name, folder));
+    }
+    if (folder >= 0) close(folder);
   }
-  *error = EAGAIN;
+  if (parent >= 0) close(parent);
   return nullptr;
 }
 
@@ -95,36 +113,34 @@ std::unique_ptr<FPReplacement> FPReplacement::make(const NSURL &url, NSError *er
 }
 
 std::unique_ptr<FPReplacement> FPReplacement::makeOfFolderAtURL(const NSURL &url, NSError *error) {
-  const std::string path = NewPath(url.URLByDeletingLastPathComponent().path());
-  const int folder = OpenLocked(url.path());
-  const int code = folder < 0 ? errno : FPMove(url.path(), path);
-  if (code == 0) return std::unique_ptr<FPReplacement>(new FPReplacement(path, folder));
+  const int parent = OpenFolder(url.URLByDeletingLastPathComponent().path());
+  const std::string old = url.lastPathComponent();
+  const std::string name = NewName();
+  const int folder = parent < 0 ? -1 : OpenLocked(parent, old);
+  const int code = folder < 0 ? errno : FPMoveAt(parent, old, parent, name);
+  if (code == 0) return std::unique_ptr<FPReplacement>(new FPReplacement(parent, name, folder));
   if (folder >= 0) close(folder);
+  if (parent >= 0) close(parent);
   *error = FPErrorFromPOSIX(code, url.path() + " can't be moved out of sight");
   return nullptr;
 }
 
 FPReplacement::~FPReplacement() {
-  RemoveLocked(folder_, path_);
+  (void)RemoveLocked(folder_, parent_, name_);
   close(folder_);
+  close(parent_);
 }
 
 std::size_t FPRemoveAbandonedReplacements(const NSURL &directory) {
-  const int parent = open(directory.path().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-  if (parent < 0) return 0;
+  const FPDescriptor parent(OpenFolder(directory.path()));
+  if (parent.get() < 0) return 0;
   int error = 0;
-  const std::vector<std::string> names = FPNamesInFolder(parent, &error);
-  close(parent);
   std::size_t removed = 0;
-  for (const std::string &name : names) {
-    if (!name.starts_with(kPrefix)) continue;
-    const std::string path = directory.URLByAppendingPathComponent(name).path();
-    const int folder = OpenLocked(path);
-    if (folder < 0) continue;
-    if (IsAt(folder, path)) RemoveLocked(folder, path);
-    struct stat status {};
-    if (lstat(path.c_str(), &status) != 0) ++removed;
-    close(folder);
+  for (const std::string &name : FPNamesInFolder(parent.get(), &error)) {
+    if (!IsOfAnOperation(name)) continue;
+    const FPDescriptor folder(OpenLocked(parent.get(), name));
+    if (folder.get() < 0 || !IsStill(folder.get(), parent.get(), name)) continue;
+    if (RemoveLocked(folder.get(), parent.get(), name)) ++removed;
   }
   return removed;
 }

@@ -2,6 +2,7 @@
 
 #include <memory>
 #include <string>
+#include <utility>
 
 #include "platform/foundation/NSError.h"
 #include "platform/foundation/NSURL.h"
@@ -26,13 +27,15 @@ class FPReplacement final {
   FPReplacement &operator=(const FPReplacement &) = delete;
 
   int folder() const { return folder_; }  // open for *at calls
-  const std::string &path() const { return path_; }
 
  private:
-  FPReplacement(std::string path, int folder) : path_(std::move(path)), folder_(folder) {}
-  static std::unique_ptr<FPReplacement> makeIn(const std::string &parent, int *error);
+  FPReplacement(int parent, std::string name, int folder)
+      : parent_(parent), name_(std::move(name)), folder_(folder) {}
+  static std::unique_ptr<FPReplacement> makeIn(const std::string &parentPath, int *error);
 
-  const std::string path_;
+  // Open, since the folder above may be moved meanwhile.
+  const int parent_;
+  const std::string name_;
   const int folder_;
 };
 

@@ -127,11 +127,12 @@ TEST_P(FPDelete, coordinatedOfWhatIsMissingIsNoSuchFile) {
 }
 
 TEST_P(FPDelete, whatNobodyHoldsIsRemovedByTheCleaner) {
-  write(".droxa-replacement-0/item/a", "left by a dead process");
-  write(".droxa-replacement-1", "a document, which no operation made");
-  write("other/b", "words");
+  const std::string name = ".droxa-replacement-6B29FC40-CA47-1067-B31D-00DD010662D";
+  write(name + "A/item/a", "left by a dead process");
+  write(name + "B", "a document, which no operation made");
+  write(".droxa-replacement-notes/a", "somebody's own");
   EXPECT_EQ(FPRemoveAbandonedReplacements(url("")), 1U);
-  EXPECT_EQ(names(), (std::vector<std::string>{".droxa-replacement-1", "other"}));
+  EXPECT_EQ(names(), (std::vector<std::string>{name + "B", ".droxa-replacement-notes"}));
   EXPECT_EQ(FPRemoveAbandonedReplacements(url("missing")), 0U);
 }
 

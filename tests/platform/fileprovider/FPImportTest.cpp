@@ -250,6 +250,18 @@ TEST_P(FPImport, preparesInTheServicesFolder) {
   EXPECT_TRUE(names("private").empty());
 }
 
+TEST_P(FPImport, leavesNothingInAFolderThatMovesMeanwhile) {
+  write("large", std::string(64 << 20, 'x'));
+  const auto progress = std::make_shared<NSProgress>();
+  const Answer answer = importUnder(progress, url("large"), url("to"), [&] {
+    EXPECT_TRUE(eventually([&] { return progress->completedUnitCount() > 0; }));
+    fs::rename(path("to"), path("moved"));
+  });
+  // It may have been in time.
+  EXPECT_TRUE(answer.url || answer.is(NSFileNoSuchFileError)) << answer.error.description();
+  EXPECT_EQ(names("moved").size(), answer.url ? 1U : 0U);
+}
+
 TEST_P(FPImport, waitsForWhoeverWritesToTheSource) {
   write("tree/a", "words");
   NSError error;

@@ -12,7 +12,7 @@ struct FPMove : OperationsFixture, testing::WithParamInterface<Form> {
   }
 };
 INSTANTIATE_TEST_SUITE_P(By, FPMove, testing::Values(&FPMoveAt, &FPMoveAtByReplacing),
-                         [](const auto &info) { return info.index == 0 ? "theKernel" : "replacing"; });
+                         [](const auto &form) { return form.index == 0 ? "theKernel" : "replacing"; });
 
 TEST_P(FPMove, givesTheNewName) {
   write("a", "words");
