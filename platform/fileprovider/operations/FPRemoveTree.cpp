@@ -15,6 +15,7 @@ namespace {
 // A folder this deep is moved up to the top before it is looked into, so that no tree is too deep for the
 // stack and the descriptors of this process.
 constexpr int kDeepest = 64;
+constexpr int kMostAttempts = 16;
 
 int OpenForRemoval(int folder, const std::string &name) {
   constexpr int kFlags = O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
@@ -35,11 +36,14 @@ class TreeRemoval {
   explicit TreeRemoval(int root) : root_(root) {}
 
   int removeAll() {
-    // Until nothing is moved up any more.
+    // Until nothing is moved up any more. Somebody who had a folder of the tree open may put something into
+    // it between its listing and its removal; that is seen the next time.
+    int attempts = 0;
     do {
       movedUp_ = false;
+      error_ = 0;
       removeAllIn(root_, 0);
-    } while (movedUp_ && error_ == 0);
+    } while ((movedUp_ && error_ == 0) || (error_ == ENOTEMPTY && ++attempts < kMostAttempts));
     return error_;
   }
 
@@ -50,7 +54,7 @@ class TreeRemoval {
     note(error);
   }
   void remove(int folder, const std::string &name, int depth) {
-    if (unlinkat(folder, name.c_str(), 0) == 0 || errno == ENOENT) return;
+    if (unlinkat(folder, name.c_str(), 0) == 0) return;
     if (errno != EISDIR) return note(errno);
     if (depth == kDeepest && moveUp(folder, name)) return;
     const int opened = OpenForRemoval(folder, name);
@@ -64,8 +68,9 @@ class TreeRemoval {
     movedUp_ = movedUp_ || moved;
     return moved;
   }
+  // What has gone already, by whoever else removes it, is no error.
   void note(int error) {
-    if (error_ == 0) error_ = error;
+    if (error_ == 0 && error != ENOENT) error_ = error;
   }
 
   const int root_;

@@ -108,6 +108,12 @@ class SerialOrder {
   std::size_t longest_ = 0;
 };
 
+std::string described(const Model &model) {
+  std::string text;
+  for (const auto &[path, what] : model) text += path + ":" + what + " ";
+  return text;
+}
+
 struct Storm : OperationsOnFileSystems {
   Model found() const {
     Model model;
@@ -146,7 +152,7 @@ TEST_P(Storm, endsAsSomeSerialOrderDoes) {
     const auto reported = blow(seed);
     SerialOrder order(reported, found());
     EXPECT_TRUE(order.exists({})) << "seed " << seed << ": only " << order.longest()
-                                  << " of 200 can be explained";
+                                  << " of 200 can be explained; left: " << described(found());
   }
 }
 
