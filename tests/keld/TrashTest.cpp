@@ -19,7 +19,9 @@ namespace {
 class Trash : public testing::Test {
  protected:
   Trash() { connect(); }
-  ~Trash() override {
+  ~Trash() override { disconnect(); }
+  // The connection keeps the daemon alive.
+  static void disconnect() {
     QVDaemonConnection::setDefaultConnection(nullptr);
     QVContainerCache::forget();
   }
@@ -282,6 +284,7 @@ TEST_F(Trash, removesTheNoteOfWhatLeftItWhileNobodyWatched) {
   trash("a");
   trash("b");
   ASSERT_TRUE(eventually([&] { return keld.knows(files("b")); }));
+  disconnect();
   keld.stop();
   keld.remove(files("a"));
   keld.start();
@@ -318,6 +321,7 @@ TEST_F(Trash, removesANoteWithoutAnItemOnlyWhenItIsOld) {
   for (const std::string &path :
        {note("old"), note("a"), note("old").replace(note("old").size() - 9, 9, "txt")})
     std::filesystem::last_write_time(path, longAgo);
+  disconnect();
   keld.stop();
   keld.start();
   connect();

@@ -1,11 +1,10 @@
-#include "tessaly/QVItemActions.h"
-
 #include <filesystem>
 #include <fstream>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 
 #include "tessaly/QVErrors.h"
+#include "tessaly/QVItemActions.h"
 #include "tessaly/QVItemMetadata.h"
 #include "tests/support/FakeDaemonConnection.h"
 #include "tests/support/LogLines.h"
@@ -21,10 +20,7 @@ constexpr std::int64_t kDate = 1'769'860'800'123'456'789;
 class ItemActions : public testing::Test {
  protected:
   ItemActions() {
-    fake.daemon->addDocument("a");
-    fake.daemon->addAlias("alias");
-    for (const std::string &path : {document.path(), alias.path()})
-      std::filesystem::create_directories(std::filesystem::path(path).parent_path());
+    std::filesystem::create_directories(fake.daemon->url("").path());
     std::ofstream(document.path()) << "x";
     std::filesystem::create_symlink(document.path(), alias.path());
   }
@@ -35,8 +31,11 @@ class ItemActions : public testing::Test {
   }
   ScratchHome home;
   FakeDaemonScope fake;
+  const QVFileObjectID documentID = fake.daemon->addDocument("a");
+  const QVFileObjectID aliasID = fake.daemon->addAlias("alias");
   const NSURL document = fake.daemon->url("a");
   const NSURL alias = fake.daemon->url("alias");
+  const NSURL missing = fake.daemon->url("").URLByAppendingPathComponent("missing");
   const NSFileManager *manager = NSFileManager::defaultManager();
 };
 
@@ -86,7 +85,7 @@ TEST_F(ItemActions, refuseTagsThatCantBeKept) {
 
 TEST_F(ItemActions, tellWhyTagsCouldntBeSet) {
   NSError error;
-  EXPECT_FALSE(qv_setTagNames(fake.daemon->url("missing"), {"Red"}, &error));
+  EXPECT_FALSE(qv_setTagNames(missing, {"Red"}, &error));
   EXPECT_TRUE(error.is(QVTessalyErrorDomain, QVErrorNoSuchItem)) << error.description();
   error = NSError();
   const NSError unreachable(NSCocoaErrorDomain, NSXPCConnectionInvalid);
@@ -97,13 +96,11 @@ TEST_F(ItemActions, tellWhyTagsCouldntBeSet) {
 
 TEST_F(ItemActions, logWhatCouldntBeNotedWithoutAResult) {
   const OSLogCapture log;
-  qv_setFavoriteRank(manager, 12, fake.daemon->url("missing"));
+  qv_setFavoriteRank(manager, 12, missing);
   qv_setLastOpenDate(manager, NSDate::now(), NSURL());
   const auto lines = logLines(log);
   ASSERT_EQ(lines.size(), 2U);
-  EXPECT_EQ(lines[0].rfind("error: [ERROR] can't note the favorite rank of " +
-                               fake.daemon->url("missing").absoluteString(),
-                           0),
+  EXPECT_EQ(lines[0].rfind("error: [ERROR] can't note the favorite rank of " + missing.absoluteString(), 0),
             0U);
   EXPECT_EQ(lines[1].rfind("error: [ERROR] can't note when (null) was last used", 0), 0U);
 }
