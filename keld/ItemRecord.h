@@ -5,6 +5,7 @@
 
 #include "platform/fileprovider/NSFileProviderItem.h"
 #include "tessaly/QVFileObjectID.h"
+#include "tessaly/QVItemMetadata.h"
 
 namespace droxa::keld {
 
@@ -14,8 +15,6 @@ using ItemNumber = std::uint64_t;  // the number of a QVFileObjectID; 0 for none
 inline constexpr ItemNumber kReplicaFolder = 0;  // its children are the containers
 // Holds what was found missing until it is known whether it turned up elsewhere.
 inline constexpr ItemNumber kLimboFolder = static_cast<ItemNumber>(-1);
-
-inline constexpr char kDocumentsName[] = "Documents";
 
 // Where an item stands in the drive.
 enum class Zone : std::uint8_t {
@@ -40,6 +39,7 @@ struct FileFacts {
   std::uint64_t inode = 0;
   std::uint64_t device = 0;  // 0: the replica's own, whose number may change from boot to boot
   std::uint64_t links = 1;   // not kept in the database
+  bool isPromise = false;    // a promise stands for the document; not kept in the database
   std::uint64_t size = 0;
   std::int64_t birth = 0;  // nanoseconds since 1970; 0 where the file system doesn't tell
   std::int64_t modified = 0;
@@ -56,6 +56,8 @@ struct FileFacts {
   }
 };
 
+using ItemMetadata = QVItemMetadata;
+
 // A row of the item table.
 struct ItemRecord {
   ItemNumber id = 0;
@@ -64,6 +66,7 @@ struct ItemRecord {
   std::uint32_t flags = 0;
   std::uint64_t rank = 0;
   FileFacts facts;
+  ItemMetadata metadata;
 
   Zone zone() const { return static_cast<Zone>(flags & kZoneMask); }
   bool isFolder() const { return facts.kind == NSFileProviderItemKind::folder; }

@@ -3,9 +3,11 @@
 #include <algorithm>
 #include <malloc.h>
 #include <unordered_set>
+#include <utility>
 
 #include "keld/Schema.h"
 #include "platform/dispatch/dispatch.h"
+#include "tessaly/QVContainer.h"
 #include "tessaly/QVLog.h"
 
 namespace droxa::keld {
@@ -20,7 +22,9 @@ constexpr std::size_t kMostHintsAtOnce = 10000;
 constexpr std::size_t kMostHintsKept = 200000;
 constexpr std::size_t kMostChangesAtOnce = 20000;
 
-void lookAtPath(const std::string &path, Reconciler &reconciler, ItemQueries &queries) {
+}  // namespace
+
+void LookAtPath(const std::string &path, Reconciler &reconciler, ItemQueries &queries) {
   ItemNumber folder = kReplicaFolder;
   for (std::size_t at = 0; at < path.size();) {
     const std::size_t slash = std::min(path.find('/', at), path.size());
@@ -34,8 +38,6 @@ void lookAtPath(const std::string &path, Reconciler &reconciler, ItemQueries &qu
   }
 }
 
-}  // namespace
-
 Keeper::Keeper(std::unique_ptr<SqlDatabase> database, std::string databasePath,
                const std::string &replicaPath, KeeperOptions options, ContainerList &containers,
                KeeperListener &listener)
@@ -48,7 +50,10 @@ Keeper::Keeper(std::unique_ptr<SqlDatabase> database, std::string databasePath,
       queries_(std::make_unique<ItemQueries>(*database_)),
       edits_(std::make_unique<ItemEdits>(*database_)),
       opener_(std::make_unique<FolderOpener>(replicaPath, *queries_)),
-      reconciler_(std::make_unique<Reconciler>(*queries_, *edits_, *opener_)) {}
+      reconciler_(std::make_unique<Reconciler>(*queries_, *edits_, *opener_)),
+      trashNotes_(replicaPath) {
+  reconciler_->setShowsPromises(options_.showsPromises);
+}
 
 Keeper::~Keeper() {
   stop();
@@ -143,7 +148,7 @@ void Keeper::lookAt(std::string path, std::function<void()> done) {
 void Keeper::lookAtAll(std::vector<std::string> paths, std::function<void()> done) {
   perform(
       [paths = std::move(paths)](Reconciler &reconciler, ItemQueries &queries, ItemEdits &) {
-        for (const std::string &path : paths) lookAtPath(path, reconciler, queries);
+        for (const std::string &path : paths) LookAtPath(path, reconciler, queries);
       },
       std::move(done));
 }
@@ -180,9 +185,10 @@ std::string Keeper::watcherDescription() const {
 // --- The keeper's thread.
 
 void Keeper::run() {
+  Work work;
   try {
     for (;;) {
-      Work work = waitForWork();
+      work = waitForWork();
       if (work.stop) break;
       step(work);
       if (bulkLoading_ && firstWalkDone_) finishBulkLoad();
@@ -192,6 +198,7 @@ void Keeper::run() {
     database_->execute("PRAGMA wal_checkpoint(TRUNCATE)");
   } catch (const SqlError &error) {
     if (error.meansDamage()) DatabaseMarkDamaged(databasePath_);
+    for (auto &job : work.jobs) dispatch_async_global(std::move(job.second));
     fail(databasePath_ + ": " + error.what());
   }
 }
@@ -281,9 +288,10 @@ void Keeper::step(Work &work) {
     scannedThrough_ = std::max<ItemNumber>(scannedThrough_, walkedThrough_);
   const auto after = containers_.current();
   if (!changes.empty()) listener_.itemsChanged({0, std::move(changes), before, after}, *queries_);
+  lookAfterTrash();
   if (isAdvanced) listener_.feedAdvanced();
   if (containers.list) listener_.containerListChanged();
-  for (auto &job : work.jobs) dispatch_async_global(std::move(job.second));
+  for (auto &job : std::exchange(work.jobs, {})) dispatch_async_global(std::move(job.second));
 }
 
 void Keeper::applyHints(std::vector<ReplicaHint> &hints) {
@@ -345,10 +353,20 @@ void Keeper::endWalk() {
   nextWalk_ = Clock::now() + std::max(options_.scanInterval, took * 10);
   if (walkedOnce_) return;
   walkedOnce_ = true;
+  trashNotes_.removeOrphans();
   const Counters &counters = edits_->counters();
   os_log_info(qvc_default_log(),
               "[INFO] looked at the whole replica in %lld ms: %llu documents, %llu folders",
               static_cast<long long>(took.count()), counters.documents, counters.folders);
+}
+
+void Keeper::lookAfterTrash() {
+  const ContainerEntry *trash = containers_.current()->byID(QVUbiquitousTrashContainerID);
+  std::vector<std::string> left;
+  for (Reconciler::Place &place : reconciler_->takePlacesLeftInTrash())
+    if (trash && place.folder == trash->documents) left.push_back(std::move(place.name));
+  trashNotes_.itemsLeft(left);
+  trashNotes_.removeThose();
 }
 
 ContainerList::Changes Keeper::refreshContainers(const std::vector<ItemChange> &changes, bool always) {

@@ -81,7 +81,9 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
  private:
   Keld(const DroxaHome &home, KeldOptions options);
   void open();
+  void removeAbandonedActions();
   void openSync();
+  bool replicaHasPromises() const;
   void offerLocalAccount(bool mayOffer);
   std::string identifierForAccount(const std::string &name);
   void performAndWait(const std::function<void(ItemEdits &edits)> &edit);

@@ -39,7 +39,7 @@ bool Reconciler::isAlias(ItemNumber folder, const std::string &name) {
 std::optional<FileFacts> Reconciler::readFacts(ItemNumber folder, const OwnedDescriptor &descriptor,
                                                const std::string &name,
                                                const std::optional<ItemRecord> &known) {
-  auto facts = ReadFileFacts(descriptor.get(), name, opener_.replicaDevice());
+  auto facts = readFileOrPromise(descriptor.get(), name);
   if (!facts || facts->kind != NSFileProviderItemKind::symbolicLink) return facts;
   // A link's target never changes, so that what the table knows of the same link still holds.
   if (known && known->facts.kind == NSFileProviderItemKind::alias) {
@@ -56,8 +56,9 @@ void Reconciler::look(ItemNumber folder, const std::string &name) {
   int error = 0;
   const auto descriptor = opener_.open(folder, &error);
   if (!descriptor) return;  // its own folder's hint tells what became of it
-  auto facts = readFacts(folder, *descriptor, name, queries_.byName(folder, name));
-  observe(folder, name, facts);
+  const auto document = documentName(folder, descriptor->get(), name);
+  if (!document) return;
+  observe(folder, *document, readFacts(folder, *descriptor, *document, queries_.byName(folder, *document)));
 }
 
 void Reconciler::observe(ItemNumber folder, const std::string &name, std::optional<FileFacts> facts) {
@@ -139,7 +140,7 @@ bool Reconciler::isStillThere(const ItemRecord &record) {
   int error = 0;
   const auto folder = opener_.open(record.parent, &error);
   if (!folder) return false;
-  const auto facts = ReadFileFacts(folder->get(), record.name, opener_.replicaDevice());
+  const auto facts = readFileOrPromise(folder->get(), record.name);
   return facts && facts->inode == record.facts.inode && facts->birth == record.facts.birth;
 }
 
@@ -150,8 +151,7 @@ bool Reconciler::leavesItsName(const ItemRecord &record, const Observation &obse
     return false;
   int error = 0;
   const auto folder = opener_.open(record.parent, &error);
-  const auto facts =
-      folder ? ReadFileFacts(folder->get(), record.name, opener_.replicaDevice()) : std::nullopt;
+  const auto facts = folder ? readFileOrPromise(folder->get(), record.name) : std::nullopt;
   if (!facts || facts->kind != NSFileProviderItemKind::document) return false;
   observe(record.parent, record.name, facts);
   return true;
@@ -169,24 +169,28 @@ bool Reconciler::takeBackFromBackup(const Observation &observation, std::uint32_
     insertNew(observation, flags, *id);
     return true;
   }
+  const ItemMetadata metadata = record->metadata;
   Observation backup{record->parent, record->name, record->facts, true};
   const std::uint32_t backupFlags = record->flags;
   edits_.remove(*record, false);
-  insertNew(observation, flags, *id);
+  insertNew(observation, flags, *id, metadata);
   insertNew(backup, backupFlags, 0);
   return true;
 }
 
 // --- What happens to items.
 
-void Reconciler::insertNew(const Observation &observation, std::uint32_t flags, ItemNumber id) {
+void Reconciler::insertNew(const Observation &observation, std::uint32_t flags, ItemNumber id,
+                           const ItemMetadata &metadata) {
   ItemRecord record;
   record.id = id;
   record.parent = observation.folder;
   record.name = observation.name;
   record.flags = flags;
   record.facts = *observation.facts;
-  if (isDataless(record.parent, record.name, record.facts)) record.flags |= kDatalessFlag;
+  record.metadata = metadata;
+  const bool mayBeMarked = readMetadata(record);
+  if (isDataless(record.parent, record.name, record.facts, mayBeMarked)) record.flags |= kDatalessFlag;
   edits_.insert(record);
   changes_.push_back({record.id, record.facts.kind, 0, record.parent, false});
   touched_.push_back(record.parent);
@@ -194,8 +198,10 @@ void Reconciler::insertNew(const Observation &observation, std::uint32_t flags, 
 }
 
 // A placeholder is never shown as a document whose contents are here, not even before the sync has seen it.
-bool Reconciler::isDataless(ItemNumber folder, const std::string &name, const FileFacts &facts) {
-  if (facts.kind != NSFileProviderItemKind::document || facts.size == 0) return false;
+bool Reconciler::isDataless(ItemNumber folder, const std::string &name, const FileFacts &facts,
+                            bool mayBeMarked) {
+  if (facts.isPromise) return true;
+  if (!mayBeMarked || facts.kind != NSFileProviderItemKind::document || facts.size == 0) return false;
   int error = 0;
   const auto descriptor = opener_.open(folder, &error);
   const auto marker = descriptor ? ReadMarker(descriptor->get(), name) : std::nullopt;
@@ -219,11 +225,13 @@ void Reconciler::move(ItemRecord record, const Observation &observation, std::ui
     if (const auto folder = opener_.open(origin.parent, &error))
       observe(origin.parent, origin.name, readFacts(origin.parent, *folder, origin.name, std::nullopt));
   }
+  if (!wasInLimbo && record.zone() == Zone::trashed) leftInTrash_.push_back({origin.parent, origin.name});
   limboOrigins_.erase(record.id);
   edits_.rename(record, observation.folder, observation.name);
   const bool wasPrivate = record.zone() == Zone::privateStorage;
   const bool flagsChanged = (record.flags ^ flags) & ~kOwnFlags;
   record.facts = *observation.facts;
+  readMetadata(record);
   edits_.setFlags(record, flags | (record.flags & kOwnFlags));
   if (!wasPrivate && record.zone() == Zone::privateStorage) edits_.leaveTombstone(record);
   changes_.push_back({record.id, record.facts.kind, origin.parent, record.parent, false});
@@ -241,7 +249,10 @@ void Reconciler::refresh(ItemRecord record, const FileFacts &facts) {
                            record.facts.device == facts.device && record.facts.size == facts.size &&
                            record.facts.mode == facts.mode;
   if (becameAccessible && !isIdentical) foldersToScan_.push_back(record.id);
-  if (isIdentical) return;
+  // Attributes may be written twice while the clock of times of change stands still.
+  const ItemMetadata known = record.metadata;
+  const bool mayBeMarked = readMetadata(record);
+  if (isIdentical && record.metadata == known) return;
   // Whatever was written here, the cloud doesn't have it yet.
   const bool isWritten =
       !record.isFolder() && (record.facts.size != facts.size || record.facts.modified != facts.modified ||
@@ -249,10 +260,11 @@ void Reconciler::refresh(ItemRecord record, const FileFacts &facts) {
   if (isWritten) record.flags &= ~kUploadedFlag;
   if (record.facts.inode != facts.inode && !record.isFolder()) {
     record.flags &= ~kDatalessFlag;
-    if (isDataless(record.parent, record.name, facts)) record.flags |= kDatalessFlag;
+    if (isDataless(record.parent, record.name, facts, mayBeMarked)) record.flags |= kDatalessFlag;
   }
   record.facts = facts;
-  if (looksTheSame || isUnlistedStructure(record)) return edits_.updateSilently(record);
+  if ((looksTheSame && record.metadata == known) || isUnlistedStructure(record))
+    return edits_.updateSilently(record);
   edits_.update(record);
   changes_.push_back({record.id, record.facts.kind, record.parent, record.parent, false});
 }
@@ -301,6 +313,7 @@ void Reconciler::setSyncFlags(ItemNumber id, std::uint32_t flags) {
 
 void Reconciler::putIntoLimbo(ItemRecord record) {
   touched_.push_back(record.parent);
+  if (record.zone() == Zone::trashed) leftInTrash_.push_back({record.parent, record.name});
   limboOrigins_[record.id] = {record.parent, record.name};
   recentLimbo_.push_back(record.id);
   edits_.rename(record, kLimboFolder, std::to_string(record.id));

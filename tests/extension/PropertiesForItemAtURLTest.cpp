@@ -1,5 +1,6 @@
 #include "additions/NSError+QVFPAdditions.h"
 #include "platform/fileprovider/NSFileProviderError.h"
+#include "tessaly/QVContainer.h"
 #include "tessaly/QVErrors.h"
 #include "tests/extension/ExtensionFixture.h"
 
@@ -16,7 +17,8 @@ class PropertiesForURL : public ExtensionTest {
     return "getQueryItemForURL(" + url.path() + ", fakeFSEvent " + (fakeFSEvent ? "1" : "0") + ")";
   }
   static NSURL documentsOf(const std::string &containerID) {
-    return NSURL::fileURLWithPath(DroxaProcessHome().replica() + "/" + containerID + "/Documents");
+    return NSURL::fileURLWithPath(DroxaProcessHome().replica() + "/" + containerID + "/" +
+                                  QVDocumentsFolderName(containerID));
   }
 
   const std::shared_ptr<QVFileProviderExtension> extension = makeExtension();

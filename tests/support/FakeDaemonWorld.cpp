@@ -1,5 +1,7 @@
 #include "tests/support/FakeDaemonWorld.h"
 
+#include "tessaly/QVContainer.h"
+
 namespace droxa {
 
 FakeDaemonWorld::FakeDaemonWorld(Carry carry) : fake_(FakeDaemon::make("/replica")) {
@@ -10,7 +12,7 @@ FakeDaemonWorld::FakeDaemonWorld(Carry carry) : fake_(FakeDaemon::make("/replica
 FakeDaemonWorld::~FakeDaemonWorld() = default;
 
 NSURL FakeDaemonWorld::documents(const std::string &containerID) {
-  return NSURL::fileURLWithPath("/replica/" + containerID + "/Documents");
+  return NSURL::fileURLWithPath("/replica/" + containerID + "/" + QVDocumentsFolderName(containerID));
 }
 
 void FakeDaemonWorld::makeFile(const NSURL &url, std::size_t size) {
