@@ -32,6 +32,8 @@ class HostedExtension final : public NSFileProviderExtensionProtocol {
   void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
   void movingItemAtURL(const NSURL &url, const NSURL &destination,
                        NSFileProviderMovingCompletion completion) override;
+  // With an action, which the first wait begins (HostedAction), or with what is wrong with the request.
+  void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
 
  private:
   const std::shared_ptr<NSFileProviderExtension> principal_;

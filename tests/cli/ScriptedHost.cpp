@@ -110,6 +110,13 @@ void ScriptedHost::startProvidingItemWithIdentifier(const std::string &identifie
   completion(provide(url, readingOptions), url, NSError());
 }
 
+void ScriptedHost::performAction(const FPDActionRequest &request, FPDActionCompletion completion) {
+  requests.push_back(request);
+  if (const NSError error = FPDActionRequestError(request)) return completion(nullptr, error);
+  if (!act) return completion(nullptr, NSError(NSPOSIXErrorDomain, ENOSYS));
+  completion(act(request), NSError());
+}
+
 void ScriptedProviding::waitWithReply(NSFileProviderErrorCompletion completion) {
   std::optional<NSError> outcome;
   {

@@ -47,6 +47,8 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
   void movingItemAtURL(const NSURL &, const NSURL &, NSFileProviderMovingCompletion completion) override {
     completion(false, NSError(NSPOSIXErrorDomain, ENOSYS));
   }
+  // Done by `act`, as the extension would.
+  void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
 
   std::map<std::string, NSFileProviderItemFields> items;  // by identifier
   std::map<std::string, std::string> paths;               // to identifiers
@@ -55,6 +57,8 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
   std::map<std::string, NSError> pageErrors;              // by container: instead of the page after the last
   FPDStatus status;
   std::function<std::shared_ptr<FPDProviding>(const NSURL &url, std::uint64_t readingOptions)> provide;
+  std::function<std::shared_ptr<FPDAction>(const FPDActionRequest &request)> act;
+  std::vector<FPDActionRequest> requests;                                      // of actions
   std::function<void(const std::string &container, std::size_t page)> onPage;  // before it is answered
   std::shared_ptr<FPDWatchObserver> observer;
   bool firstPageWasByDate = false;
