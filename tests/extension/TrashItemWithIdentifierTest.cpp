@@ -8,8 +8,8 @@ namespace {
 class TrashItem : public ActionTest {
  protected:
   TrashItem() {
-    trashed = NSURL::fileURLWithPath(DroxaProcessHome().replica() + "/" + QVUbiquitousTrashContainerID +
-                                     "/Documents/a.txt");
+    trashed = NSURL::fileURLWithPath(DroxaProcessHome().replica() + "/" + QVUbiquitousTrashContainerID + "/" +
+                                     QVDocumentsFolderName(QVUbiquitousTrashContainerID) + "/a.txt");
     daemon.addDocument(trashed.path());
     clear();
   }

@@ -28,8 +28,9 @@ class UntrashItem : public ActionTest {
   }
   const std::string kFallback = "debug: [DEBUG] couldn't use putback url, fallback to default container";
 
-  const NSURL trash = NSURL::fileURLWithPath(DroxaProcessHome().replica() + "/" +
-                                             QVUbiquitousTrashContainerID + "/Documents");
+  const NSURL trash =
+      NSURL::fileURLWithPath(DroxaProcessHome().replica() + "/" + QVUbiquitousTrashContainerID + "/" +
+                             QVDocumentsFolderName(QVUbiquitousTrashContainerID));
   const NSURL trashed = trash.URLByAppendingPathComponent("old.txt");
   const std::string item = daemon.addDocument(trashed.path()).asString();
   const bool cleared = (clear(), true);

@@ -1,5 +1,6 @@
 #include "tests/support/RecordingURLOperations.h"
 
+#include <cerrno>
 #include <gtest/gtest.h>
 #include <utility>
 
@@ -37,27 +38,28 @@ class RecordingURLOperations::Operations final : public FPURLOperations {
     take("coordinatedDelete(" + url.path() + ")", url, handler);
   }
 
+  // It is in the log when everything else about it is known.
   void take(const std::string &call, const NSURL &url, FPURLCompletion completion) {
+    const std::function<void()> give = note(call, url, std::move(completion));
     log.add(call);
-    std::function<void()> give;
-    {
-      const Lock lock(mutex);
-      urls.push_back(url);
-      progress = NSProgress::currentProgress();
-      if (answers.empty()) {
-        ADD_FAILURE() << call << ": the test has no answer for it";
-        answers.emplace_back(NSURL(), NSError::errorWithPOSIXCode(ENOSYS));
-      }
-      give = [completion = std::move(completion), answer = answers.front()] {
-        completion(answer.first, answer.second);
-      };
-      answers.pop_front();
-      if (holds) {
-        held.push_back(std::move(give));
-        return;
-      }
+    if (give) give();
+  }
+  // What gives the answer; null when that is held.
+  std::function<void()> note(const std::string &call, const NSURL &url, FPURLCompletion completion) {
+    const Lock lock(mutex);
+    urls.push_back(url);
+    progress = NSProgress::currentProgress();
+    if (answers.empty()) {
+      ADD_FAILURE() << call << ": the test has no answer for it";
+      answers.emplace_back(NSURL(), NSError::errorWithPOSIXCode(ENOSYS));
     }
-    give();
+    std::function<void()> give = [completion = std::move(completion), answer = answers.front()] {
+      completion(answer.first, answer.second);
+    };
+    answers.pop_front();
+    if (!holds) return give;
+    held.push_back(std::move(give));
+    return nullptr;
   }
 
   CallLog log;
