@@ -143,6 +143,20 @@ void ScriptedProviding::end(const NSError &error) {
   if (completion) completion(error);
 }
 
+void ScriptedAction::waitWithReply(NSFileProviderItemCompletion completion) {
+  outcome_.wait(std::move(completion));
+}
+
+void ScriptedAction::cancel() {
+  wasCancelled_ = true;
+  if (onCancel) return onCancel();
+  end(nullptr, NSError(NSCocoaErrorDomain, NSUserCancelledError));
+}
+
+void ScriptedAction::end(const std::shared_ptr<const NSFileProviderItem> &item, const NSError &error) {
+  outcome_.end(item, error);
+}
+
 std::shared_ptr<FPDControlProtocol> ScriptedHostConnecting::control(NSXPCErrorHandler, NSError *error) {
   *error = failure;
   return failure ? nullptr : host_;
@@ -159,8 +173,9 @@ CommandFixture::CommandFixture() {
 
 CommandContext CommandFixture::context() {
   using namespace std::chrono_literals;
-  return {out,    err, std::make_shared<ControlClient>(connecting, 5s),
-          daemon, 5s,  [this](std::chrono::milliseconds) { return stop(); }};
+  return {out,       err, std::make_shared<ControlClient>(connecting, 5s),
+          daemon,    5s,  [this](std::chrono::milliseconds) { return stop(); },
+          isTerminal};
 }
 
 int CommandFixture::run(const std::function<int(CommandContext &)> &command) {

@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "cli/Commands.h"
+#include "platform/fileprovider/FPDActionOutcome.h"
 #include "platform/fileprovider/NSFileProviderError.h"
 #include "platform/foundation/ThreadSafety.h"
 #include "tessaly/QVDaemonConnection.h"
@@ -79,6 +80,25 @@ class ScriptedProviding final : public FPDProviding {
   NSFileProviderErrorCompletion waiting_ GUARDED_BY(lock_);
 };
 
+// An action that ends when the test says, or, once it was begun, as cancelled. Thread contract: any thread.
+class ScriptedAction final : public FPDAction {
+ public:
+  void waitWithReply(NSFileProviderItemCompletion completion) override;
+  void getProgress(FPDProgressCompletion completion) override { completion(completed, total); }
+  void cancel() override;
+  void end(const std::shared_ptr<const NSFileProviderItem> &item, const NSError &error = {});
+  void end(const NSFileProviderItemFields &fields) { end(std::make_shared<NSFileProviderPlainItem>(fields)); }
+  bool wasCancelled() const { return wasCancelled_; }
+
+  std::atomic<std::int64_t> completed{0};
+  std::atomic<std::int64_t> total{-1};
+  std::function<void()> onCancel;  // instead of ending as cancelled
+
+ private:
+  std::atomic<bool> wasCancelled_{false};
+  FPDActionOutcome outcome_;
+};
+
 class ScriptedHostConnecting final : public ControlConnecting {
  public:
   explicit ScriptedHostConnecting(std::shared_ptr<ScriptedHost> host) : host_(std::move(host)) {}
@@ -112,6 +132,7 @@ struct CommandFixture {
   std::ostringstream out;
   std::ostringstream err;
   std::function<bool()> stop = [] { return true; };
+  bool isTerminal = false;
 };
 
 NSFileProviderItemFields item(const std::string &identifier, const std::string &name,

@@ -169,6 +169,7 @@ void ScriptedExtension::movingItemAtURL(const NSURL &url, const NSURL &destinati
 
 void ScriptedExtension::performAction(const FPDActionRequest &request, FPDActionCompletion completion) {
   asked.put(FPDActionName(request.kind) + " " + request.identifier);
+  requests.push_back(request);
   if (failure) return completion(nullptr, failure);
   auto action = std::make_shared<ScriptedAction>();
   actions.push_back(action);

@@ -204,6 +204,7 @@ class ScriptedExtension final : public NSFileProviderExtensionProtocol {
   Arrivals<std::string> opened;
   std::vector<std::shared_ptr<ScriptedProviding>> providings;  // handed out, in order
   std::vector<std::shared_ptr<ScriptedAction>> actions;        // handed out, in order
+  std::vector<FPDActionRequest> requests;                      // of actions
   std::deque<NSError> openFailures;                            // answers of the next enumerator requests
 };
 
