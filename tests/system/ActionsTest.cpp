@@ -250,14 +250,17 @@ TEST_F(Actions, anActionOutlivesAnExtensionThatDiesBeforeItBegan) {
   EXPECT_FALSE(has("a.txt"));
 }
 
-TEST_F(Actions, withoutTheDaemonTheReasonIsSaid) {
+TEST_F(Actions, withoutTheDaemonNothingIsChangedAndTheReasonIsSaid) {
   startWith({"a.txt"});
   drive.keld().signal(SIGKILL);
   (void)drive.keld().wait();
-  const Result result = drive.droxa({"mkdir", "new"});
-  EXPECT_NE(result.status, 0);
-  EXPECT_FALSE(result.errors.empty());
-  EXPECT_FALSE(fs::exists(inside("new")));
+  for (const std::vector<std::string> &words :
+       {std::vector<std::string>{"rename", "a.txt", "b.txt"}, {"trash", "a.txt"}, {"rm", "a.txt"}}) {
+    const Result result = drive.droxa(words);
+    EXPECT_NE(result.status, 0);
+    EXPECT_NE(result.errors.find("droxa: a.txt: "), std::string::npos) << result.errors;
+  }
+  EXPECT_EQ(readFile(inside("a.txt")), "of a.txt");
 }
 
 }  // namespace
