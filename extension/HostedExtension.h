@@ -11,8 +11,8 @@ namespace droxa {
 // The principal object as the host sees it: each request is one of the principal's operations.
 // Thread contract: any thread, several requests at a time. A request blocks its caller, which is the
 // connection's pool, while the principal waits for the daemon; its completion is called exactly once, before
-// the request returns (those of the last two, when the principal answers). What is being provided goes on
-// after that, without a thread.
+// the request returns (those of placeholders and moves, when the principal answers). What is being provided
+// goes on after that, without a thread.
 class HostedExtension final : public NSFileProviderExtensionProtocol {
  public:
   explicit HostedExtension(std::shared_ptr<NSFileProviderExtension> principal);

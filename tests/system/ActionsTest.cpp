@@ -76,6 +76,23 @@ TEST_F(Actions, anImportCopiesDocumentsAndFoldersAndOverwritesNothing) {
   expectRefused({"import", outside("one.bin"), "nowhere"}, 66, "nowhere: there is no such item");
 }
 
+// Ctrl-C may come too late; what is there then is the whole of it.
+TEST_F(Actions, anImportThatIsStoppedLeavesNothingHalfDone) {
+  startWith({});
+  writeFile(outside("big"), std::string(150'000'000, 'b'));
+  const auto import = drive.droxaInBackground({"import", outside("big"), "/"}, "import");
+  (void)eventually([&] { return fs::exists(inside("big")) || !import->output().empty(); }, 2s);
+  import->signal(SIGINT);
+  const auto status = import->wait(60s);
+  ASSERT_TRUE(status == 130 || status == 0) << import->errors();
+  const bool wasStopped = import->errors().find("nothing was changed") != std::string::npos;
+  EXPECT_EQ(has("big"), !wasStopped) << import->errors();
+  if (!wasStopped) EXPECT_EQ(fs::file_size(inside("big")), 150'000'000U);
+  const auto documents = fs::directory_iterator(drive.documents());
+  EXPECT_EQ(std::distance(begin(documents), end(documents)), wasStopped ? 0 : 1) << "no hidden rest";
+  expectDone({"import", outside("big"), "Documents"});
+}
+
 TEST_F(Actions, foldersAreMadeWithTheirParents) {
   startWith({"a.txt"});
   expectDone({"mkdir", "new"});
