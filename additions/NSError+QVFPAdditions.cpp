@@ -57,4 +57,8 @@ NSError qv_fileProviderError(const NSError &error) {
   return NSError(NSFileProviderErrorDomain, code, NSUserInfo{{NSUnderlyingErrorKey, error}});
 }
 
+NSError qv_errorWithPOSIXCode(int code, const std::string &description) {
+  return NSError::errorWithPOSIXCode(code, description);
+}
+
 }  // namespace droxa

@@ -1,5 +1,7 @@
 #pragma once
 
+#include <string>
+
 #include "platform/foundation/NSError.h"
 
 // Translation of daemon and Foundation errors into errors that the framework understands. A nil receiver
@@ -15,5 +17,8 @@ bool _qv_getFileProviderDomainErrorCode(const NSError &error,
 // The file-provider error that stands for `error`, with `error` as its underlying error; the very same error
 // when it has no translation.
 NSError qv_fileProviderError(const NSError &error);
+
+// An error of NSPOSIXErrorDomain that describes itself so.
+NSError qv_errorWithPOSIXCode(int code, const std::string &description);
 
 }  // namespace droxa

@@ -6,6 +6,7 @@
 #include <signal.h>
 #include <unistd.h>
 
+#include "cli/ActionCommands.h"
 #include "cli/Commands.h"
 #include "cli/ContentsCommands.h"
 #include "cli/ExitStatus.h"
@@ -23,8 +24,8 @@ constexpr char kFooter[] =
     "(\"\\n\", \"\\xff\", \"\\\\\"); `ls -0` prints them raw, each ended by a NUL byte.\n"
     "Exit status: 0 done, 1 failed or refused, 2 wrong usage, 66 no such item, 69 a part of the system\n"
     "doesn't run, 73 the disk or the cloud is full, 74 the disk failed, 75 no answer in time or the cloud\n"
-    "can't be reached, 77 nobody is signed in or it may not be read, 78 the home's drive is in another "
-    "cloud,\n"
+    "can't be reached, 77 nobody is signed in or it may not be read or changed, 78 the home's drive is in "
+    "another cloud,\n"
     "130 Ctrl-C.";
 
 // What the words of the command line mean.
@@ -46,7 +47,8 @@ class CommandLine {
  public:
   explicit CommandLine(Words &words)
       : words_(words),
-        app_("Shows a Droxa drive: its items, their contents and changes, and what serves it.", "droxa") {
+        app_("Shows and changes a Droxa drive: its items, their contents and changes, and what serves it.",
+             "droxa") {
     app_.require_subcommand(1);
     app_.fallthrough();
     app_.footer(kFooter);
@@ -59,11 +61,13 @@ class CommandLine {
     addLs();
     addItemCommands();
     contents_.emplace(app_);
+    actions_.emplace(app_);
     addSystemCommands();
   }
 
   CLI::App &app() { return app_; }
   const ContentsCommands &contents() const { return *contents_; }
+  const ActionCommands &actions() const { return *actions_; }
   bool has(const char *command) const { return app_.got_subcommand(command); }
   bool hasAccount(const char *command) const { return account_->got_subcommand(command); }
   bool hasDepth() const { return depth_->count() > 0; }
@@ -163,6 +167,7 @@ class CommandLine {
   Words &words_;
   CLI::App app_;
   std::optional<ContentsCommands> contents_;
+  std::optional<ActionCommands> actions_;
   CLI::App *account_ = nullptr;
   CLI::Option *depth_ = nullptr;
 };
@@ -207,9 +212,11 @@ int runCommand(const CommandLine &line, const Words &words, std::ostream &out, s
     return runTree(context, options);
   }
   // Before there are threads that could take the signal.
-  if (line.has("watch") || line.contents().canBeStopped()) waitForStopSignal(std::chrono::milliseconds(0));
+  if (line.has("watch") || line.contents().canBeStopped() || line.actions().canBeStopped())
+    waitForStopSignal(std::chrono::milliseconds(0));
   if (line.has("watch")) return runWatch(context, words.argument, words.json);
   if (line.contents().isChosen()) return line.contents().run(context);
+  if (line.actions().isChosen()) return line.actions().run(context);
   if (line.has("status"))
     return words.items.empty() ? runStatus(context, words.json)
                                : runItemStatus(context, words.items, words.json);

@@ -77,6 +77,15 @@ CallResult<ControlClient::Provided> ControlClient::startProviding(const std::str
   });
 }
 
+CallResult<std::shared_ptr<FPDAction>> ControlClient::performAction(const FPDActionRequest &request) {
+  using Action = std::shared_ptr<FPDAction>;
+  return ask<Action>(*connecting_, timeout_, [&](FPDControlProtocol &control, auto slot) {
+    control.performAction(request, [slot](const Action &action, const NSError &error) {
+      slot->put({action, error});
+    });
+  });
+}
+
 CallResult<ControlClient::Page> ControlClient::page(const Enumerator &enumerator, const NSData &page) {
   auto slot = std::make_shared<AnswerSlot<Page>>();
   enumerator->enumerateItems(

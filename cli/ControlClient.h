@@ -42,6 +42,9 @@ class ControlClient {
 
   CallResult<Provided> startProviding(const std::string &identifier, std::uint64_t readingOptions);
 
+  // An action that hasn't begun: it does when it is waited for (cli/Acting.h).
+  CallResult<std::shared_ptr<FPDAction>> performAction(const FPDActionRequest &request);
+
   CallResult<Page> page(const Enumerator &enumerator, const NSData &page);
   CallResult<NSData> anchor(const Enumerator &enumerator);
   CallResult<Changes> changes(const Enumerator &enumerator, const NSData &anchor);

@@ -7,39 +7,24 @@
 
 namespace droxa {
 
-namespace {
-
-constexpr std::chrono::seconds kBetweenLines{1};
-constexpr int kBarWidth = 30;
-
-}  // namespace
-
 DownloadProgress::DownloadProgress(CommandContext &context, const ContentsArgument &contents,
                                    const QVContentsStatus &before, bool json)
-    : context_(context), contents_(contents), wanted_(before.dataless), json_(json) {}
+    : context_(context),
+      contents_(contents),
+      wanted_(before.dataless),
+      json_(json),
+      line_(context, contents.argument) {}
 
 void DownloadProgress::show(const QVContentsStatus &status) {
   if (json_) {
     context_.out << contentsJSON(contents_, status, "downloading") << std::endl;
-    return;
+  } else {
+    line_.show(share(status), text(status));
   }
-  if (context_.isTerminal) {
-    const int full = static_cast<int>(share(status) * kBarWidth);
-    context_.out << "\r[" << std::string(static_cast<std::size_t>(full), '#')
-                 << std::string(static_cast<std::size_t>(kBarWidth - full), '.') << "] " << text(status)
-                 << "\033[K" << std::flush;
-    isBarShown_ = true;
-    return;
-  }
-  const auto now = std::chrono::steady_clock::now();
-  if (now < nextLine_) return;
-  nextLine_ = now + kBetweenLines;
-  context_.out << escapedText(contents_.argument) << ": " << text(status) << std::endl;
 }
 
 void DownloadProgress::clear() {
-  if (isBarShown_) context_.out << "\r\033[K" << std::flush;
-  isBarShown_ = false;
+  line_.clear();
 }
 
 std::string DownloadProgress::text(const QVContentsStatus &status) const {

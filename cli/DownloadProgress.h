@@ -1,9 +1,9 @@
 #pragma once
 
-#include <chrono>
 #include <cstdint>
 
 #include "cli/ContentsArgument.h"
+#include "cli/ProgressLine.h"
 
 namespace droxa {
 
@@ -25,8 +25,7 @@ class DownloadProgress {
   const ContentsArgument &contents_;
   const std::uint64_t wanted_;  // documents
   const bool json_;
-  bool isBarShown_ = false;
-  std::chrono::steady_clock::time_point nextLine_;
+  ProgressLine line_;
 };
 
 }  // namespace droxa

@@ -4,6 +4,7 @@
 #include <cstring>
 #include <sysexits.h>
 
+#include "cli/Text.h"
 #include "platform/fileprovider/NSFileProviderError.h"
 #include "platform/xpc/NSXPCConnection.h"
 #include "tessaly/QVErrors.h"
@@ -20,6 +21,8 @@ enum class Meaning {
   noSuchItem,
   notSignedIn,
   unreadable,
+  unwritable,
+  nameIsTaken,
   partIsAway,
   noAnswer,
   cloudIsAway,
@@ -44,6 +47,7 @@ struct Known {
 constexpr Known kKnown[] = {
     {NSFileProviderErrorDomain, NSFileProviderErrorNoSuchItem, Meaning::noSuchItem},
     {NSFileProviderErrorDomain, NSFileProviderErrorNotAuthenticated, Meaning::notSignedIn},
+    {NSFileProviderErrorDomain, NSFileProviderErrorFilenameCollision, Meaning::nameIsTaken},
     {NSFileProviderErrorDomain, NSFileProviderErrorInsufficientQuota, Meaning::cloudIsFull},
     {NSFileProviderErrorDomain, NSFileProviderErrorServerUnreachable, Meaning::partIsAway},
     {QVTessalyErrorDomain, QVErrorNoSuchItem, Meaning::noSuchItem},
@@ -58,6 +62,12 @@ constexpr Known kKnown[] = {
     {NSCocoaErrorDomain, kCloudIsFull, Meaning::cloudIsFull},
     {NSCocoaErrorDomain, kCloudIsAway, Meaning::cloudIsAway},
     {NSCocoaErrorDomain, NSUserCancelledError, Meaning::cancelled},
+    {NSCocoaErrorDomain, NSFileNoSuchFileError, Meaning::noSuchItem},
+    {NSCocoaErrorDomain, NSFileReadNoSuchFileError, Meaning::noSuchItem},
+    {NSCocoaErrorDomain, NSFileWriteNoPermissionError, Meaning::unwritable},
+    {NSCocoaErrorDomain, NSFileWriteFileExistsError, Meaning::nameIsTaken},
+    {NSCocoaErrorDomain, NSFileWriteOutOfSpaceError, Meaning::diskIsFull},
+    {NSCocoaErrorDomain, NSFileWriteVolumeReadOnlyError, Meaning::diskIsReadOnly},
     {NSCocoaErrorDomain, NSXPCConnectionInterrupted, Meaning::partIsAway},
     {NSCocoaErrorDomain, NSXPCConnectionInvalid, Meaning::partIsAway},
     {NSCocoaErrorDomain, NSXPCConnectionReplyInvalid, Meaning::noAnswer},
@@ -86,6 +96,19 @@ std::string words(const NSError &error) {
                                                                          : error.localizedDescription();
 }
 
+// " (a.txt, d12)", when the error tells.
+std::string collidingItem(const NSError &error) {
+  const auto found = error.userInfo().find(NSFileProviderErrorCollidingItemKey);
+  if (found == error.userInfo().end()) {
+    const NSURL url = fp_collidingURL(error);
+    return url ? " (" + escapedText(url.path()) + ")" : std::string();
+  }
+  const auto *object = std::get_if<std::shared_ptr<const NSObject>>(&found->second);
+  const auto *item = object ? dynamic_cast<const NSFileProviderItem *>(object->get()) : nullptr;
+  return item ? " (" + escapedText(item->fields().filename) + ", " + item->itemIdentifier() + ")"
+              : std::string();
+}
+
 }  // namespace
 
 int exitStatusForError(const NSError &error) {
@@ -94,6 +117,7 @@ int exitStatusForError(const NSError &error) {
       return EX_NOINPUT;
     case Meaning::notSignedIn:
     case Meaning::unreadable:
+    case Meaning::unwritable:
       return EX_NOPERM;
     case Meaning::partIsAway:
       return EX_UNAVAILABLE;
@@ -120,6 +144,10 @@ std::string explanationOfError(const NSError &error) {
       return "nobody is signed in; `droxa account sign-in NAME` signs somebody in";
     case Meaning::unreadable:
       return "it can't be read: " + error.localizedDescription();
+    case Meaning::unwritable:
+      return "it may not be changed: " + words(error);
+    case Meaning::nameIsTaken:
+      return "something has that name already" + collidingItem(error) + "; choose another name";
     case Meaning::partIsAway:
       return words(error) + "; `droxa status` shows what runs, `droxa run` starts it";
     case Meaning::noAnswer:

@@ -62,6 +62,8 @@ Json itemObject(const NSFileProviderItemFields &item) {
   json["favoriteRank"] = item.favoriteRank;
   json["tags"] =
       base64Text({reinterpret_cast<const char *>(item.tagData.bytes().data()), item.tagData.length()});
+  json["tagNames"] = Json::array();
+  for (const FPTag &tag : FPGetTagsFromTagsData(item.tagData)) json["tagNames"].push_back(tag.label);
   json["trashed"] = item.isTrashed;
   json["excludedFromSync"] = item.isExcludedFromSync;
   json["downloaded"] = item.isDownloaded;
@@ -89,6 +91,14 @@ std::string flagsText(const NSFileProviderItemFields &item) {
   return text.empty() ? "none" : text;
 }
 
+std::string tagsText(const NSFileProviderItemFields &item) {
+  std::string text;
+  for (const FPTag &tag : FPGetTagsFromTagsData(item.tagData)) {
+    text += (text.empty() ? "" : ", ") + tagText(tag);
+  }
+  return text.empty() ? "none" : text;
+}
+
 const char *changeWord(FPDChange::Kind kind) {
   switch (kind) {
     case FPDChange::Kind::added:
@@ -106,6 +116,14 @@ const char *changeWord(FPDChange::Kind kind) {
 }
 
 }  // namespace
+
+std::string tagText(const FPTag &tag) {
+  static constexpr std::array<const char *, 8> kColors{"",     "grey",   "green", "purple",
+                                                       "blue", "yellow", "red",   "orange"};
+  const std::string label = escapedText(tag.label);
+  const bool hasColor = tag.color != 0 && tag.color < kColors.size();
+  return hasColor ? label + " (" + kColors.at(tag.color) + ")" : label;
+}
 
 std::string kindText(NSFileProviderItemKind kind) {
   switch (kind) {
@@ -137,8 +155,9 @@ std::string propertyLines(const NSFileProviderItemFields &item) {
          line("type:", escapedText(item.typeIdentifier)) + line("size:", std::to_string(item.documentSize)) +
          line("permissions:", modeText(item)) + line("created:", dateText(item.creationDate)) +
          line("modified:", dateText(item.contentModificationDate)) +
-         line("last used:", dateText(item.lastUsedDate)) + line("rank:", std::to_string(item.changeRank)) +
-         line("state:", flagsText(item));
+         line("last used:", dateText(item.lastUsedDate)) + line("tags:", tagsText(item)) +
+         line("favourite:", item.favoriteRank == 0 ? "no" : std::to_string(item.favoriteRank)) +
+         line("rank:", std::to_string(item.changeRank)) + line("state:", flagsText(item));
 }
 
 std::string itemJSON(const NSFileProviderItemFields &item) {

@@ -2,6 +2,7 @@
 
 #include <string>
 
+#include "platform/fileprovider/FPTags.h"
 #include "platform/fileprovider/NSFileProviderRemote.h"
 
 namespace droxa {
@@ -19,6 +20,9 @@ std::string treeJSON(const NSFileProviderItemFields &item, const std::string &pa
 // One line of `droxa watch`: "+ name", "~ name", "> old -> new", "- name", "* listed anew".
 std::string changeLine(const FPDChange &change);
 std::string changeJSON(const FPDChange &change);
+
+// "work", "work (red)".
+std::string tagText(const FPTag &tag);
 
 std::string kindText(NSFileProviderItemKind kind);
 

@@ -2,6 +2,7 @@
 
 #include <utility>
 
+#include "extension/HostedAction.h"
 #include "extension/HostedEnumerator.h"
 #include "extension/HostedProviding.h"
 #include "platform/fileprovider/NSFileProviderError.h"
@@ -66,6 +67,11 @@ void HostedExtension::providePlaceholderAtURL(const NSURL &url, NSFileProviderEr
 void HostedExtension::movingItemAtURL(const NSURL &url, const NSURL &destination,
                                       NSFileProviderMovingCompletion completion) {
   principal_->movingItemAtURL_requiresProvidingWithDestinationURL(url, destination, std::move(completion));
+}
+
+void HostedExtension::performAction(const FPDActionRequest &request, FPDActionCompletion completion) {
+  if (const NSError error = FPDActionRequestError(request)) return completion(nullptr, error);
+  completion(std::make_shared<HostedAction>(principal_, request), {});
 }
 
 }  // namespace droxa

@@ -11,8 +11,8 @@ namespace droxa {
 // The principal object as the host sees it: each request is one of the principal's operations.
 // Thread contract: any thread, several requests at a time. A request blocks its caller, which is the
 // connection's pool, while the principal waits for the daemon; its completion is called exactly once, before
-// the request returns (those of the last two, when the principal answers). What is being provided goes on
-// after that, without a thread.
+// the request returns (those of placeholders and moves, when the principal answers). What is being provided
+// goes on after that, without a thread.
 class HostedExtension final : public NSFileProviderExtensionProtocol {
  public:
   explicit HostedExtension(std::shared_ptr<NSFileProviderExtension> principal);
@@ -32,6 +32,8 @@ class HostedExtension final : public NSFileProviderExtensionProtocol {
   void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
   void movingItemAtURL(const NSURL &url, const NSURL &destination,
                        NSFileProviderMovingCompletion completion) override;
+  // With an action, which the first wait begins (HostedAction), or with what is wrong with the request.
+  void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
 
  private:
   const std::shared_ptr<NSFileProviderExtension> principal_;

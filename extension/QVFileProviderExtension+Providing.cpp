@@ -63,8 +63,7 @@ void QVFileProviderExtension::downloadItemAtURL(const NSURL &url, std::uint64_t 
   const std::string &path = url.path();
   const auto operation = QVFileProvidingOperation::initWithURL(url, readingOptions);
   operation->setFileProvidingCompletion(
-      [extension = std::static_pointer_cast<QVFileProviderExtension>(shared_from_this()), path, section,
-       completion = std::move(completion)](const NSError &error) {
+      [extension = self(), path, section, completion = std::move(completion)](const NSError &error) {
         extension->downloadEnded(path, section, error, completion);
       });
   {

@@ -15,6 +15,7 @@
 #include "tessaly/QVLog.h"
 #include "tessaly/QVNotifications.h"
 #include "tessaly/QVPersona.h"
+#include "tessaly/QVQueryItem.h"
 #include "tessaly/QVUbiquitousItems.h"
 
 namespace droxa {
@@ -81,6 +82,18 @@ QVFileProviderExtension::QVFileProviderExtension(Passkey)
 
 QVFileProviderExtension::~QVFileProviderExtension() {
   NSNotificationCenter::defaultCenter().removeObserver(this, QVAccountTokenDidChangeNotification);
+}
+
+std::shared_ptr<QVFileProviderExtension> QVFileProviderExtension::self() {
+  return std::static_pointer_cast<QVFileProviderExtension>(shared_from_this());
+}
+
+// How most actions end: with the item as the daemon sees it when it looks at the file now.
+void QVFileProviderExtension::completeWithNewItem(const NSURL &url,
+                                                  const NSFileProviderItemCompletion &completion) const {
+  NSError error;
+  const auto item = _propertiesForNewItemAtURL(url, &error);
+  completion(item, error);
 }
 
 bool QVFileProviderExtension::_isLoggedInOrError(NSError *error) const {

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "platform/dispatch/dispatch.h"
+#include "platform/fileprovider/FPURLOperations.h"
 #include "platform/fileprovider/NSFileProviderExtension.h"
 #include "platform/foundation/NSFileHandle.h"
 #include "platform/foundation/NSOperationQueue.h"
@@ -85,6 +86,40 @@ class QVFileProviderExtension final : public NSFileProviderExtension {
   void movingItemAtURL_requiresProvidingWithDestinationURL(
       const NSURL &url, const NSURL &destination, NSFileProviderMovingCompletion completion) override;
 
+  // Something new. An import completes with neither item nor error when it was done and the new item can't be
+  // described.
+  void importDocumentAtURL(const NSURL &url, const std::string &parentItemIdentifier,
+                           NSFileProviderItemCompletion completion) override;
+  void createDirectoryWithName(const std::string &name, const std::string &parentItemIdentifier,
+                               NSFileProviderItemCompletion completion) override;
+
+  // Another name or place. The contents that a move needs are brought here first; a failure of that is told
+  // as it stands.
+  void renameItemWithIdentifier(const std::string &identifier, const std::string &name,
+                                NSFileProviderItemCompletion completion) override;
+  void reparentItemWithIdentifier(const std::string &identifier, const std::string &parentIdentifier,
+                                  const std::optional<std::string> &newName,
+                                  NSFileProviderItemCompletion completion) override;
+
+  // Into the trash, out of it (to the parent; to where it was; to its container's documents folder: the first
+  // that there is), and away for good. What trashing meets is told as it stands.
+  void trashItemWithIdentifier(const std::string &identifier,
+                               NSFileProviderItemCompletion completion) override;
+  void untrashItemWithIdentifier(const std::string &identifier,
+                                 const std::optional<std::string> &parentIdentifier,
+                                 NSFileProviderItemCompletion completion) override;
+  void deleteItemWithIdentifier(const std::string &identifier,
+                                NSFileProviderErrorCompletion completion) override;
+  void _trashItemAtURLWithoutCoordination(const NSURL &url, FPURLCompletion completion) const;
+
+  // What a user notes about an item. Each completes before it returns.
+  void setLastUsedDate(const NSDate &date, const std::string &identifier,
+                       NSFileProviderItemCompletion completion) override;
+  void setTagData(const NSData &tagData, const std::string &identifier,
+                  NSFileProviderItemCompletion completion) override;
+  void setFavoriteRank(const std::optional<std::uint64_t> &rank, const std::string &identifier,
+                       NSFileProviderItemCompletion completion) override;
+
   // From the beginning to the end, a move needs the contents of the item, or of what is below it.
   void _beginForcedDownload(const std::string &identifier);
   void _endForcedDownload(const std::string &identifier);
@@ -103,6 +138,16 @@ class QVFileProviderExtension final : public NSFileProviderExtension {
                      const NSFileProviderErrorCompletion &completion);
   bool isDownloadForced(const NSURL &url);
   std::shared_ptr<NSOperation> downloadAtPath(const std::string &path);
+
+  struct Move;
+  std::shared_ptr<QVFileProviderExtension> self();
+  void completeWithNewItem(const NSURL &url, const NSFileProviderItemCompletion &completion) const;
+  void documentWasImported(const NSURL &newURL, const NSError &error,
+                           const NSFileProviderItemCompletion &completion) const;
+  void itemWasUntrashed(const NSURL &folder, const NSURL &newURL, const NSError &error,
+                        const NSFileProviderItemCompletion &completion) const;
+  void performMove(const std::shared_ptr<Move> &move);
+  void moveAfterDownload(const std::shared_ptr<Move> &move);
 
   RecursiveMutex _lock;                    // the instance's own monitor
   mutable Mutex _itemsForcedDownloadLock;  // never held together with the monitor

@@ -179,4 +179,15 @@ void ExtensionCalls::movingItemAtURL(const NSURL &url, const NSURL &destination,
       ->attempt(1);
 }
 
+void ExtensionCalls::performAction(const FPDActionRequest &request, FPDActionCompletion completion) {
+  using ActionCall = Call<std::shared_ptr<FPDAction>, NSError>;
+  std::make_shared<ActionCall>(
+      connecting_,
+      [request](NSFileProviderExtensionProtocol &extension, ActionCall::Reply reply) {
+        extension.performAction(request, std::move(reply));
+      },
+      completion, [completion](const NSError &error) { completion(nullptr, error); })
+      ->attempt(1);
+}
+
 }  // namespace droxa

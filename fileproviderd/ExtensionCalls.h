@@ -35,6 +35,9 @@ class ExtensionCalls {
   void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion);
   void movingItemAtURL(const NSURL &url, const NSURL &destination, NSFileProviderMovingCompletion completion);
 
+  // The action hasn't begun; it ends with the extension that gave it.
+  void performAction(const FPDActionRequest &request, FPDActionCompletion completion);
+
   // What to tell when the extension's end cut off what `error` says.
   NSError cutOffError(const NSError &error) const;
 

@@ -23,6 +23,7 @@ ControlService::ControlService(std::shared_ptr<ExtensionCalls> calls,
       listings_(std::move(listings)),
       paths_(std::make_shared<PathResolver>(calls_, std::move(replica))),
       providings_(std::make_shared<Providings>(calls_)),
+      actions_(calls_, followed_, listings_),
       status_(std::move(status)) {}
 
 void ControlService::getStatus(FPDStatusCompletion completion) {
@@ -110,6 +111,10 @@ void ControlService::stopProvidingItemAtURL(const NSURL &url, NSFileProviderErro
 void ControlService::movingItemAtURL(const NSURL &url, const NSURL &destination,
                                      NSFileProviderMovingCompletion completion) {
   calls_->movingItemAtURL(url, destination, std::move(completion));
+}
+
+void ControlService::performAction(const FPDActionRequest &request, FPDActionCompletion completion) {
+  actions_.perform(request, completion);
 }
 
 }  // namespace droxa

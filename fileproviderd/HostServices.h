@@ -5,6 +5,7 @@
 #include <memory>
 #include <string>
 
+#include "fileproviderd/Actions.h"
 #include "fileproviderd/FollowedContainers.h"
 #include "fileproviderd/OpenListings.h"
 #include "fileproviderd/PathResolver.h"
@@ -54,6 +55,7 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   void stopProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
   void movingItemAtURL(const NSURL &url, const NSURL &destination,
                        NSFileProviderMovingCompletion completion) override;
+  void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
 
  private:
   const std::shared_ptr<ExtensionCalls> calls_;
@@ -61,6 +63,7 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   const std::shared_ptr<OpenListings> listings_;
   const std::shared_ptr<PathResolver> paths_;
   const std::shared_ptr<Providings> providings_;
+  const Actions actions_;
   const StatusSource status_;
 };
 

@@ -21,4 +21,14 @@ void OpenListings::signal(const std::string &identifier) {
   for (const auto &enumerator : told) enumerator->containerWasSignalled();
 }
 
+void OpenListings::signalAll() {
+  std::vector<std::shared_ptr<RelayedEnumerator>> told;
+  {
+    Lock held(lock_);
+    for (const auto &[identifier, weak] : enumerators_)
+      if (auto enumerator = weak.lock()) told.push_back(std::move(enumerator));
+  }
+  for (const auto &enumerator : told) enumerator->containerWasSignalled();
+}
+
 }  // namespace droxa

@@ -15,6 +15,7 @@ class OpenListings {
  public:
   void add(const std::string &identifier, const std::shared_ptr<RelayedEnumerator> &enumerator);
   void signal(const std::string &identifier);
+  void signalAll();
 
  private:
   mutable Mutex lock_;

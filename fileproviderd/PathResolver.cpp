@@ -11,6 +11,9 @@ namespace droxa {
 
 namespace {
 
+// The documents folder of the trash, which is laid out as file managers lay one out.
+constexpr char kTrashDocuments[] = "files";
+
 // What a call gave, waited for on the calling thread.
 template <class Value>
 struct Answer {
@@ -136,9 +139,13 @@ std::optional<PathResolver::Place> PathResolver::containerNamed(const NSURL &roo
       Lock held(lock_);
       known = containers_.contains(folder);
     }
-    const NSURL url = NSURL::fileURLWithPath(replica_ + "/" + folder + "/" + documents);
-    if (!known && url != root) rememberContainer(folder, url, error);
-    if (*error) return std::nullopt;
+    for (const std::string &child : {documents, std::string(kTrashDocuments)}) {
+      const NSURL url = NSURL::fileURLWithPath(replica_ + "/" + folder + "/" + child);
+      if (!known && url != root && std::filesystem::exists(url.path(), problem)) {
+        rememberContainer(folder, url, error);
+      }
+      if (*error) return std::nullopt;
+    }
   }
   Lock held(lock_);
   std::erase_if(containers_, [&](const auto &entry) { return !present.contains(entry.first); });

@@ -7,12 +7,16 @@
 #include <string>
 
 #include "platform/fileprovider/NSFileProviderEnumerating.h"
+#include "platform/foundation/NSData.h"
+#include "platform/foundation/NSDate.h"
 #include "platform/foundation/NSError.h"
 #include "platform/foundation/NSObject.h"
 #include "platform/foundation/NSURL.h"
 
 namespace droxa {
 
+using NSFileProviderItemCompletion =
+    std::function<void(const std::shared_ptr<const NSFileProviderItem> &item, const NSError &error)>;
 using NSFileProviderErrorCompletion = std::function<void(const NSError &error)>;
 using NSFileProviderMovingCompletion = std::function<void(bool requiresProviding, const NSError &error)>;
 
@@ -51,6 +55,36 @@ class NSFileProviderExtension : public NSObject,
   // Whether the move needs the contents first.
   virtual void movingItemAtURL_requiresProvidingWithDestinationURL(
       const NSURL &url, const NSURL &destination, NSFileProviderMovingCompletion completion) = 0;
+
+  // Changes. Each completes with the item as it is now, or with an error. What can take long reports to the
+  // progress that is current on the calling thread, and stops when that is cancelled.
+  //
+  // Copies a document that is elsewhere into a folder.
+  virtual void importDocumentAtURL(const NSURL &url, const std::string &parentItemIdentifier,
+                                   NSFileProviderItemCompletion completion) = 0;
+  virtual void createDirectoryWithName(const std::string &name, const std::string &parentItemIdentifier,
+                                       NSFileProviderItemCompletion completion) = 0;
+  virtual void renameItemWithIdentifier(const std::string &identifier, const std::string &name,
+                                        NSFileProviderItemCompletion completion) = 0;
+  // Without a new name it keeps its own.
+  virtual void reparentItemWithIdentifier(const std::string &identifier, const std::string &parentIdentifier,
+                                          const std::optional<std::string> &newName,
+                                          NSFileProviderItemCompletion completion) = 0;
+  virtual void trashItemWithIdentifier(const std::string &identifier,
+                                       NSFileProviderItemCompletion completion) = 0;
+  // Without a parent: to where it was before it was trashed.
+  virtual void untrashItemWithIdentifier(const std::string &identifier,
+                                         const std::optional<std::string> &parentIdentifier,
+                                         NSFileProviderItemCompletion completion) = 0;
+  virtual void deleteItemWithIdentifier(const std::string &identifier,
+                                        NSFileProviderErrorCompletion completion) = 0;
+  // nil, or no rank, removes what was set.
+  virtual void setLastUsedDate(const NSDate &date, const std::string &identifier,
+                               NSFileProviderItemCompletion completion) = 0;
+  virtual void setTagData(const NSData &tagData, const std::string &identifier,
+                          NSFileProviderItemCompletion completion) = 0;
+  virtual void setFavoriteRank(const std::optional<std::uint64_t> &rank, const std::string &identifier,
+                               NSFileProviderItemCompletion completion) = 0;
 };
 
 }  // namespace droxa

@@ -7,6 +7,7 @@
 #include <string>
 #include <vector>
 
+#include "platform/fileprovider/FPDActionRequest.h"
 #include "platform/fileprovider/NSFileProviderItem.h"
 #include "platform/foundation/NSData.h"
 #include "platform/foundation/NSError.h"
@@ -63,6 +64,30 @@ using FPDProvidingCompletion =
 using FPDItemProvidingCompletion = std::function<void(const std::shared_ptr<FPDProviding> &providing,
                                                       const NSURL &url, const NSError &error)>;
 
+// Units of the work's own choice, bytes where contents are moved; a total of -1: not known yet.
+using FPDProgressCompletion = std::function<void(std::int64_t completed, std::int64_t total)>;
+
+// A change that somebody wants made to an item. It begins when it is first waited for, so that one which
+// nobody received was never made. Cancelling it, or releasing the last reference before it has ended, stops
+// what can be stopped; whether it was too late, only the reply tells. A received one makes proxies
+// (NSXPCProxyWithErrorHandler).
+class FPDAction {
+ public:
+  virtual ~FPDAction() = default;
+  // Replies when it has ended, with the item as it is now. Neither item nor error: it was done, and nobody
+  // can tell what the item is (an import), or there is none any more (a deletion).
+  virtual void waitWithReply(NSFileProviderItemCompletion completion) = 0;
+  // 0 of -1 while nothing is known.
+  virtual void getProgress(FPDProgressCompletion completion) = 0;
+  // Ends it with NSUserCancelledError (NSCocoaErrorDomain), unless it was too late.
+  virtual void cancel() = 0;
+};
+
+// Without an action there is an error: what FPDActionRequestError says of the request, or why the extension
+// can't be reached.
+using FPDActionCompletion =
+    std::function<void(const std::shared_ptr<FPDAction> &action, const NSError &error)>;
+
 // What the extension's process exports to the host.
 class NSFileProviderExtensionProtocol {
  public:
@@ -83,6 +108,8 @@ class NSFileProviderExtensionProtocol {
   virtual void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) = 0;
   virtual void movingItemAtURL(const NSURL &url, const NSURL &destination,
                                NSFileProviderMovingCompletion completion) = 0;
+
+  virtual void performAction(const FPDActionRequest &request, FPDActionCompletion completion) = 0;
 };
 
 // What the host exports to the extension's process.
@@ -160,6 +187,10 @@ class FPDControlProtocol {
   virtual void stopProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) = 0;
   virtual void movingItemAtURL(const NSURL &url, const NSURL &destination,
                                NSFileProviderMovingCompletion completion) = 0;
+
+  // The host has the extension do it, once. When the extension ends in the middle, so does the action, with
+  // NSFileProviderErrorServerUnreachable: nobody knows then whether it was done.
+  virtual void performAction(const FPDActionRequest &request, FPDActionCompletion completion) = 0;
 };
 
 }  // namespace droxa

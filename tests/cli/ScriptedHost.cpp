@@ -110,6 +110,13 @@ void ScriptedHost::startProvidingItemWithIdentifier(const std::string &identifie
   completion(provide(url, readingOptions), url, NSError());
 }
 
+void ScriptedHost::performAction(const FPDActionRequest &request, FPDActionCompletion completion) {
+  requests.push_back(request);
+  if (const NSError error = FPDActionRequestError(request)) return completion(nullptr, error);
+  if (!act) return completion(nullptr, NSError(NSPOSIXErrorDomain, ENOSYS));
+  completion(act(request), NSError());
+}
+
 void ScriptedProviding::waitWithReply(NSFileProviderErrorCompletion completion) {
   std::optional<NSError> outcome;
   {
@@ -136,6 +143,20 @@ void ScriptedProviding::end(const NSError &error) {
   if (completion) completion(error);
 }
 
+void ScriptedAction::waitWithReply(NSFileProviderItemCompletion completion) {
+  outcome_.wait(std::move(completion));
+}
+
+void ScriptedAction::cancel() {
+  wasCancelled_ = true;
+  if (onCancel) return onCancel();
+  end(nullptr, NSError(NSCocoaErrorDomain, NSUserCancelledError));
+}
+
+void ScriptedAction::end(const std::shared_ptr<const NSFileProviderItem> &item, const NSError &error) {
+  outcome_.end(item, error);
+}
+
 std::shared_ptr<FPDControlProtocol> ScriptedHostConnecting::control(NSXPCErrorHandler, NSError *error) {
   *error = failure;
   return failure ? nullptr : host_;
@@ -152,8 +173,9 @@ CommandFixture::CommandFixture() {
 
 CommandContext CommandFixture::context() {
   using namespace std::chrono_literals;
-  return {out,    err, std::make_shared<ControlClient>(connecting, 5s),
-          daemon, 5s,  [this](std::chrono::milliseconds) { return stop(); }};
+  return {out,       err, std::make_shared<ControlClient>(connecting, 5s),
+          daemon,    5s,  [this](std::chrono::milliseconds) { return stop(); },
+          isTerminal};
 }
 
 int CommandFixture::run(const std::function<int(CommandContext &)> &command) {

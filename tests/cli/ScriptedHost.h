@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "cli/Commands.h"
+#include "platform/fileprovider/FPDActionOutcome.h"
 #include "platform/fileprovider/NSFileProviderError.h"
 #include "platform/foundation/ThreadSafety.h"
 #include "tessaly/QVDaemonConnection.h"
@@ -47,6 +48,8 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
   void movingItemAtURL(const NSURL &, const NSURL &, NSFileProviderMovingCompletion completion) override {
     completion(false, NSError(NSPOSIXErrorDomain, ENOSYS));
   }
+  // Done by `act`, as the extension would.
+  void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
 
   std::map<std::string, NSFileProviderItemFields> items;  // by identifier
   std::map<std::string, std::string> paths;               // to identifiers
@@ -55,6 +58,8 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
   std::map<std::string, NSError> pageErrors;              // by container: instead of the page after the last
   FPDStatus status;
   std::function<std::shared_ptr<FPDProviding>(const NSURL &url, std::uint64_t readingOptions)> provide;
+  std::function<std::shared_ptr<FPDAction>(const FPDActionRequest &request)> act;
+  std::vector<FPDActionRequest> requests;                                      // of actions
   std::function<void(const std::string &container, std::size_t page)> onPage;  // before it is answered
   std::shared_ptr<FPDWatchObserver> observer;
   bool firstPageWasByDate = false;
@@ -73,6 +78,25 @@ class ScriptedProviding final : public FPDProviding {
   Mutex lock_;
   std::optional<NSError> outcome_ GUARDED_BY(lock_);
   NSFileProviderErrorCompletion waiting_ GUARDED_BY(lock_);
+};
+
+// An action that ends when the test says, or, once it was begun, as cancelled. Thread contract: any thread.
+class ScriptedAction final : public FPDAction {
+ public:
+  void waitWithReply(NSFileProviderItemCompletion completion) override;
+  void getProgress(FPDProgressCompletion completion) override { completion(completed, total); }
+  void cancel() override;
+  void end(const std::shared_ptr<const NSFileProviderItem> &item, const NSError &error = {});
+  void end(const NSFileProviderItemFields &fields) { end(std::make_shared<NSFileProviderPlainItem>(fields)); }
+  bool wasCancelled() const { return wasCancelled_; }
+
+  std::atomic<std::int64_t> completed{0};
+  std::atomic<std::int64_t> total{-1};
+  std::function<void()> onCancel;  // instead of ending as cancelled
+
+ private:
+  std::atomic<bool> wasCancelled_{false};
+  FPDActionOutcome outcome_;
 };
 
 class ScriptedHostConnecting final : public ControlConnecting {
@@ -108,6 +132,7 @@ struct CommandFixture {
   std::ostringstream out;
   std::ostringstream err;
   std::function<bool()> stop = [] { return true; };
+  bool isTerminal = false;
 };
 
 NSFileProviderItemFields item(const std::string &identifier, const std::string &name,

@@ -7,6 +7,7 @@
 #include <string>
 
 #include "platform/fileprovider/NSFileProviderExtension.h"
+#include "platform/foundation/NSProgress.h"
 #include "platform/foundation/ThreadSafety.h"
 #include "tests/extension/ScriptedEnumerator.h"
 #include "tests/support/CallLog.h"
@@ -56,6 +57,67 @@ class ScriptedPrincipal final : public NSFileProviderExtension {
     log.add("move " + asked.path() + " to " + destination.path());
     completion(!failure, failure);
   }
+
+  // Kept for the test to answer, with the progress under which they were asked for.
+  void importDocumentAtURL(const NSURL &asked, const std::string &parent,
+                           NSFileProviderItemCompletion completion) override {
+    keep("import " + asked.path() + " to " + parent, std::move(completion));
+  }
+  void createDirectoryWithName(const std::string &name, const std::string &parent,
+                               NSFileProviderItemCompletion completion) override {
+    keep("create " + name + " in " + parent, std::move(completion));
+  }
+  void renameItemWithIdentifier(const std::string &identifier, const std::string &name,
+                                NSFileProviderItemCompletion completion) override {
+    keep("rename " + identifier + " to " + name, std::move(completion));
+  }
+  void reparentItemWithIdentifier(const std::string &identifier, const std::string &parent,
+                                  const std::optional<std::string> &newName,
+                                  NSFileProviderItemCompletion completion) override {
+    keep("reparent " + identifier + " to " + parent + " as " + newName.value_or("nil"),
+         std::move(completion));
+  }
+  void trashItemWithIdentifier(const std::string &identifier,
+                               NSFileProviderItemCompletion completion) override {
+    keep("trash " + identifier, std::move(completion));
+  }
+  void untrashItemWithIdentifier(const std::string &identifier, const std::optional<std::string> &parent,
+                                 NSFileProviderItemCompletion completion) override {
+    keep("untrash " + identifier + " to " + parent.value_or("nil"), std::move(completion));
+  }
+  void deleteItemWithIdentifier(const std::string &identifier,
+                                NSFileProviderErrorCompletion completion) override {
+    keep("delete " + identifier, [completion](const auto &, const NSError &error) { completion(error); });
+  }
+  void setLastUsedDate(const NSDate &date, const std::string &identifier,
+                       NSFileProviderItemCompletion completion) override {
+    keep("used " + date.description() + " " + identifier, std::move(completion));
+  }
+  void setTagData(const NSData &tagData, const std::string &identifier,
+                  NSFileProviderItemCompletion completion) override {
+    keep("tags " + std::to_string(tagData.length()) + " " + identifier, std::move(completion));
+  }
+  void setFavoriteRank(const std::optional<std::uint64_t> &rank, const std::string &identifier,
+                       NSFileProviderItemCompletion completion) override {
+    keep("rank " + (rank ? std::to_string(*rank) : "nil") + " " + identifier, std::move(completion));
+  }
+  struct Asked {
+    NSFileProviderItemCompletion completion;
+    std::shared_ptr<NSProgress> progress;
+  };
+  // The oldest action that nobody has taken.
+  Asked takeAction() {
+    const Lock lock(mutex);
+    Asked taken = std::move(actions.front());
+    actions.pop_front();
+    return taken;
+  }
+  void keep(const std::string &what, NSFileProviderItemCompletion completion) {
+    log.add(what);
+    const Lock lock(mutex);
+    actions.push_back({std::move(completion), NSProgress::currentProgress()});
+  }
+
   // Answers the oldest start.
   void endStart(const NSError &error) {
     NSFileProviderErrorCompletion completion;
@@ -70,6 +132,7 @@ class ScriptedPrincipal final : public NSFileProviderExtension {
   CallLog log;
   Mutex mutex;
   std::deque<NSFileProviderErrorCompletion> starts GUARDED_BY(mutex);
+  std::deque<Asked> actions GUARDED_BY(mutex);
   const NSURL url = NSURL::fileURLWithPath("/replica/a");
   std::shared_ptr<const NSFileProviderItem> item;
   std::shared_ptr<NSFileProviderEnumerator> enumerator;

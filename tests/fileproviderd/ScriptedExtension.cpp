@@ -31,6 +31,7 @@ class FailingProxy final : public NSFileProviderExtensionProtocol {
   void itemChangedAtURL(const NSURL &, NSFileProviderErrorCompletion) override { fail(); }
   void providePlaceholderAtURL(const NSURL &, NSFileProviderErrorCompletion) override { fail(); }
   void movingItemAtURL(const NSURL &, const NSURL &, NSFileProviderMovingCompletion) override { fail(); }
+  void performAction(const FPDActionRequest &, FPDActionCompletion) override { fail(); }
 
  private:
   void fail() { handler_(connectionInterrupted()); }
@@ -164,6 +165,15 @@ void ScriptedExtension::movingItemAtURL(const NSURL &url, const NSURL &destinati
                                         NSFileProviderMovingCompletion completion) {
   asked.put("move " + url.path() + " to " + destination.path());
   completion(!failure, failure);
+}
+
+void ScriptedExtension::performAction(const FPDActionRequest &request, FPDActionCompletion completion) {
+  asked.put(FPDActionName(request.kind) + " " + request.identifier);
+  requests.push_back(request);
+  if (failure) return completion(nullptr, failure);
+  auto action = std::make_shared<ScriptedAction>();
+  actions.push_back(action);
+  completion(action, NSError());
 }
 
 void ScriptedExtension::add(const std::string &identifier, const std::string &path,

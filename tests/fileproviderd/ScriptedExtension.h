@@ -127,6 +127,54 @@ class ScriptedProviding final : public FPDProviding,
   NSXPCErrorHandler handler_ GUARDED_BY(lock_);
 };
 
+// An action that the test ends: with an outcome, or by the end of its extension. Thread contract: any thread.
+class ScriptedAction final : public FPDAction,
+                             public NSXPCProxyCreating<FPDAction>,
+                             public std::enable_shared_from_this<ScriptedAction> {
+ public:
+  void waitWithReply(NSFileProviderItemCompletion completion) override {
+    ++waits;
+    const Lock held(lock_);
+    reply_ = std::move(completion);
+    waitHandler_ = handler_;
+  }
+  void getProgress(FPDProgressCompletion completion) override { completion(3, 7); }
+  void cancel() override { ++cancels; }
+  std::shared_ptr<FPDAction> remoteObjectProxyWithErrorHandler(NSXPCErrorHandler handler) override {
+    const Lock held(lock_);
+    handler_ = std::move(handler);
+    return shared_from_this();
+  }
+  void end(const std::shared_ptr<const NSFileProviderItem> &item, const NSError &error) {
+    NSFileProviderItemCompletion reply;
+    NSXPCErrorHandler dropped;
+    {
+      const Lock held(lock_);
+      reply.swap(reply_);
+      dropped.swap(waitHandler_);
+    }
+    reply(item, error);
+  }
+  void cutOff(const NSError &error) {
+    NSFileProviderItemCompletion dropped;
+    NSXPCErrorHandler handler;
+    {
+      const Lock held(lock_);
+      dropped.swap(reply_);
+      handler.swap(waitHandler_);
+    }
+    handler(error);
+  }
+  std::atomic<int> waits{0};
+  std::atomic<int> cancels{0};
+
+ private:
+  Mutex lock_;
+  NSFileProviderItemCompletion reply_ GUARDED_BY(lock_);
+  NSXPCErrorHandler handler_ GUARDED_BY(lock_);      // of the proxy made last
+  NSXPCErrorHandler waitHandler_ GUARDED_BY(lock_);  // of the wait under way
+};
+
 // An extension whose items and URLs the test sets, and whose enumerators it answers itself.
 class ScriptedExtension final : public NSFileProviderExtensionProtocol {
  public:
@@ -142,6 +190,7 @@ class ScriptedExtension final : public NSFileProviderExtensionProtocol {
   void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
   void movingItemAtURL(const NSURL &url, const NSURL &destination,
                        NSFileProviderMovingCompletion completion) override;
+  void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
 
   // An item at a path of the disk.
   void add(const std::string &identifier, const std::string &path, const NSFileProviderItemFields &fields);
@@ -154,6 +203,8 @@ class ScriptedExtension final : public NSFileProviderExtensionProtocol {
   Arrivals<std::shared_ptr<ScriptedEnumerator>> enumerators;  // handed out, in order
   Arrivals<std::string> opened;
   std::vector<std::shared_ptr<ScriptedProviding>> providings;  // handed out, in order
+  std::vector<std::shared_ptr<ScriptedAction>> actions;        // handed out, in order
+  std::vector<FPDActionRequest> requests;                      // of actions
   std::deque<NSError> openFailures;                            // answers of the next enumerator requests
 };
 

@@ -39,6 +39,13 @@ class Providing final : public FPDProviding {
   void cancel() override {}
 };
 
+class Action final : public FPDAction {
+ public:
+  void waitWithReply(NSFileProviderItemCompletion completion) override { completion(nullptr, {}); }
+  void getProgress(FPDProgressCompletion completion) override { completion(0, -1); }
+  void cancel() override {}
+};
+
 class Extension final : public NSFileProviderExtensionProtocol {
  public:
   void itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion) override {
@@ -68,6 +75,10 @@ class Extension final : public NSFileProviderExtensionProtocol {
   void movingItemAtURL(const NSURL &, const NSURL &, NSFileProviderMovingCompletion completion) override {
     completion(true, {});
   }
+  void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override {
+    if (const NSError error = FPDActionRequestError(request)) return completion(nullptr, error);
+    completion(std::make_shared<Action>(), NSError());
+  }
 };
 
 struct Ended {
@@ -89,6 +100,11 @@ std::vector<std::uint8_t> recordClient() {
   proxy->identifierForItemAtURL(NSURL::fileURLWithPath("/a"), [](const std::optional<std::string> &) {});
   proxy->enumeratorForContainer(
       "i1", [](const std::shared_ptr<NSFileProviderRemoteEnumerator> &, const NSError &) {});
+  FPDActionRequest request;
+  request.kind = FPDActionRequest::Kind::rename;
+  request.identifier = "d1";
+  request.name = "a";
+  proxy->performAction(request, [](const std::shared_ptr<FPDAction> &, const NSError &) {});
   std::vector<std::uint8_t> bytes;
   pollfd poller{ends[1], POLLIN, 0};
   while (poll(&poller, 1, 200) == 1) {

@@ -1,6 +1,7 @@
 @0xe208404b88662568;
 
 using Cxx = import "/capnp/c++.capnp";
+using Action = import "/platform/fileprovider/xpc/FPDAction.capnp";
 using Enumerator = import "/platform/fileprovider/xpc/NSFileProviderRemoteEnumerator.capnp";
 using Providing = import "/platform/fileprovider/xpc/FPDProviding.capnp";
 using Values = import "/platform/xpc/Values.capnp";
@@ -22,6 +23,7 @@ interface FPDControlProtocol {
   stopProvidingItemAtURL @9 (url :Values.Url) -> (error :Values.Error);
   movingItemAtURL @10 (url :Values.Url, destination :Values.Url)
       -> (requiresProviding :Bool, error :Values.Error);
+  performAction @11 (request :Action.FPDActionRequest) -> (action :Action.FPDAction, error :Values.Error);
 }
 
 interface FPDWatch {

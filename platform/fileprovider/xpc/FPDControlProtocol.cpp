@@ -1,6 +1,7 @@
 #include <utility>
 
 #include "platform/fileprovider/NSFileProviderRemote.h"
+#include "platform/fileprovider/xpc/FPDActionAdapter.h"
 #include "platform/fileprovider/xpc/FPDControlProtocol.capnp.h"
 #include "platform/fileprovider/xpc/FPDProvidingAdapter.h"
 #include "platform/fileprovider/xpc/FPDWatchAdapter.h"
@@ -172,6 +173,13 @@ class ControlServer final : public Schema::Server {
             auto &object, auto reply) { object.movingItemAtURL(url, destination, reply(writeMoving)); });
   }
 
+  kj::Promise<void> performAction(PerformActionContext context) override {
+    return exported_.serve(
+        context, [request = readActionRequest(context.getParams().getRequest())](auto &object, auto reply) {
+          object.performAction(request, reply(xpcWriteAction));
+        });
+  }
+
  private:
   Exported<FPDControlProtocol> exported_;
 };
@@ -279,6 +287,13 @@ class ControlProxy final : public XPCProxy<Schema, FPDControlProtocol, ControlPr
           if (destination) writeURL(params.initDestination(), destination);
         },
         std::move(completion), readMoving);
+  }
+
+  void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override {
+    call(
+        &Client::performActionRequest,
+        [request](auto params, Session &) { writeActionRequest(params.initRequest(), request); },
+        std::move(completion), xpcReadAction);
   }
 };
 

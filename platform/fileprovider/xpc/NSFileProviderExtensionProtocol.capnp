@@ -1,6 +1,7 @@
 @0x9b3cf3e1adf5b418;
 
 using Cxx = import "/capnp/c++.capnp";
+using Action = import "/platform/fileprovider/xpc/FPDAction.capnp";
 using Enumerator = import "/platform/fileprovider/xpc/NSFileProviderRemoteEnumerator.capnp";
 using Providing = import "/platform/fileprovider/xpc/FPDProviding.capnp";
 using Values = import "/platform/xpc/Values.capnp";
@@ -19,4 +20,5 @@ interface NSFileProviderExtensionProtocol {
   providePlaceholderAtURL @7 (url :Values.Url) -> (error :Values.Error);
   movingItemAtURL @8 (url :Values.Url, destination :Values.Url)
       -> (requiresProviding :Bool, error :Values.Error);
+  performAction @9 (request :Action.FPDActionRequest) -> (action :Action.FPDAction, error :Values.Error);
 }

@@ -1,6 +1,7 @@
 #include <utility>
 
 #include "platform/fileprovider/NSFileProviderRemote.h"
+#include "platform/fileprovider/xpc/FPDActionAdapter.h"
 #include "platform/fileprovider/xpc/FPDProvidingAdapter.h"
 #include "platform/fileprovider/xpc/FileProviderInterfaces.h"
 #include "platform/fileprovider/xpc/NSFileProviderExtensionProtocol.capnp.h"
@@ -108,6 +109,13 @@ class ExtensionServer final : public Schema::Server {
             auto &object, auto reply) { object.movingItemAtURL(url, destination, reply(writeMoving)); });
   }
 
+  kj::Promise<void> performAction(PerformActionContext context) override {
+    return exported_.serve(
+        context, [request = readActionRequest(context.getParams().getRequest())](auto &object, auto reply) {
+          object.performAction(request, reply(xpcWriteAction));
+        });
+  }
+
  private:
   Exported<NSFileProviderExtensionProtocol> exported_;
 };
@@ -191,6 +199,13 @@ class ExtensionProxy final : public XPCProxy<Schema, NSFileProviderExtensionProt
           if (destination) writeURL(params.initDestination(), destination);
         },
         std::move(completion), readMoving);
+  }
+
+  void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override {
+    call(
+        &Client::performActionRequest,
+        [request](auto params, Session &) { writeActionRequest(params.initRequest(), request); },
+        std::move(completion), xpcReadAction);
   }
 };
 
