@@ -65,6 +65,12 @@ struct QueuedUpload {
   NSError error;        // of the last attempt
 };
 
+// A record that is about to be given a file or folder of its own here, and where that is to be.
+struct UnfinishedRecord {
+  std::string record, parent, name;
+  NSFileProviderItemKind kind = NSFileProviderItemKind::document;
+};
+
 // The device's side of the sync, in a database of its own: what is known of the cloud's records, the uploads
 // that wait, and how far both feeds were read. It survives kill -9 at any moment, and can be thrown away: the
 // markers on the files and the cloud have everything again.
@@ -107,6 +113,15 @@ class SyncStore {
   void fetched(const std::string &record);
   std::uint64_t countToFetch();
 
+  // What is made before its row is committed is written down first, on the disk before this returns, so that
+  // a file that was made by a transaction that never ended isn't taken for a person's. Not to be called
+  // inside a transaction; finished() belongs to the one that has the row.
+  void beginUnfinished(const std::vector<UnfinishedRecord> &records);
+  void finished(const std::string &record);
+  std::vector<UnfinishedRecord> unfinished();
+  std::optional<UnfinishedRecord> unfinished(const std::string &record);
+  void forgetUnfinished();  // all
+
   // Contents whose save was begun, and may have been carried out without this device being told.
   void noteSent(const std::string &record, const std::string &digest);
   void forgetSent(const std::string &record);
@@ -147,6 +162,7 @@ class SyncStore {
   SyncRow read(const SqlStatement &row);
   std::optional<SyncRow> one(SqlStatement &statement);
   std::vector<SyncRow> all(SqlStatement &statement);
+  static std::vector<UnfinishedRecord> readUnfinished(SqlStatement &asked);
   QueuedUpload readQueued(const SqlStatement &row);
   std::vector<QueuedUpload> queuedOf(SqlStatement &statement);
   SqlStatement &statement(const char *sql) REQUIRES(mutex_);

@@ -180,6 +180,9 @@ Uploader::Prepared Uploader::prepareSave(const ItemRecord &item, Plan *plan, con
   }
   if (auto bound = context_.store.byItem(item.id)) row = std::move(*bound);
   if (row.record.empty()) {
+    // The applier is about to find out whether that may stay.
+    const auto marker = ReadMarker(location->folder.get(), location->name);
+    if (marker && context_.store.unfinished(marker->recordName)) return laterWith(plan, NSError());
     // Written down before it is sent, so that a lost reply doesn't make a second record.
     row.record = NewRecordName();
     row.item = item.id;
@@ -277,7 +280,12 @@ Uploader::Prepared Uploader::prepareDocument(const FileLocation &location, Plan 
   if (isKnown && !row.isDataless && IsSameContents(plan->file, row.local))
     return changesAnything(*plan) ? Prepared::save : nothingToSend(*plan);
   // Written here and elsewhere: the other version is on its way here, and then both are kept.
-  if (row.hasNewer()) return laterWith(plan, NSError());
+  // Whoever waits for this one is told why that doesn't come.
+  if (row.hasNewer()) {
+    const NSError problem = problemOfNewer_ ? problemOfNewer_(plan->entry.item) : NSError();
+    context_.store.uploadFailed(plan->entry, problem, nowMilliseconds() + kSoon);
+    return Prepared::later;
+  }
   plan->hasContent = true;
   plan->changesMarker = true;
   plan->document.tag = row.tag;  // of the version that was written over: a newer one is a conflict
