@@ -57,7 +57,8 @@ bool write(const fs::path &path, const char *text, std::string *problem) {
 }  // namespace
 
 std::string documentsFolder(const std::string &replica, const std::string &container) {
-  return replica + "/" + container + "/Documents";
+  return replica + "/" + container + "/" +
+         (container == std::string(kTrashContainer) ? "files" : "Documents");
 }
 
 bool makeContainers(const std::string &replica, std::string *problem) {

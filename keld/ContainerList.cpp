@@ -26,7 +26,7 @@ std::vector<ContainerEntry> readEntries(ItemQueries &queries) {
     ContainerEntry entry;
     entry.containerID = folder.name;
     entry.folder = folder.id;
-    const auto documents = queries.byName(folder.id, kDocumentsName);
+    const auto documents = queries.byName(folder.id, QVDocumentsFolderName(folder.name));
     if (documents && documents->isFolder()) entry.documents = documents->id;
     entries.push_back(std::move(entry));
   }
@@ -124,7 +124,7 @@ const std::vector<std::string> &BuiltInContainers() {
 std::string MakeBuiltInContainers(const std::string &replicaPath) {
   for (const std::string &container : BuiltInContainers()) {
     const std::string folder = replicaPath + "/" + container;
-    for (const std::string &path : {folder, folder + "/" + kDocumentsName}) {
+    for (const std::string &path : {folder, folder + "/" + QVDocumentsFolderName(container)}) {
       if (::mkdir(path.c_str(), 0700) == 0 || errno == EEXIST) continue;
       return path + ": can't make the folder: " + std::strerror(errno);
     }

@@ -9,18 +9,34 @@ std::uint64_t metaNumber(SqlDatabase &database, const char *key) {
       database.integer("SELECT value FROM meta WHERE key = '" + std::string(key) + "'"));
 }
 
+// In three parameters from `first` on. NULL, which takes no room, stands for what isn't there.
+void bindMetadata(SqlStatement &statement, int first, const ItemMetadata &metadata) {
+  if (metadata.tags.empty())
+    statement.bindNull(first);
+  else
+    statement.bindBlob(first, QVEncodeTagNames(metadata.tags));
+  if (metadata.lastUsed == 0)
+    statement.bindNull(first + 1);
+  else
+    statement.bind(first + 1, metadata.lastUsed);
+  if (metadata.favoriteRank == 0)
+    statement.bindNull(first + 2);
+  else
+    statement.bind(first + 2, metadata.favoriteRank);
+}
+
 }  // namespace
 
 ItemEdits::ItemEdits(SqlDatabase &database)
     : database_(database),
       insert_(database.handle(),
               "INSERT INTO items(parent, name, id, kind, flags, rank, age, size, mode, inode, device, birth, "
-              "changed)"
-              " VALUES (?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?)"),
+              "changed, tags, used, favorite)"
+              " VALUES (?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?)"),
       update_(database.handle(),
               "UPDATE items SET kind = ?, flags = ?, rank = ?, age = ?, size = ?, mode = ?, inode = ?, "
               "device = ?,"
-              " birth = ?, changed = ? WHERE parent = ? AND name = ?"),
+              " birth = ?, changed = ?, tags = ?, used = ?, favorite = ? WHERE parent = ? AND name = ?"),
       rename_(database.handle(), "UPDATE items SET parent = ?, name = ? WHERE parent = ? AND name = ?"),
       remove_(database.handle(), "DELETE FROM items WHERE parent = ? AND name = ?"),
       tombstone_(database.handle(), "INSERT INTO tombstones(rank, id, kind) VALUES (?, ?, ?)"),
@@ -56,6 +72,7 @@ void ItemEdits::insert(ItemRecord &record) {
   insert_.bind(6, record.rank).bind(7, -facts.modified).bind(8, facts.size);
   insert_.bind(9, static_cast<std::int64_t>(facts.mode)).bind(10, facts.inode).bind(11, facts.device);
   insert_.bind(12, facts.birth).bind(13, facts.changed);
+  bindMetadata(insert_, 14, record.metadata);
   insert_.run();
   if (isRevived) untombstone_.bind(1, record.id).run();
   count(record, 1);
@@ -67,7 +84,8 @@ void ItemEdits::updateSilently(const ItemRecord &record) {
   update_.bind(3, record.rank).bind(4, -facts.modified).bind(5, facts.size);
   update_.bind(6, static_cast<std::int64_t>(facts.mode)).bind(7, facts.inode).bind(8, facts.device);
   update_.bind(9, facts.birth).bind(10, facts.changed);
-  update_.bind(11, record.parent).bindBlob(12, record.name);
+  bindMetadata(update_, 11, record.metadata);
+  update_.bind(14, record.parent).bindBlob(15, record.name);
   update_.run();
 }
 

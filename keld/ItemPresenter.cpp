@@ -50,6 +50,9 @@ std::shared_ptr<const QVQueryItem> ItemPresenter::item(const ItemRecord &record)
   fields.isExcludedFromSync = (record.flags & kExcludedFlag) != 0;
   fields.isDownloaded = (record.flags & kDatalessFlag) == 0;
   fields.isUploaded = (record.flags & kUploadedFlag) != 0;
+  if (record.metadata.lastUsed != 0)
+    fields.lastUsedDate = NSDate::dateWithNanosecondsSince1970(record.metadata.lastUsed);
+  fields.favoriteRank = record.metadata.favoriteRank;
   return std::make_shared<const QVQueryItem>(fileObjectID, std::move(fields));
 }
 

@@ -6,7 +6,9 @@ namespace droxa::keld {
 
 namespace {
 
-#define ITEM_COLUMNS "id, parent, name, kind, flags, rank, age, size, mode, inode, device, birth, changed"
+#define ITEM_COLUMNS                                                                                  \
+  "id, parent, name, kind, flags, rank, age, size, mode, inode, device, birth, changed, tags, used, " \
+  "favorite"
 
 std::vector<ItemRecord> readAll(SqlScope &scope) {
   std::vector<ItemRecord> records;
@@ -36,6 +38,10 @@ ItemRecord ReadItemRecord(const SqlStatement &row) {
   record.facts.device = row.number(10);
   record.facts.birth = row.integer(11);
   record.facts.changed = row.integer(12);
+  if (const std::string_view tags = row.bytes(13); !tags.empty())
+    record.metadata.tags = QVDecodeTagNames(tags);
+  record.metadata.lastUsed = row.integer(14);
+  record.metadata.favoriteRank = row.number(15);
   return record;
 }
 

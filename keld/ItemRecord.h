@@ -5,6 +5,7 @@
 
 #include "platform/fileprovider/NSFileProviderItem.h"
 #include "tessaly/QVFileObjectID.h"
+#include "tessaly/QVItemMetadata.h"
 
 namespace droxa::keld {
 
@@ -14,8 +15,6 @@ using ItemNumber = std::uint64_t;  // the number of a QVFileObjectID; 0 for none
 inline constexpr ItemNumber kReplicaFolder = 0;  // its children are the containers
 // Holds what was found missing until it is known whether it turned up elsewhere.
 inline constexpr ItemNumber kLimboFolder = static_cast<ItemNumber>(-1);
-
-inline constexpr char kDocumentsName[] = "Documents";
 
 // Where an item stands in the drive.
 enum class Zone : std::uint8_t {
@@ -56,6 +55,8 @@ struct FileFacts {
   }
 };
 
+using ItemMetadata = QVItemMetadata;
+
 // A row of the item table.
 struct ItemRecord {
   ItemNumber id = 0;
@@ -64,6 +65,7 @@ struct ItemRecord {
   std::uint32_t flags = 0;
   std::uint64_t rank = 0;
   FileFacts facts;
+  ItemMetadata metadata;
 
   Zone zone() const { return static_cast<Zone>(flags & kZoneMask); }
   bool isFolder() const { return facts.kind == NSFileProviderItemKind::folder; }

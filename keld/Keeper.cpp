@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <malloc.h>
 #include <unordered_set>
+#include <utility>
 
 #include "keld/Schema.h"
 #include "platform/dispatch/dispatch.h"
@@ -20,7 +21,9 @@ constexpr std::size_t kMostHintsAtOnce = 10000;
 constexpr std::size_t kMostHintsKept = 200000;
 constexpr std::size_t kMostChangesAtOnce = 20000;
 
-void lookAtPath(const std::string &path, Reconciler &reconciler, ItemQueries &queries) {
+}  // namespace
+
+void LookAtPath(const std::string &path, Reconciler &reconciler, ItemQueries &queries) {
   ItemNumber folder = kReplicaFolder;
   for (std::size_t at = 0; at < path.size();) {
     const std::size_t slash = std::min(path.find('/', at), path.size());
@@ -33,8 +36,6 @@ void lookAtPath(const std::string &path, Reconciler &reconciler, ItemQueries &qu
     at = slash + 1;
   }
 }
-
-}  // namespace
 
 Keeper::Keeper(std::unique_ptr<SqlDatabase> database, std::string databasePath,
                const std::string &replicaPath, KeeperOptions options, ContainerList &containers,
@@ -143,7 +144,7 @@ void Keeper::lookAt(std::string path, std::function<void()> done) {
 void Keeper::lookAtAll(std::vector<std::string> paths, std::function<void()> done) {
   perform(
       [paths = std::move(paths)](Reconciler &reconciler, ItemQueries &queries, ItemEdits &) {
-        for (const std::string &path : paths) lookAtPath(path, reconciler, queries);
+        for (const std::string &path : paths) LookAtPath(path, reconciler, queries);
       },
       std::move(done));
 }
@@ -180,9 +181,10 @@ std::string Keeper::watcherDescription() const {
 // --- The keeper's thread.
 
 void Keeper::run() {
+  Work work;
   try {
     for (;;) {
-      Work work = waitForWork();
+      work = waitForWork();
       if (work.stop) break;
       step(work);
       if (bulkLoading_ && firstWalkDone_) finishBulkLoad();
@@ -192,6 +194,7 @@ void Keeper::run() {
     database_->execute("PRAGMA wal_checkpoint(TRUNCATE)");
   } catch (const SqlError &error) {
     if (error.meansDamage()) DatabaseMarkDamaged(databasePath_);
+    for (auto &job : work.jobs) dispatch_async_global(std::move(job.second));
     fail(databasePath_ + ": " + error.what());
   }
 }
@@ -283,7 +286,7 @@ void Keeper::step(Work &work) {
   if (!changes.empty()) listener_.itemsChanged({0, std::move(changes), before, after}, *queries_);
   if (isAdvanced) listener_.feedAdvanced();
   if (containers.list) listener_.containerListChanged();
-  for (auto &job : work.jobs) dispatch_async_global(std::move(job.second));
+  for (auto &job : std::exchange(work.jobs, {})) dispatch_async_global(std::move(job.second));
 }
 
 void Keeper::applyHints(std::vector<ReplicaHint> &hints) {

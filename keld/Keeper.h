@@ -29,6 +29,9 @@ struct KeeperOptions {
   std::uint64_t mostTombstones = 200000;
 };
 
+// Looks at what is at this path now, and at the folders on the way to it. In a job of the keeper's.
+void LookAtPath(const std::string &pathBelowReplica, Reconciler &reconciler, ItemQueries &queries);
+
 // Told by the keeper, on its thread, after what it did was committed. They mustn't wait for the keeper.
 class KeeperListener {
  public:

@@ -4,6 +4,7 @@
 
 #include "keld/Listing.h"
 #include "keld/WorkingSetFeed.h"
+#include "tessaly/QVContainer.h"
 #include "tessaly/QVErrors.h"
 #include "tessaly/QVNotifications.h"
 
@@ -214,8 +215,8 @@ void KeldSession::getContainerItem(const std::string &containerID, bool forceSca
   const auto containers = daemon_->containers();
   const ContainerEntry *entry = containers->byID(containerID);
   if (!entry || entry->documents == 0) return reply(nullptr, qvc_errorNoSuchItem(containerID));
-  const NSURL documents =
-      NSURL::fileURLWithPath(daemon_->replicaPath() + "/" + containerID + "/" + kDocumentsName);
+  const NSURL documents = NSURL::fileURLWithPath(daemon_->replicaPath() + "/" + containerID + "/" +
+                                                 QVDocumentsFolderName(containerID));
   getQueryItemForURL(documents, forceScan, std::move(reply));
 }
 
@@ -226,12 +227,34 @@ void KeldSession::getContainers(QVContainersReply reply) {
     QVContainerDescription description;
     description.containerID = entry.containerID;
     description.url = NSURL::fileURLWithPath(daemon_->replicaPath() + "/" + entry.containerID);
-    description.documentsURL = description.url.URLByAppendingPathComponent(kDocumentsName);
+    description.documentsURL =
+        description.url.URLByAppendingPathComponent(QVDocumentsFolderName(entry.containerID));
     if (entry.documents != 0 && entry.documents != containers->root())
       description.documentsID = QVFileObjectID::folderOrAliasID(entry.documents);
     descriptions.push_back(std::move(description));
   }
   reply(descriptions, NSError());
+}
+
+// --- What the user notes on items.
+
+void KeldSession::setMetadataAtURL(const NSURL &url, const QVItemMetadataChange &change, QVErrorReply reply) {
+  const auto path = daemon_->pathBelowReplica(url);
+  if (!path) return reply(qvc_errorNoSuchItem(url.path()));
+  QVItemMetadataChange kept = change;
+  if (kept.tags)
+    if (const NSError error = QVNormalizeTagNames(&*kept.tags)) return reply(error);
+  // What it stays when the keeper has stopped.
+  const auto outcome =
+      std::make_shared<NSError>(qvc_error(QVErrorShuttingDown, "the daemon is shutting down"));
+  daemon_->keeper().perform(
+      [path = *path, url, kept, outcome](Reconciler &reconciler, ItemQueries &queries, ItemEdits &) {
+        LookAtPath(path, reconciler, queries);
+        const auto record = queries.byPathBelowReplica(path);
+        const bool isItem = record && record->parent != kReplicaFolder;
+        *outcome = isItem ? reconciler.applyMetadata(record->id, kept) : qvc_errorNoSuchItem(url.path());
+      },
+      [outcome, reply = std::move(reply)] { reply(*outcome); });
 }
 
 // --- Account and status.

@@ -37,7 +37,7 @@ std::optional<std::uint32_t> Placement::flags(ItemNumber parent, std::string_vie
   if (!record_) return std::nullopt;
   if (!isFolder && IsPromiseName(name)) return std::nullopt;  // stands for a document, and is none
   if (isContainer_) {
-    if (!isFolder || name != kDocumentsName) zone = Zone::privateStorage;
+    if (!isFolder || name != QVDocumentsFolderName(record_->name)) zone = Zone::privateStorage;
   } else if (record_->zone() == Zone::structure) {
     zone = isTrashDocuments_ ? Zone::trashed : Zone::shown;
   } else {

@@ -169,23 +169,27 @@ bool Reconciler::takeBackFromBackup(const Observation &observation, std::uint32_
     insertNew(observation, flags, *id);
     return true;
   }
+  const ItemMetadata metadata = record->metadata;
   Observation backup{record->parent, record->name, record->facts, true};
   const std::uint32_t backupFlags = record->flags;
   edits_.remove(*record, false);
-  insertNew(observation, flags, *id);
+  insertNew(observation, flags, *id, metadata);
   insertNew(backup, backupFlags, 0);
   return true;
 }
 
 // --- What happens to items.
 
-void Reconciler::insertNew(const Observation &observation, std::uint32_t flags, ItemNumber id) {
+void Reconciler::insertNew(const Observation &observation, std::uint32_t flags, ItemNumber id,
+                           const ItemMetadata &metadata) {
   ItemRecord record;
   record.id = id;
   record.parent = observation.folder;
   record.name = observation.name;
   record.flags = flags;
   record.facts = *observation.facts;
+  record.metadata = metadata;
+  readMetadata(record);
   if (isDataless(record.parent, record.name, record.facts)) record.flags |= kDatalessFlag;
   edits_.insert(record);
   changes_.push_back({record.id, record.facts.kind, 0, record.parent, false});
@@ -224,6 +228,7 @@ void Reconciler::move(ItemRecord record, const Observation &observation, std::ui
   const bool wasPrivate = record.zone() == Zone::privateStorage;
   const bool flagsChanged = (record.flags ^ flags) & ~kOwnFlags;
   record.facts = *observation.facts;
+  readMetadata(record);
   edits_.setFlags(record, flags | (record.flags & kOwnFlags));
   if (!wasPrivate && record.zone() == Zone::privateStorage) edits_.leaveTombstone(record);
   changes_.push_back({record.id, record.facts.kind, origin.parent, record.parent, false});
@@ -241,7 +246,10 @@ void Reconciler::refresh(ItemRecord record, const FileFacts &facts) {
                            record.facts.device == facts.device && record.facts.size == facts.size &&
                            record.facts.mode == facts.mode;
   if (becameAccessible && !isIdentical) foldersToScan_.push_back(record.id);
-  if (isIdentical) return;
+  // Attributes may be written twice while the clock of times of change stands still.
+  const ItemMetadata known = record.metadata;
+  readMetadata(record);
+  if (isIdentical && record.metadata == known) return;
   // Whatever was written here, the cloud doesn't have it yet.
   const bool isWritten =
       !record.isFolder() && (record.facts.size != facts.size || record.facts.modified != facts.modified ||
@@ -252,7 +260,8 @@ void Reconciler::refresh(ItemRecord record, const FileFacts &facts) {
     if (isDataless(record.parent, record.name, facts)) record.flags |= kDatalessFlag;
   }
   record.facts = facts;
-  if (looksTheSame || isUnlistedStructure(record)) return edits_.updateSilently(record);
+  if ((looksTheSame && record.metadata == known) || isUnlistedStructure(record))
+    return edits_.updateSilently(record);
   edits_.update(record);
   changes_.push_back({record.id, record.facts.kind, record.parent, record.parent, false});
 }

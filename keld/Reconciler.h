@@ -17,6 +17,7 @@
 #include "keld/ItemRecord.h"
 #include "keld/Placement.h"
 #include "keld/RecentFiles.h"
+#include "platform/foundation/NSError.h"
 
 namespace droxa::keld {
 
@@ -61,6 +62,9 @@ class Reconciler {
   void touch(ItemNumber id);
   // Shows what the sync has found out of the item: kSyncFlags.
   void setSyncFlags(ItemNumber id, std::uint32_t flags);
+  // Notes it on the item's file, or in its row where the file can't bear it. nil, QVErrorNoSuchItem or a
+  // POSIX error.
+  NSError applyMetadata(ItemNumber id, const QVItemMetadataChange &change);
 
  private:
   struct Observation {
@@ -87,7 +91,9 @@ class Reconciler {
   bool isStillThere(const ItemRecord &record);
   bool leavesItsName(const ItemRecord &record, const Observation &observation);
   bool takeBackFromBackup(const Observation &observation, std::uint32_t flags);
-  void insertNew(const Observation &observation, std::uint32_t flags, ItemNumber id);
+  void insertNew(const Observation &observation, std::uint32_t flags, ItemNumber id,
+                 const ItemMetadata &metadata = {});
+  void readMetadata(ItemRecord &record);
   bool isDataless(ItemNumber folder, const std::string &name, const FileFacts &facts);
   void move(ItemRecord record, const Observation &observation, std::uint32_t flags);
   void refresh(ItemRecord record, const FileFacts &facts);

@@ -43,6 +43,14 @@ INSERT INTO meta VALUES ('bulkLoaded', 0), ('clean', 1), ('nextID', 1), ('rank',
   ('documents', 0), ('folders', 0), ('aliases', 0);
 )sql";
 
+// NULL stands for none. Whatever the files bear already is read when they are looked at next.
+constexpr char kMetadataStep[] = R"sql(
+ALTER TABLE items ADD COLUMN tags BLOB;
+ALTER TABLE items ADD COLUMN used INTEGER;
+ALTER TABLE items ADD COLUMN favorite INTEGER;
+UPDATE items SET changed = 0;
+)sql";
+
 std::string newUUID() {
   uuid_t uuid;
   uuid_generate(uuid);
@@ -87,7 +95,7 @@ std::unique_ptr<SqlDatabase> openChecked(const std::string &path) {
 }  // namespace
 
 const std::vector<SchemaStep> &SchemaSteps() {
-  static const std::vector<SchemaStep> steps{{kFirstStep}};
+  static const std::vector<SchemaStep> steps{{kFirstStep}, {kMetadataStep}};
   return steps;
 }
 

@@ -47,6 +47,12 @@ SqlStatement &SqlStatement::bindBlob(int parameter, std::string_view bytes) {
   return *this;
 }
 
+SqlStatement &SqlStatement::bindNull(int parameter) {
+  const int code = sqlite3_bind_null(statement_, parameter);
+  if (code != SQLITE_OK) fail(database_, code, sqlite3_sql(statement_));
+  return *this;
+}
+
 SqlStatement &SqlStatement::bindText(int parameter, std::string_view text) {
   const int code = sqlite3_bind_text64(statement_, parameter, text.empty() ? "" : text.data(), text.size(),
                                        SQLITE_TRANSIENT, SQLITE_UTF8);

@@ -34,6 +34,7 @@ class SqlStatement {
   SqlStatement &bind(int parameter, std::int64_t value);
   SqlStatement &bind(int parameter, std::uint64_t value);
   SqlStatement &bindBlob(int parameter, std::string_view bytes);
+  SqlStatement &bindNull(int parameter);
   SqlStatement &bindText(int parameter, std::string_view text);
 
   bool step();  // true: there is a row

@@ -8,6 +8,7 @@
 
 #include "platform/foundation/Paths.h"
 #include "tessaly/NSURL+Tessaly.h"
+#include "tessaly/QVContainer.h"
 #include "tessaly/QVDaemonConnection.h"
 #include "tessaly/QVErrors.h"
 
@@ -39,8 +40,9 @@ bool isInContainer(const NSURL &url) {
   return url.isFileURL() && containerPath(url.path(), DroxaProcessHome().replica()).has_value();
 }
 
-bool isDocumentsPath(std::string_view rest) {
-  return rest == "Documents" || rest.substr(0, 10) == "Documents/";
+bool isInDocuments(const ContainerPath &path) {
+  const std::string_view documents = QVDocumentsFolderName(path.containerID);
+  return path.rest.substr(0, path.rest.find('/')) == documents;
 }
 
 std::string realPath(const std::string &path) {
@@ -146,7 +148,7 @@ NSURL qv_URLByResolvingExternalDocumentReferenceWithError(const NSURL &url, NSEr
 bool qv_isInTessalyPrivateStorages(const NSURL &url) {
   if (!url.isFileURL()) return false;
   const auto path = containerPath(url.path(), DroxaProcessHome().replica());
-  return path && !isDocumentsPath(path->rest);
+  return path && !isInDocuments(*path);
 }
 
 bool qv_isNameExcludedFromSync(std::string_view name) {
@@ -191,7 +193,7 @@ void qv_addPhysicalProperty(NSURL &url) {
 std::optional<std::string> qv_containerIDIfIsDocumentsContainerURL(const NSURL &url) {
   if (!url.isFileURL()) return std::nullopt;
   const auto path = containerPath(url.path(), DroxaProcessHome().replica());
-  if (!path || path->rest != "Documents") return std::nullopt;
+  if (!path || path->rest != QVDocumentsFolderName(path->containerID)) return std::nullopt;
   return std::string(path->containerID);
 }
 

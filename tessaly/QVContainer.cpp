@@ -111,6 +111,10 @@ bool readManaged() {
 
 }  // namespace
 
+const char *QVDocumentsFolderName(std::string_view containerID) {
+  return containerID == QVUbiquitousTrashContainerID ? "files" : "Documents";
+}
+
 QVContainer::QVContainer(QVContainerDescription description) : description_(std::move(description)) {}
 
 std::map<std::string, std::shared_ptr<const QVContainer>> QVContainer::allContainersByContainerID() {

@@ -3,6 +3,7 @@
 #include <map>
 #include <memory>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "platform/foundation/NSError.h"
@@ -15,6 +16,11 @@ inline constexpr char QVUbiquitousDefaultContainerID[] = "com.quorva.Tessaly.def
 inline constexpr char QVUbiquitousDocumentsContainerID[] = "com.quorva.Tessaly.documents";
 inline constexpr char QVUbiquitousDesktopContainerID[] = "com.quorva.Tessaly.desktop";
 inline constexpr char QVUbiquitousTrashContainerID[] = "com.quorva.Tessaly.trash";
+
+// The name of a container's documents folder: "Documents"; of the trash "files", as file managers lay a trash
+// out.
+const char *QVDocumentsFolderName(std::string_view containerID);
+inline constexpr char QVTrashInfoFolderName[] = "info";  // beside the trash's "files": where things came from
 
 // A folder of the replica with a documents folder in it: replica/<container identifier>/Documents. What else
 // is in the container's folder is private to its owner. Thread contract: immutable; the class operations on

@@ -14,6 +14,7 @@
 #include "platform/xpc/NSXPCProxyCreating.h"
 #include "tessaly/QVContents.h"
 #include "tessaly/QVFileObjectID.h"
+#include "tessaly/QVItemMetadata.h"
 #include "tessaly/QVQueryItem.h"
 
 // The daemon's protocol. The same abstract classes are called in process (the fake daemon of the tests,
@@ -150,6 +151,12 @@ class QVProtocol : public QVContentsProtocol {
   virtual void getQueryItemForURL(const NSURL &url, bool fakeFSEvent, QVItemReply reply) = 0;
   virtual void getContainerItem(const std::string &containerID, bool forceScan, QVItemReply reply) = 0;
   virtual void getContainers(QVContainersReply reply) = 0;
+
+  // Notes what the user set on the item at `url`: on its file, or with the item where the file can't bear it
+  // (a symbolic link, a file system without extended attributes). Replies when the item shows it. 14 when
+  // there is no such item, 22 for tags that can't be kept (tessaly/QVItemMetadata.h), POSIX errors of the
+  // file system.
+  virtual void setMetadataAtURL(const NSURL &url, const QVItemMetadataChange &change, QVErrorReply reply) = 0;
 
   // Until the connection ends, the receiver is told of account and container-list changes.
   virtual void subscribeToNotifications(std::shared_ptr<QVDaemonNotificationReceiving> receiver,

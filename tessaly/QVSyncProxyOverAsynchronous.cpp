@@ -98,6 +98,11 @@ class BlockingProxy final : public QVSyncProxy, public QVProtocol {
     wait(reply,
          [](QVProtocol &daemon, QVContainersReply answer) { daemon.getContainers(std::move(answer)); });
   }
+  void setMetadataAtURL(const NSURL &url, const QVItemMetadataChange &change, QVErrorReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVErrorReply answer) {
+      daemon.setMetadataAtURL(url, change, std::move(answer));
+    });
+  }
   void subscribeToNotifications(std::shared_ptr<QVDaemonNotificationReceiving> receiver,
                                 QVErrorReply reply) override {
     wait(reply, [&](QVProtocol &daemon, QVErrorReply answer) {

@@ -42,6 +42,10 @@ class UnreachableDaemon final : public QVProtocol {
     failed_();
   }
   void getContainers(QVContainersReply /*reply*/) override { failed_(); }
+  void setMetadataAtURL(const NSURL & /*url*/, const QVItemMetadataChange & /*change*/,
+                        QVErrorReply /*reply*/) override {
+    failed_();
+  }
   void subscribeToNotifications(std::shared_ptr<QVDaemonNotificationReceiving> /*receiver*/,
                                 QVErrorReply /*reply*/) override {
     failed_();

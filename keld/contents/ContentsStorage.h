@@ -202,6 +202,7 @@ class ContentsStorage {
   // Replacing (Replacement.cpp). The file at the name comes out under the prepared file's temporary name.
   ContentsResult replaceOpened(int folder, const std::string &name, PreparedFile &prepared,
                                OutgoingDocument &outgoing) const;
+  int takeOverAttributes(const OutgoingDocument &outgoing, const PreparedFile &prepared) const;
   ContentsResult exchange(int folder, const std::string &name, PreparedFile &prepared,
                           OutgoingDocument &outgoing) const;
   ContentsResult undoExchange(int folder, const std::string &name, PreparedFile &prepared,

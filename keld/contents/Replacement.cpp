@@ -64,13 +64,23 @@ ContentsResult ContentsStorage::replaceOpened(int folder, const std::string &nam
   if (const ContentsResult removed = removePromise(folder, name); !removed.isDone()) return removed;
   if (!capabilities_.exchange || prepared.kind_ == PreparedFile::Kind::promise)
     return replaceByTakingOut(folder, name, prepared, outgoing);
-  if (prepared.kind_ == PreparedFile::Kind::contents && capabilities_.extendedAttributes) {
-    const bool hasChanged = CopyForeignAttributes(outgoing.descriptor(), prepared.file_.get());
-    if (hasChanged && ::fsync(prepared.file_.get()) != 0) return ContentsResult::failedWith(errno);
-  }
+  if (const int error = takeOverAttributes(outgoing, prepared); error != 0)
+    return ContentsResult::failedWith(error);
   const int error = writeNote(prepared.temporary_, folder, name, outgoing, prepared.facts_);
   if (error != 0) return ContentsResult::failedWith(error);
   return exchange(folder, name, prepared, outgoing);
+}
+
+// What users and programs keep on the document besides its contents (its tags) stays with it.
+int ContentsStorage::takeOverAttributes(const OutgoingDocument &outgoing,
+                                        const PreparedFile &prepared) const {
+  if (!capabilities_.extendedAttributes) return 0;
+  OwnedDescriptor opened;
+  if (!prepared.file_) opened = OpenFileIn(temporaries_.get(), prepared.temporary_, O_RDWR);
+  const int file = prepared.file_ ? prepared.file_.get() : opened.get();
+  if (file < 0) return errno;
+  const bool hasChanged = CopyForeignAttributes(outgoing.descriptor(), file);
+  return hasChanged && ::fsync(file) != 0 ? errno : 0;
 }
 
 // The note is durable. From here to the end the temporary's name may hold the user's file.

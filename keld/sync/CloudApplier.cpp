@@ -10,6 +10,7 @@
 #include <unistd.h>
 
 #include "platform/cloudkit/CKDigest.h"
+#include "tessaly/QVContainer.h"
 #include "tessaly/QVLog.h"
 
 namespace droxa::keld {
@@ -231,7 +232,7 @@ bool CloudApplier::openPlace(const std::string &parentRecord, Place *place) {
   // A container that another device has made.
   const std::string folder = context_.files.absolute(*container);
   ::mkdir(folder.c_str(), 0700);
-  ::mkdir((folder + "/" + kDocumentsName).c_str(), 0755);
+  ::mkdir((folder + "/" + QVDocumentsFolderName(*container)).c_str(), 0755);
   touch(*path);
   place->folder = context_.files.openFolder(*path, &code);
   return static_cast<bool>(place->folder);

@@ -71,7 +71,8 @@ void ConflictCopies::placeRescuedFiles() {
     std::string folderPath = file.folderPath;
     if (!folder) {
       // Its folder is gone; it is kept where the drive's owner finds it.
-      folderPath = std::string(QVUbiquitousDefaultContainerID) + "/" + kDocumentsName;
+      folderPath = std::string(QVUbiquitousDefaultContainerID) + "/" +
+                   QVDocumentsFolderName(QVUbiquitousDefaultContainerID);
       folder = context_.files.openFolder(folderPath, &code);
     }
     if (!folder) continue;

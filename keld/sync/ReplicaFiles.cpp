@@ -4,6 +4,7 @@
 #include <fcntl.h>
 
 #include "keld/sync/DocumentRecord.h"
+#include "tessaly/QVContainer.h"
 
 namespace droxa::keld {
 
@@ -78,7 +79,7 @@ std::optional<std::string> ReplicaFiles::folderPath(const std::string &parentRec
   std::string record = parentRecord;
   for (int depth = 0; depth < kDeepest; ++depth) {
     if (const auto container = ContainerOfRecord(record))
-      return *container + "/" + kDocumentsName + (below.empty() ? "" : "/") + below;
+      return *container + "/" + QVDocumentsFolderName(*container) + (below.empty() ? "" : "/") + below;
     const auto row = store_.byRecord(record);
     if (!row || row->kind != NSFileProviderItemKind::folder) return std::nullopt;
     if (row->item != 0) {

@@ -18,7 +18,8 @@ struct FPTag {
 // The tags of a blob of tag data, in its order; none of an empty blob. What isn't tag data, from the first
 // byte that can't be understood, is passed over: the tags before it are given. Never fails. Any thread.
 std::vector<FPTag> FPGetTagsFromTagsData(const NSData &tagData);
-// The blob of these tags; nil for none.
+// The blob of these tags; nil for none. A tag whose label can't be one (empty, not UTF-8, with control
+// characters, or beyond 65,535 bytes) is left out, and an unknown colour becomes none.
 NSData FPGetTagsDataFromTags(const std::vector<FPTag> &tags);
 
 }  // namespace droxa

@@ -6,6 +6,20 @@
 
 namespace droxa {
 
+NSURL NSUbiquitousItemProviding::itemReplacementDirectoryForURL(const NSURL & /*url*/) {
+  return {};
+}
+
+void NSUbiquitousItemProviding::willDeleteItemAtURL(const NSURL & /*url*/) {}
+
+NSURL NSUbiquitousItemProviding::physicalURLForURL(const NSURL &url) {
+  return url;
+}
+
+NSURL NSUbiquitousItemProviding::physicalURLForName(const NSURL &folder, const std::string &name) {
+  return folder.URLByAppendingPathComponent(name);
+}
+
 struct NSFileManager::State {
   mutable Mutex mutex;
   std::shared_ptr<NSUbiquitousItemProviding> provider GUARDED_BY(mutex);

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <memory>
+#include <string>
 
 #include "platform/foundation/NSError.h"
 #include "platform/foundation/NSURL.h"
@@ -18,6 +19,16 @@ class NSUbiquitousItemProviding {
   virtual NSError evictItemAtURL(const NSURL &url) = 0;
   // Whether there is a document at `url` whose contents aren't here. Asks the file system alone.
   virtual bool isDataless(const NSURL &url) = 0;
+
+  // The folder where work on the item at `url` may be prepared: on the same file system, unseen by others,
+  // and there already. nil: beside the item, under a hidden name.
+  virtual NSURL itemReplacementDirectoryForURL(const NSURL &url);
+  // The person asked for the item at `url` to be deleted, with all below it; it is still there.
+  virtual void willDeleteItemAtURL(const NSURL &url);
+  // What is on the disk for the document at `url`: the url, unless another file stands for it.
+  virtual NSURL physicalURLForURL(const NSURL &url);
+  // Where a file that stands for a document of that name in `folder` would lie; folder/name: none does.
+  virtual NSURL physicalURLForName(const NSURL &folder, const std::string &name);
 };
 
 // Thread contract: any thread.

@@ -43,10 +43,20 @@ interface QVProtocol {
   getMoveCapability @21 (source :Values.Url, destination :Values.Url)
       -> (capability :UInt64, error :Values.Error);
   confirmDeletions @22 (carryOut :Bool) -> (error :Values.Error);
+  setMetadataAtURL @23 (url :Values.Url, change :MetadataChange) -> (error :Values.Error);
 
   struct Information {
     key @0 :Data;
     value @1 :Data;
+  }
+  # What isn't set stays as it is.
+  struct MetadataChange {
+    setsTags @0 :Bool;
+    tags @1 :List(Data);
+    setsLastUsed @2 :Bool;
+    lastUsed @3 :Int64;
+    setsFavoriteRank @4 :Bool;
+    favoriteRank @5 :UInt64;
   }
   struct Container {
     containerID @0 :Data;

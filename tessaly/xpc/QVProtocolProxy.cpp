@@ -134,6 +134,17 @@ void QVProtocolProxy::getContainers(QVContainersReply reply) {
   });
 }
 
+void QVProtocolProxy::setMetadataAtURL(const NSURL &url, const QVItemMetadataChange &change,
+                                       QVErrorReply reply) {
+  call(
+      &Client::setMetadataAtURLRequest,
+      [url, change](auto params, Session &) {
+        setURL(params, url);
+        writeMetadataChange(params.initChange(), change);
+      },
+      std::move(reply), readOutcome);
+}
+
 void QVProtocolProxy::subscribeToNotifications(std::shared_ptr<QVDaemonNotificationReceiving> receiver,
                                                QVErrorReply reply) {
   call(

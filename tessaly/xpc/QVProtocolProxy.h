@@ -27,6 +27,7 @@ class QVProtocolProxy final : public XPCProxy<schema::QVProtocol, QVProtocol, QV
   void getQueryItemForURL(const NSURL &url, bool fakeFSEvent, QVItemReply reply) override;
   void getContainerItem(const std::string &containerID, bool forceScan, QVItemReply reply) override;
   void getContainers(QVContainersReply reply) override;
+  void setMetadataAtURL(const NSURL &url, const QVItemMetadataChange &change, QVErrorReply reply) override;
   void subscribeToNotifications(std::shared_ptr<QVDaemonNotificationReceiving> receiver,
                                 QVErrorReply reply) override;
   void getAccount(QVAccountReply reply) override;

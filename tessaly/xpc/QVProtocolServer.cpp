@@ -143,6 +143,13 @@ kj::Promise<void> QVProtocolServer::getContainers(GetContainersContext context) 
   });
 }
 
+kj::Promise<void> QVProtocolServer::setMetadataAtURL(SetMetadataAtURLContext context) {
+  const auto params = context.getParams();
+  return exported_.serve(
+      context, [url = getURL(params), change = readMetadataChange(params.getChange())](
+                   auto &object, auto reply) { object.setMetadataAtURL(url, change, reply(writeOutcome)); });
+}
+
 kj::Promise<void> QVProtocolServer::subscribeToNotifications(SubscribeToNotificationsContext context) {
   const auto params = context.getParams();
   KJ_REQUIRE(params.hasReceiver(), "a subscription without a receiver");

@@ -27,6 +27,7 @@ class QVProtocolServer final : public schema::QVProtocol::Server {
   kj::Promise<void> getQueryItemForURL(GetQueryItemForURLContext context) override;
   kj::Promise<void> getContainerItem(GetContainerItemContext context) override;
   kj::Promise<void> getContainers(GetContainersContext context) override;
+  kj::Promise<void> setMetadataAtURL(SetMetadataAtURLContext context) override;
   kj::Promise<void> subscribeToNotifications(SubscribeToNotificationsContext context) override;
   kj::Promise<void> getAccount(GetAccountContext context) override;
   kj::Promise<void> signIn(SignInContext context) override;

@@ -76,6 +76,29 @@ QVAccountDescription readAccount(schema::QVProtocol::Account::Reader reader) {
   return account;
 }
 
+void writeMetadataChange(schema::QVProtocol::MetadataChange::Builder builder,
+                         const QVItemMetadataChange &change) {
+  builder.setSetsTags(change.tags.has_value());
+  builder.setSetsLastUsed(change.lastUsed.has_value());
+  builder.setSetsFavoriteRank(change.favoriteRank.has_value());
+  builder.setLastUsed(change.lastUsed.value_or(0));
+  builder.setFavoriteRank(change.favoriteRank.value_or(0));
+  if (!change.tags) return;
+  auto tags = builder.initTags(xpcCount(*change.tags));
+  for (unsigned index = 0; index < tags.size(); ++index) tags.set(index, xpcBytes((*change.tags)[index]));
+}
+
+QVItemMetadataChange readMetadataChange(schema::QVProtocol::MetadataChange::Reader reader) {
+  QVItemMetadataChange change;
+  if (reader.getSetsTags()) {
+    change.tags.emplace();
+    for (const auto tag : reader.getTags()) change.tags->push_back(xpcString(tag));
+  }
+  if (reader.getSetsLastUsed()) change.lastUsed = reader.getLastUsed();
+  if (reader.getSetsFavoriteRank()) change.favoriteRank = reader.getFavoriteRank();
+  return change;
+}
+
 void writeStatus(schema::QVProtocol::Status::Builder builder, const QVDaemonStatus &status) {
   builder.setProcessIdentifier(status.processIdentifier);
   builder.setStartedNanoseconds(status.startedNanoseconds);

@@ -44,6 +44,10 @@ std::optional<QVAccountDescription> getAccount(Reader message) {
   return message.hasAccount() ? std::optional(readAccount(message.getAccount())) : std::nullopt;
 }
 
+void writeMetadataChange(schema::QVProtocol::MetadataChange::Builder builder,
+                         const QVItemMetadataChange &change);
+QVItemMetadataChange readMetadataChange(schema::QVProtocol::MetadataChange::Reader reader);
+
 void writeStatus(schema::QVProtocol::Status::Builder builder, const QVDaemonStatus &status);
 QVDaemonStatus readStatus(schema::QVProtocol::Status::Reader reader);
 

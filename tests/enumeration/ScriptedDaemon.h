@@ -79,6 +79,9 @@ class ScriptedDaemon final : public QVDaemonConnection {
     void getQueryItemForURL(const NSURL &, bool, QVItemReply) override { unexpected(); }
     void getContainerItem(const std::string &, bool, QVItemReply) override { unexpected(); }
     void getContainers(QVContainersReply) override { unexpected(); }
+    void setMetadataAtURL(const NSURL &, const QVItemMetadataChange &, QVErrorReply) override {
+      unexpected();
+    }
     void subscribeToNotifications(std::shared_ptr<QVDaemonNotificationReceiving>, QVErrorReply) override {
       unexpected();
     }

@@ -78,7 +78,7 @@ TEST_F(EnumeratorForContainer, ofAFolderListsAndWatchesIt) {
 }
 
 TEST_F(EnumeratorForContainer, theTrashIsAnOrdinaryFolder) {
-  const std::string path = DroxaProcessHome().replica() + "/" + QVUbiquitousTrashContainerID + "/Documents";
+  const std::string path = DroxaProcessHome().replica() + "/" + QVUbiquitousTrashContainerID + "/files";
   const auto trash = daemon.item(path);
   ASSERT_TRUE(trash);
   enumeratorFor<QVFileEnumerator>(trash->itemIdentifier());

@@ -16,7 +16,8 @@ class PropertiesForURL : public ExtensionTest {
     return "getQueryItemForURL(" + url.path() + ", fakeFSEvent " + (fakeFSEvent ? "1" : "0") + ")";
   }
   static NSURL documentsOf(const std::string &containerID) {
-    return NSURL::fileURLWithPath(DroxaProcessHome().replica() + "/" + containerID + "/Documents");
+    return NSURL::fileURLWithPath(DroxaProcessHome().replica() + "/" + containerID + "/" +
+                                  QVDocumentsFolderName(containerID));
   }
 
   const std::shared_ptr<QVFileProviderExtension> extension = makeExtension();

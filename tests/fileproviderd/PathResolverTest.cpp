@@ -21,7 +21,9 @@ class PathResolverTest : public ::testing::Test {
   }
   ~PathResolverTest() override { std::filesystem::remove_all(replica); }
 
-  std::string documents(const std::string &container) { return replica + "/" + container + "/Documents"; }
+  std::string documents(const std::string &container) {
+    return replica + "/" + container + (container == "com.quorva.Tessaly.trash" ? "/files" : "/Documents");
+  }
   void addContainer(const std::string &identifier, const std::string &container, const std::string &name) {
     std::filesystem::create_directories(documents(container));
     NSFileProviderItemFields fields;

@@ -78,7 +78,7 @@ class KeldFixture {
     return documents(QVUbiquitousDefaultContainerID) + (path.empty() ? "" : "/" + path);
   }
   std::string documents(const std::string &container) const {
-    return replica() + "/" + container + "/Documents";
+    return replica() + "/" + container + "/" + QVDocumentsFolderName(container);
   }
   void write(const std::string &path, const std::string &contents = "x") {
     std::ofstream(at(path), std::ios::binary | std::ios::trunc) << contents;

@@ -60,6 +60,23 @@ void FakeDaemon::getContainerItem(const std::string &containerID, bool forceScan
   replies_->give("getContainerItem", [=, reply = std::move(reply)] { reply(found, error); });
 }
 
+void FakeDaemon::setMetadataAtURL(const NSURL &url, const QVItemMetadataChange &change, QVErrorReply reply) {
+  NSError error = begin("setMetadataAtURL", url.path());
+  std::vector<FakeDriveChange> changes;
+  QVItemMetadataChange kept = change;
+  if (!error && kept.tags) error = QVNormalizeTagNames(&*kept.tags);
+  if (!error) {
+    const Lock lock(mutex_);
+    const std::uint64_t number = url.path().empty() ? 0 : drive_.numberAtPath(url.path());
+    if (number == 0)
+      error = qvc_errorNoSuchItem(url.path());
+    else
+      drive_.setMetadata(number, kept, changes);
+  }
+  tellSenders(changes);
+  replies_->give("setMetadataAtURL", [=, reply = std::move(reply)] { reply(error); });
+}
+
 void FakeDaemon::getContainers(QVContainersReply reply) {
   const NSError error = begin("getContainers", "");
   std::vector<QVContainerDescription> containers;

@@ -137,6 +137,10 @@ class FakeDaemonProxy final : public QVProtocol {
     if (failed("getContainers")) return;
     daemon_->getContainers(tracked(std::move(reply)));
   }
+  void setMetadataAtURL(const NSURL &url, const QVItemMetadataChange &change, QVErrorReply reply) override {
+    if (failed("setMetadataAtURL")) return;
+    daemon_->setMetadataAtURL(url, change, tracked(std::move(reply)));
+  }
   void subscribeToNotifications(std::shared_ptr<QVDaemonNotificationReceiving> receiver,
                                 QVErrorReply reply) override {
     if (failed("subscribeToNotifications")) return;

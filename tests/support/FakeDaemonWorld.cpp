@@ -10,7 +10,7 @@ FakeDaemonWorld::FakeDaemonWorld(Carry carry) : fake_(FakeDaemon::make("/replica
 FakeDaemonWorld::~FakeDaemonWorld() = default;
 
 NSURL FakeDaemonWorld::documents(const std::string &containerID) {
-  return NSURL::fileURLWithPath("/replica/" + containerID + "/Documents");
+  return NSURL::fileURLWithPath("/replica/" + containerID + "/" + QVDocumentsFolderName(containerID));
 }
 
 void FakeDaemonWorld::makeFile(const NSURL &url, std::size_t size) {

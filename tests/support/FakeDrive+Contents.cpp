@@ -20,6 +20,15 @@ std::vector<std::uint64_t> FakeDrive::documentsAt(std::uint64_t number) const {
   return documents;
 }
 
+void FakeDrive::setMetadata(std::uint64_t number, const QVItemMetadataChange &change,
+                            std::vector<FakeDriveChange> &changes) {
+  Node &node = nodes_.at(number);
+  const QVItemMetadata metadata = change.appliedTo(node.metadata);
+  if (metadata == node.metadata) return;
+  node.metadata = metadata;
+  touch(number, changes);
+}
+
 void FakeDrive::touch(std::uint64_t number, std::vector<FakeDriveChange> &changes) {
   bump(nodes_.at(number));
   changes.push_back({item(number), foldersAbove(number), foldersAbove(number)});

@@ -163,7 +163,7 @@ std::uint64_t FakeDrive::numberAtPath(const std::string &path) const {
   if (!path.empty() && path[0] == '/') {
     number = 0;
     for (const auto &entry : containers_) {
-      const std::string folder = replica_ + "/" + entry.first + "/Documents";
+      const std::string folder = replica_ + "/" + entry.first + "/" + QVDocumentsFolderName(entry.first);
       if (path != folder && path.compare(0, folder.size() + 1, folder + "/") != 0) continue;
       number = entry.second;
       rest = path == folder ? std::string() : path.substr(folder.size() + 1);
@@ -202,7 +202,8 @@ std::shared_ptr<const QVQueryItem> FakeDrive::item(std::uint64_t number) const {
 
 NSURL FakeDrive::url(std::uint64_t number) const {
   const Node &node = nodes_.at(number);
-  if (node.isContainer) return NSURL::fileURLWithPath(replica_ + "/" + node.name + "/Documents");
+  if (node.isContainer)
+    return NSURL::fileURLWithPath(replica_ + "/" + node.name + "/" + QVDocumentsFolderName(node.name));
   return url(node.parent).URLByAppendingPathComponent(node.name);
 }
 
@@ -305,6 +306,9 @@ std::shared_ptr<const QVQueryItem> FakeDrive::itemOf(const Node &node) const {
   fields.isTrashed = !node.isContainer && containerOf(node) == QVUbiquitousTrashContainerID;
   fields.isExcludedFromSync = isExcluded(node);
   fields.isDownloaded = !node.contents.isDataless;
+  const std::int64_t lastUsed = node.metadata.lastUsed;
+  if (lastUsed != 0) fields.lastUsedDate = NSDate::dateWithNanosecondsSince1970(lastUsed);
+  fields.favoriteRank = node.metadata.favoriteRank;
   return std::make_shared<const QVQueryItem>(fileObjectID, std::move(fields));
 }
 

@@ -67,6 +67,8 @@ class FakeDrive {
   bool exists(std::uint64_t number) const { return nodes_.count(number) != 0; }
   // A document, or those below a folder.
   std::vector<std::uint64_t> documentsAt(std::uint64_t number) const;
+  void setMetadata(std::uint64_t number, const QVItemMetadataChange &change,
+                   std::vector<FakeDriveChange> &changes);
   // The item's properties changed, but not its contents.
   void touch(std::uint64_t number, std::vector<FakeDriveChange> &changes);
 
@@ -108,6 +110,7 @@ class FakeDrive {
     bool isContainer = false;
     bool readable = true;
     Contents contents;
+    QVItemMetadata metadata;
   };
 
   std::optional<std::pair<std::uint64_t, std::string>> parentAndName(const std::string &path) const;

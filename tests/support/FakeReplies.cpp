@@ -33,6 +33,7 @@ void FakeReplies::checkName(const std::string &operation) {
       "getQueryItemForURL",
       "getContainerItem",
       "getContainers",
+      "setMetadataAtURL",
       "subscribeToNotifications",
       "getAccount",
       "signIn",

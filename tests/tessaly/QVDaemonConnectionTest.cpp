@@ -109,8 +109,9 @@ TEST(SyncProxy, everyOperationWaitsForItsAnswer) {
   there.waitForUploadAtURL(daemon->url("a"), reply);
   there.getMoveCapability(daemon->url("a"), daemon->url(""), reply);
   there.confirmDeletions(true, reply);
-  EXPECT_EQ(replies, 23);
-  EXPECT_EQ(daemon->calls().size(), 23U);
+  there.setMetadataAtURL(daemon->url("a"), {}, reply);
+  EXPECT_EQ(replies, 24);
+  EXPECT_EQ(daemon->calls().size(), 24U);
 }
 
 }  // namespace droxa

@@ -31,7 +31,8 @@ TEST(UnreachableDaemon, everyCallFailsOnceAndNeverReplies) {
   daemon->waitForUploadAtURL(NSURL(), reply);
   daemon->getMoveCapability(NSURL(), NSURL(), reply);
   daemon->confirmDeletions(true, reply);
-  EXPECT_EQ(failures, 23);
+  daemon->setMetadataAtURL(NSURL(), {}, reply);
+  EXPECT_EQ(failures, 24);
 }
 
 }  // namespace droxa

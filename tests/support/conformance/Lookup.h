@@ -103,6 +103,43 @@ TEST_P(DaemonConformance, aFakedEventShowsANewItemAtOnce) {
   EXPECT_EQ(found.value<0>()->fields().filename, "new");
 }
 
+TEST_P(DaemonConformance, whatIsNotedOnAnItemIsShownWithANewRank) {
+  file("a");
+  folder("f");
+  world_->makeAlias(at("alias"), at("a"));
+  settle();
+  for (const char *path : {"a", "f", "alias"}) {
+    const std::uint64_t before = rank();
+    Once<NSError> done(std::string("metadata of ") + path);
+    daemon()->setMetadataAtURL(at(path), {{{"Red"}}, 1'700'000'000'000'000'001, 7}, done.completion());
+    ASSERT_EQ(done.value<0>(), NSError()) << path;
+    const Item noted = item(path);
+    EXPECT_EQ(noted->fields().lastUsedDate, NSDate::dateWithNanosecondsSince1970(1'700'000'000'000'000'001));
+    EXPECT_EQ(noted->fields().favoriteRank, 7U);
+    EXPECT_GT(noted->fields().changeRank, before);
+  }
+  Once<NSError> rankAlone("the rank alone");
+  daemon()->setMetadataAtURL(at("alias"), {{}, {}, 0}, rankAlone.completion());
+  ASSERT_EQ(rankAlone.value<0>(), NSError());
+  EXPECT_EQ(item("alias")->fields().favoriteRank, 0U);
+  EXPECT_TRUE(item("alias")->fields().lastUsedDate);
+  EXPECT_EQ(item("a")->fields().favoriteRank, 7U) << "an alias's own was set on its target";
+}
+
+TEST_P(DaemonConformance, whatCantBeNotedIsRefused) {
+  file("a");
+  settle();
+  Once<NSError> comma("a tag with a comma");
+  daemon()->setMetadataAtURL(at("a"), {{{"a,b"}}, {}, 7}, comma.completion());
+  EXPECT_EQ(tessalyCode(comma.value<0>()), QVErrorInvalidArgument);
+  EXPECT_EQ(item("a")->fields().favoriteRank, 0U);
+  for (const NSURL &url : {at("missing"), NSURL::fileURLWithPath("/etc/hostname"), NSURL()}) {
+    Once<NSError> missing("metadata of nothing");
+    daemon()->setMetadataAtURL(url, {{{"Red"}}, {}, {}}, missing.completion());
+    EXPECT_EQ(tessalyCode(missing.value<0>()), QVErrorNoSuchItem) << url.path();
+  }
+}
+
 TEST_P(DaemonConformance, theContainersAreTold) {
   settle();
   Once<std::vector<QVContainerDescription>, NSError> answer("containers");
