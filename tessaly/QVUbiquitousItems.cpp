@@ -7,6 +7,7 @@
 
 #include "platform/foundation/NSFileManager.h"
 #include "tessaly/QVDaemonConnection.h"
+#include "tessaly/QVLog.h"
 
 namespace droxa {
 
@@ -26,6 +27,13 @@ class DaemonItems final : public NSUbiquitousItemProviding {
     return daemon->error();
   }
   bool isDataless(const NSURL &url) override { return qv_isDataless(url); }
+  // Where it can't be told, the deletion is one like any other.
+  void willDeleteItemAtURL(const NSURL &url) override {
+    const auto daemon = QVDaemonConnection::defaultConnection()->newSyncProxy();
+    (*daemon)->allowDeletionAtURL(url, [&](const NSError &error) { daemon->setObjResult({}, error); });
+    if (const NSError error = daemon->error())
+      os_log_error(qvc_default_log(), "[ERROR] the deletion of %s can't be announced: %@", url.path(), error);
+  }
 };
 
 }  // namespace

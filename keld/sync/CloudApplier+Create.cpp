@@ -8,6 +8,7 @@
 
 #include "keld/sync/CloudApplier.h"
 #include "keld/sync/ConflictName.h"
+#include "keld/sync/PutBackNotes.h"
 #include "platform/foundation/NSDate.h"
 #include "tessaly/QVLog.h"
 
@@ -48,6 +49,19 @@ void CloudApplier::create(const DocumentRecord &document, const Place &place, Sy
   if (made && row.item != 0) context_.states.show({row.item, row.isDataless, true, row.local, isDocument});
 }
 
+// What the file that is there now is to bear.
+void CloudApplier::placed(const DocumentRecord &document, const Place &place, const std::string &name,
+                          SyncRow *row) {
+  noteTrash(document, name);
+  row->metadata = {};
+  const bool sendsMetadata = applyMetadata(document, place.folder.get(), name, {}, row);
+  if (sendsMetadata && row->item != 0) context_.store.enqueue(row->item, false, false);
+}
+
+void CloudApplier::noteTrash(const DocumentRecord &document, const std::string &name) {
+  if (document.putBack) PutBackNotes(context_.files, context_.store).write(name, *document.putBack);
+}
+
 // Has `put` try the record's name, and others where that one is somebody else's.
 bool CloudApplier::putAtFreeName(const DocumentRecord &document, const Place &place, SyncRow *row,
                                  const std::function<ContentsOutcome(const std::string &name)> &put) {
@@ -56,11 +70,15 @@ bool CloudApplier::putAtFreeName(const DocumentRecord &document, const Place &pl
     const ContentsOutcome outcome = put(name);
     if (outcome == ContentsOutcome::done) {
       touch(place.folderPath + "/" + name);
+      placed(document, place, name, row);
       return true;
     }
     if (outcome != ContentsOutcome::nameTaken) return false;
     const Taken taken = resolveTaken(document, place, name, row);
-    if (taken == Taken::isIt) return true;
+    if (taken == Taken::isIt) {
+      placed(document, place, name, row);
+      return true;
+    }
     if (taken == Taken::useOtherName)
       name = ConflictName(document.name, document.device, NSDate::now().nanosecondsSince1970(), attempt);
   }

@@ -66,6 +66,13 @@ class CloudApplier {
   bool createFolder(const DocumentRecord &document, const Place &place, SyncRow *row);
   bool createLink(const DocumentRecord &document, const Place &place, SyncRow *row);
   bool createDocument(const DocumentRecord &document, const Place &place, SyncRow *row);
+  // Something is in the trash under that name now.
+  void noteTrash(const DocumentRecord &document, const std::string &name);
+  // Writes what users note onto the file, unless it was changed here since the cloud was told of it. Whether
+  // the cloud has to be told what is here. A link bears nothing.
+  bool applyMetadata(const DocumentRecord &document, int folder, const std::string &name, ItemMetadata here,
+                     SyncRow *row);
+  void placed(const DocumentRecord &document, const Place &place, const std::string &name, SyncRow *row);
   bool putAtFreeName(const DocumentRecord &document, const Place &place, SyncRow *row,
                      const std::function<ContentsOutcome(const std::string &name)> &put);
   // Something has the name already: whether it is the document itself, or was moved out of the way.

@@ -10,7 +10,8 @@ namespace {
 
 #define ROW_COLUMNS                                                                                        \
   "record, item, tag, parent, name, kind, size, modified, digest, mode, inode, localSize, localModified, " \
-  "localChanged, dataless, newerTag, newerSize, newerModified, newerDigest, newerMode"
+  "localChanged, dataless, newerTag, newerSize, newerModified, newerDigest, newerMode, tags, lastUsed, "   \
+  "favoriteRank"
 
 }  // namespace
 
@@ -33,6 +34,7 @@ SyncRow SyncStore::read(const SqlStatement &row) {
   result.newer.modified = row.integer(17);
   result.newer.digest = row.bytes(18);
   result.newer.mode = static_cast<std::uint32_t>(row.integer(19));
+  result.metadata = {QVDecodeTagNames(row.bytes(20)), row.integer(21), row.number(22)};
   return result;
 }
 
@@ -114,11 +116,12 @@ void SyncStore::put(const SyncRow &row) {
   }
   SqlStatement &put = statement(
       "INSERT INTO rows(" ROW_COLUMNS
-      ") VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13, ?14, ?15, ?16, ?17, ?18, ?19, ?20)"
+      ") VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8, ?9, ?10, ?11, ?12, ?13, ?14, ?15, ?16, ?17, ?18, ?19, ?20, "
+      "?21, ?22, ?23)"
       " ON CONFLICT(record) DO UPDATE SET item = ?2, tag = ?3, parent = ?4, name = ?5, kind = ?6, size = ?7,"
       " modified = ?8, digest = ?9, mode = ?10, inode = ?11, localSize = ?12, localModified = ?13,"
       " localChanged = ?14, dataless = ?15, newerTag = ?16, newerSize = ?17, newerModified = ?18,"
-      " newerDigest = ?19, newerMode = ?20");
+      " newerDigest = ?19, newerMode = ?20, tags = ?21, lastUsed = ?22, favoriteRank = ?23");
   put.bindText(1, row.record).bind(2, row.item).bindText(3, row.tag).bindText(4, row.parent);
   put.bindBlob(5, row.name).bind(6, static_cast<std::int64_t>(row.kind));
   put.bind(7, row.content.size).bind(8, row.content.modified).bindText(9, row.content.digest);
@@ -126,7 +129,8 @@ void SyncStore::put(const SyncRow &row) {
   put.bind(12, row.local.size).bind(13, row.local.modified).bind(14, row.local.changed);
   put.bind(15, static_cast<std::int64_t>(row.isDataless)).bindText(16, row.newerTag);
   put.bind(17, row.newer.size).bind(18, row.newer.modified).bindText(19, row.newer.digest);
-  put.bind(20, static_cast<std::int64_t>(row.newer.mode));
+  put.bind(20, static_cast<std::int64_t>(row.newer.mode)).bindText(21, QVEncodeTagNames(row.metadata.tags));
+  put.bind(22, row.metadata.lastUsed).bind(23, row.metadata.favoriteRank);
   put.run();
 }
 
@@ -159,6 +163,7 @@ void SyncStore::unbindAll() {
     database_.execute("DELETE FROM rows WHERE tag = '' AND item <> 0");
     database_.execute("UPDATE rows SET item = 0");
     database_.execute("DELETE FROM uploads");
+    database_.execute("DELETE FROM meant");
   });
 }
 

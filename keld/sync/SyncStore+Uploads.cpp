@@ -141,17 +141,41 @@ std::uint64_t SyncStore::countHeld() {
 }
 
 std::uint64_t SyncStore::countDeletions() {
-  return count("SELECT count(*) FROM uploads WHERE deletion = 1");
+  return count("SELECT count(*) FROM uploads WHERE deletion = 1 AND item NOT IN (SELECT item FROM meant)");
 }
 
 void SyncStore::holdDeletions() {
   const RecursiveLock lock(mutex_);
-  statement("UPDATE uploads SET held = 1 WHERE deletion = 1").run();
+  statement("UPDATE uploads SET held = 1 WHERE deletion = 1 AND item NOT IN (SELECT item FROM meant)").run();
 }
 
 void SyncStore::releaseHeld() {
   const RecursiveLock lock(mutex_);
   statement("UPDATE uploads SET held = 0 WHERE held = 1").run();
+}
+
+// --- Deletions that were asked for.
+
+void SyncStore::allowDeletions(const std::vector<ItemNumber> &items) {
+  const RecursiveLock lock(mutex_);
+  transaction([&]() NO_THREAD_SAFETY_ANALYSIS {
+    for (const ItemNumber item : items)
+      statement("INSERT OR IGNORE INTO meant VALUES (?)").bind(1, item).run();
+  });
+}
+
+bool SyncStore::isDeletionAllowed(ItemNumber item) {
+  const RecursiveLock lock(mutex_);
+  SqlStatement &asked = statement("SELECT 1 FROM meant WHERE item = ?");
+  asked.bind(1, item);
+  const bool found = asked.step();
+  asked.reset();
+  return found;
+}
+
+void SyncStore::forgetAllowedDeletion(ItemNumber item) {
+  const RecursiveLock lock(mutex_);
+  statement("DELETE FROM meant WHERE item = ?").bind(1, item).run();
 }
 
 // --- Pins.

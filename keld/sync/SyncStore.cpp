@@ -69,8 +69,16 @@ CREATE TABLE unfinished(
 ) WITHOUT ROWID;
 )sql";
 
+// Deletions that a person asked for; and what users note on items.
+constexpr char kMeant[] = R"sql(
+CREATE TABLE meant(item INTEGER PRIMARY KEY);
+ALTER TABLE rows ADD COLUMN tags TEXT NOT NULL DEFAULT '';
+ALTER TABLE rows ADD COLUMN lastUsed INTEGER NOT NULL DEFAULT 0;
+ALTER TABLE rows ADD COLUMN favoriteRank INTEGER NOT NULL DEFAULT 0;
+)sql";
+
 // Each step leads from the version of its place to the next; version 0 is an empty database.
-constexpr const char *kSteps[] = {kTables, kUnfinished};
+constexpr const char *kSteps[] = {kTables, kUnfinished, kMeant};
 
 }  // namespace
 

@@ -47,6 +47,7 @@ struct SyncRow {
   ContentVersion content;
   LocalFile local;
   bool isDataless = false;
+  ItemMetadata metadata;
   // A newer version that is to replace the local contents; digest "" when there is none.
   std::string newerTag;
   ContentVersion newer;
@@ -143,10 +144,15 @@ class SyncStore {
   std::uint64_t countQueued();
   std::uint64_t countFailed();
   std::uint64_t countHeld();
-  std::uint64_t countDeletions();
-  void holdDeletions();  // all that wait
+  std::uint64_t countDeletions();  // that nobody is known to have asked for
+  void holdDeletions();            // all that wait
   void releaseHeld();
   std::vector<QueuedUpload> held(std::uint64_t limit);
+
+  // Deletions that a person asked for, before the items died; they are never held.
+  void allowDeletions(const std::vector<ItemNumber> &items);
+  bool isDeletionAllowed(ItemNumber item);
+  void forgetAllowedDeletion(ItemNumber item);
 
   // Pins, by item.
   void setPinned(ItemNumber item, bool isPinned);

@@ -1,5 +1,7 @@
 #include "tests/support/FakeDaemonWorld.h"
 
+#include "tessaly/QVContainer.h"
+
 namespace droxa {
 
 FakeDaemonWorld::FakeDaemonWorld(Carry carry) : fake_(FakeDaemon::make("/replica")) {
