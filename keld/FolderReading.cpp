@@ -69,6 +69,10 @@ void NameList::sort() {
   std::sort(slices_.begin(), slices_.end(), [bytes](const Slice &a, const Slice &b) {
     return bytes.substr(a.offset, a.length) < bytes.substr(b.offset, b.length);
   });
+  const auto end = std::unique(slices_.begin(), slices_.end(), [bytes](const Slice &a, const Slice &b) {
+    return bytes.substr(a.offset, a.length) == bytes.substr(b.offset, b.length);
+  });
+  slices_.erase(end, slices_.end());
 }
 
 std::optional<FileFacts> ReadFileFacts(int folder, const std::string &name, std::uint64_t ownDevice) {

@@ -30,7 +30,7 @@ class OwnedDescriptor {
 class NameList {
  public:
   void add(std::string_view name);
-  void sort();  // by byte order
+  void sort();  // by byte order; each name once
   std::size_t size() const { return slices_.size(); }
   std::string_view operator[](std::size_t index) const {
     return std::string_view(bytes_).substr(slices_[index].offset, slices_[index].length);

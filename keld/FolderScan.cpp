@@ -40,6 +40,7 @@ void Reconciler::scan(ItemNumber folder) {
     return;
   }
   setUnreadable(folder, false);
+  if (showsPromises_) names = documentNames(folder, descriptor->get(), names);
   if (bulkLoading_ && folder != kReplicaFolder && !queries_.hasChildren(folder))
     readUnknownFolder(folder, *descriptor, names);
   else

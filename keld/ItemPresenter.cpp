@@ -52,6 +52,7 @@ std::shared_ptr<const QVQueryItem> ItemPresenter::item(const ItemRecord &record)
   fields.isUploaded = (record.flags & kUploadedFlag) != 0;
   if (record.metadata.lastUsed != 0)
     fields.lastUsedDate = NSDate::dateWithNanosecondsSince1970(record.metadata.lastUsed);
+  if (!record.metadata.tags.empty()) fields.tagData = QVTagDataOfNames(record.metadata.tags);
   fields.favoriteRank = record.metadata.favoriteRank;
   return std::make_shared<const QVQueryItem>(fileObjectID, std::move(fields));
 }

@@ -39,6 +39,7 @@ struct FileFacts {
   std::uint64_t inode = 0;
   std::uint64_t device = 0;  // 0: the replica's own, whose number may change from boot to boot
   std::uint64_t links = 1;   // not kept in the database
+  bool isPromise = false;    // a promise stands for the document; not kept in the database
   std::uint64_t size = 0;
   std::int64_t birth = 0;  // nanoseconds since 1970; 0 where the file system doesn't tell
   std::int64_t modified = 0;

@@ -7,6 +7,7 @@
 
 #include "keld/Schema.h"
 #include "platform/dispatch/dispatch.h"
+#include "tessaly/QVContainer.h"
 #include "tessaly/QVLog.h"
 
 namespace droxa::keld {
@@ -49,7 +50,10 @@ Keeper::Keeper(std::unique_ptr<SqlDatabase> database, std::string databasePath,
       queries_(std::make_unique<ItemQueries>(*database_)),
       edits_(std::make_unique<ItemEdits>(*database_)),
       opener_(std::make_unique<FolderOpener>(replicaPath, *queries_)),
-      reconciler_(std::make_unique<Reconciler>(*queries_, *edits_, *opener_)) {}
+      reconciler_(std::make_unique<Reconciler>(*queries_, *edits_, *opener_)),
+      trashNotes_(replicaPath) {
+  reconciler_->setShowsPromises(options_.showsPromises);
+}
 
 Keeper::~Keeper() {
   stop();
@@ -284,6 +288,7 @@ void Keeper::step(Work &work) {
     scannedThrough_ = std::max<ItemNumber>(scannedThrough_, walkedThrough_);
   const auto after = containers_.current();
   if (!changes.empty()) listener_.itemsChanged({0, std::move(changes), before, after}, *queries_);
+  lookAfterTrash();
   if (isAdvanced) listener_.feedAdvanced();
   if (containers.list) listener_.containerListChanged();
   for (auto &job : std::exchange(work.jobs, {})) dispatch_async_global(std::move(job.second));
@@ -348,10 +353,20 @@ void Keeper::endWalk() {
   nextWalk_ = Clock::now() + std::max(options_.scanInterval, took * 10);
   if (walkedOnce_) return;
   walkedOnce_ = true;
+  trashNotes_.removeOrphans();
   const Counters &counters = edits_->counters();
   os_log_info(qvc_default_log(),
               "[INFO] looked at the whole replica in %lld ms: %llu documents, %llu folders",
               static_cast<long long>(took.count()), counters.documents, counters.folders);
+}
+
+void Keeper::lookAfterTrash() {
+  const ContainerEntry *trash = containers_.current()->byID(QVUbiquitousTrashContainerID);
+  std::vector<std::string> left;
+  for (Reconciler::Place &place : reconciler_->takePlacesLeftInTrash())
+    if (trash && place.folder == trash->documents) left.push_back(std::move(place.name));
+  trashNotes_.itemsLeft(left);
+  trashNotes_.removeThose();
 }
 
 ContainerList::Changes Keeper::refreshContainers(const std::vector<ItemChange> &changes, bool always) {

@@ -19,6 +19,7 @@
 #include "keld/ItemQueries.h"
 #include "keld/Reconciler.h"
 #include "keld/ReplicaWatcher.h"
+#include "keld/TrashNotes.h"
 #include "platform/foundation/ThreadSafety.h"
 
 namespace droxa::keld {
@@ -27,6 +28,7 @@ struct KeeperOptions {
   WatcherKind watcher = WatcherKind::best;
   std::chrono::milliseconds scanInterval{2000};  // where scanning has to stand in for watching
   std::uint64_t mostTombstones = 200000;
+  bool showsPromises = false;  // see Reconciler
 };
 
 // Looks at what is at this path now, and at the folders on the way to it. In a job of the keeper's.
@@ -94,6 +96,7 @@ class Keeper final : public ReplicaWatcherSink {
   bool hasFoldersToWalk();
   void endWalk();
   ContainerList::Changes refreshContainers(const std::vector<ItemChange> &changes, bool always);
+  void lookAfterTrash();
   void finishBulkLoad();
   void fail(const std::string &why);
 
@@ -107,6 +110,7 @@ class Keeper final : public ReplicaWatcherSink {
   std::unique_ptr<ItemEdits> edits_;
   std::unique_ptr<FolderOpener> opener_;
   std::unique_ptr<Reconciler> reconciler_;
+  TrashNotes trashNotes_;
   ItemNumber walkedThrough_ = 0;
   bool walkingAll_ = true;   // the walk under way began at the first folder
   bool walkedOnce_ = false;  // the walk since the start has ended; firstWalkDone_ once that is committed

@@ -8,6 +8,8 @@
 
 #include "keld/KeldSession.h"
 #include "keld/Schema.h"
+#include "keld/TrashNotes.h"
+#include "keld/contents/ContentsStorage.h"
 #include "keld/sync/DeviceName.h"
 #include "platform/cloudkit/EmbeddedCloud.h"
 #include "platform/foundation/NSDate.h"
@@ -33,6 +35,8 @@ std::shared_ptr<Keld> Keld::start(const DroxaHome &home, KeldOptions options, st
   std::shared_ptr<Keld> daemon(new Keld(home, std::move(options)));
   daemon->lock_ = HomeLock::take(home.run() + "/keld.lock", problem);
   if (!daemon->lock_) return nullptr;
+  *problem = MoveTrashOfOldLayout(daemon->replicaPath_);
+  if (!problem->empty()) return nullptr;
   *problem = MakeBuiltInContainers(daemon->replicaPath_);
   if (!problem->empty()) return nullptr;
   try {
@@ -49,7 +53,9 @@ std::shared_ptr<Keld> Keld::start(const DroxaHome &home, KeldOptions options, st
 void Keld::open() {
   OpenedDatabase opened = DatabaseOpen(databasePath_);
   const bool wasDamaged = !opened.damagedCopy.empty();
-  keeper_ = std::make_unique<Keeper>(std::move(opened.database), databasePath_, replicaPath_, options_.keeper,
+  KeeperOptions keeperOptions = options_.keeper;
+  keeperOptions.showsPromises = replicaHasPromises();
+  keeper_ = std::make_unique<Keeper>(std::move(opened.database), databasePath_, replicaPath_, keeperOptions,
                                      containers_, *this);
   readers_ = std::make_unique<ReaderPool>(databasePath_);
   account_ = std::make_unique<AccountKeeper>(
@@ -60,6 +66,13 @@ void Keld::open() {
   if (error) os_log_error(qvc_default_log(), "[ERROR] can't read the account: %@", error);
   offerLocalAccount(!wasDamaged && !error);
   accountChanged();
+}
+
+// Asked before the keeper looks at anything; whether the storage can be opened is the sync's to tell.
+bool Keld::replicaHasPromises() const {
+  int error = 0;
+  const auto storage = ContentsStorage::open(replicaPath_, options_.sync.contents, &error);
+  return storage && storage->form() == DatalessForm::promise;
 }
 
 void Keld::openSync() {

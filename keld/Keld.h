@@ -82,6 +82,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   Keld(const DroxaHome &home, KeldOptions options);
   void open();
   void openSync();
+  bool replicaHasPromises() const;
   void offerLocalAccount(bool mayOffer);
   std::string identifierForAccount(const std::string &name);
   void performAndWait(const std::function<void(ItemEdits &edits)> &edit);

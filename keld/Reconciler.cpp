@@ -39,7 +39,7 @@ bool Reconciler::isAlias(ItemNumber folder, const std::string &name) {
 std::optional<FileFacts> Reconciler::readFacts(ItemNumber folder, const OwnedDescriptor &descriptor,
                                                const std::string &name,
                                                const std::optional<ItemRecord> &known) {
-  auto facts = ReadFileFacts(descriptor.get(), name, opener_.replicaDevice());
+  auto facts = readFileOrPromise(descriptor.get(), name);
   if (!facts || facts->kind != NSFileProviderItemKind::symbolicLink) return facts;
   // A link's target never changes, so that what the table knows of the same link still holds.
   if (known && known->facts.kind == NSFileProviderItemKind::alias) {
@@ -56,8 +56,9 @@ void Reconciler::look(ItemNumber folder, const std::string &name) {
   int error = 0;
   const auto descriptor = opener_.open(folder, &error);
   if (!descriptor) return;  // its own folder's hint tells what became of it
-  auto facts = readFacts(folder, *descriptor, name, queries_.byName(folder, name));
-  observe(folder, name, facts);
+  const auto document = documentName(folder, descriptor->get(), name);
+  if (!document) return;
+  observe(folder, *document, readFacts(folder, *descriptor, *document, queries_.byName(folder, *document)));
 }
 
 void Reconciler::observe(ItemNumber folder, const std::string &name, std::optional<FileFacts> facts) {
@@ -139,7 +140,7 @@ bool Reconciler::isStillThere(const ItemRecord &record) {
   int error = 0;
   const auto folder = opener_.open(record.parent, &error);
   if (!folder) return false;
-  const auto facts = ReadFileFacts(folder->get(), record.name, opener_.replicaDevice());
+  const auto facts = readFileOrPromise(folder->get(), record.name);
   return facts && facts->inode == record.facts.inode && facts->birth == record.facts.birth;
 }
 
@@ -150,8 +151,7 @@ bool Reconciler::leavesItsName(const ItemRecord &record, const Observation &obse
     return false;
   int error = 0;
   const auto folder = opener_.open(record.parent, &error);
-  const auto facts =
-      folder ? ReadFileFacts(folder->get(), record.name, opener_.replicaDevice()) : std::nullopt;
+  const auto facts = folder ? readFileOrPromise(folder->get(), record.name) : std::nullopt;
   if (!facts || facts->kind != NSFileProviderItemKind::document) return false;
   observe(record.parent, record.name, facts);
   return true;
@@ -199,6 +199,7 @@ void Reconciler::insertNew(const Observation &observation, std::uint32_t flags, 
 
 // A placeholder is never shown as a document whose contents are here, not even before the sync has seen it.
 bool Reconciler::isDataless(ItemNumber folder, const std::string &name, const FileFacts &facts) {
+  if (facts.isPromise) return true;
   if (facts.kind != NSFileProviderItemKind::document || facts.size == 0) return false;
   int error = 0;
   const auto descriptor = opener_.open(folder, &error);
@@ -223,6 +224,7 @@ void Reconciler::move(ItemRecord record, const Observation &observation, std::ui
     if (const auto folder = opener_.open(origin.parent, &error))
       observe(origin.parent, origin.name, readFacts(origin.parent, *folder, origin.name, std::nullopt));
   }
+  if (!wasInLimbo && record.zone() == Zone::trashed) leftInTrash_.push_back({origin.parent, origin.name});
   limboOrigins_.erase(record.id);
   edits_.rename(record, observation.folder, observation.name);
   const bool wasPrivate = record.zone() == Zone::privateStorage;
@@ -310,6 +312,7 @@ void Reconciler::setSyncFlags(ItemNumber id, std::uint32_t flags) {
 
 void Reconciler::putIntoLimbo(ItemRecord record) {
   touched_.push_back(record.parent);
+  if (record.zone() == Zone::trashed) leftInTrash_.push_back({record.parent, record.name});
   limboOrigins_[record.id] = {record.parent, record.name};
   recentLimbo_.push_back(record.id);
   edits_.rename(record, kLimboFolder, std::to_string(record.id));

@@ -38,6 +38,8 @@ class Reconciler {
 
   // Without identity search, while the table is filled for the first time.
   void setBulkLoading(bool bulkLoading) { bulkLoading_ = bulkLoading; }
+  // In a replica without extended attributes, promises stand for documents (keld/contents/PromiseFile.h).
+  void setShowsPromises(bool showsPromises) { showsPromises_ = showsPromises; }
   // Called with each folder that is about to be read, and with each that died.
   void setFolderCallbacks(std::function<void(ItemNumber, int)> appeared,
                           std::function<void(ItemNumber)> vanished);
@@ -52,6 +54,12 @@ class Reconciler {
   // What is missing now isn't recent any more: the walk may yet find it elsewhere.
   void keepMissing() { recentLimbo_.clear(); }
 
+  // The places that trashed items have left since the last call.
+  struct Place {
+    ItemNumber folder = 0;
+    std::string name;
+  };
+  std::vector<Place> takePlacesLeftInTrash() { return std::exchange(leftInTrash_, {}); }
   // What happened since the last call, in order.
   std::vector<ItemChange> takeChanges();
   std::size_t changeCount() const { return changes_.size(); }
@@ -80,6 +88,9 @@ class Reconciler {
     std::string name;
   };
 
+  std::optional<FileFacts> readFileOrPromise(int folder, const std::string &name) const;
+  std::optional<std::string> documentName(ItemNumber folder, int descriptor, const std::string &name);
+  NameList documentNames(ItemNumber folder, int descriptor, const NameList &names);
   std::optional<FileFacts> readFacts(ItemNumber folder, const OwnedDescriptor &descriptor,
                                      const std::string &name, const std::optional<ItemRecord> &known);
   bool isAlias(ItemNumber folder, const std::string &name);
@@ -116,6 +127,7 @@ class Reconciler {
   std::function<void(ItemNumber)> folderVanished_;
 
   bool bulkLoading_ = false;
+  bool showsPromises_ = false;
   std::deque<Observation> observations_;
   std::multimap<std::uint64_t, Observation *>
       newcomers_;  // seen under a name that the table doesn't have, by inode
@@ -125,6 +137,7 @@ class Reconciler {
   RecentFiles recent_;
   std::vector<ItemChange> changes_;
   std::vector<ItemNumber> foldersToScan_;
+  std::vector<Place> leftInTrash_;
 };
 
 }  // namespace droxa::keld

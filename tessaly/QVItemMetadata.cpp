@@ -10,6 +10,8 @@
 #include <sys/stat.h>
 #include <sys/xattr.h>
 
+#include "platform/fileprovider/FPTags.h"
+#include "platform/foundation/UTF8.h"
 #include "tessaly/QVErrors.h"
 
 namespace droxa {
@@ -18,29 +20,6 @@ namespace {
 
 constexpr std::int64_t kSecond = 1'000'000'000;
 constexpr std::size_t kLongestAttribute = 65536;  // the kernel's own limit
-
-// The length of the character at the beginning, 0 when it isn't UTF-8.
-std::size_t characterLength(std::string_view text) {
-  const auto byte = [&](std::size_t at) { return static_cast<unsigned char>(text[at]); };
-  const unsigned char first = byte(0);
-  if (first < 0x80) return 1;
-  const std::size_t length = first >= 0xf0 && first < 0xf5 ? 4 : first >= 0xe0 ? 3 : first >= 0xc2 ? 2 : 0;
-  if (first >= 0xf5 || length == 0 || text.size() < length) return 0;
-  for (std::size_t at = 1; at < length; ++at)
-    if ((byte(at) & 0xc0) != 0x80) return 0;
-  const bool isOverlong = (first == 0xe0 && byte(1) < 0xa0) || (first == 0xf0 && byte(1) < 0x90);
-  const bool isOutside = (first == 0xed && byte(1) > 0x9f) || (first == 0xf4 && byte(1) > 0x8f);
-  return isOverlong || isOutside ? 0 : length;
-}
-
-bool isUTF8(std::string_view text) {
-  while (!text.empty()) {
-    const std::size_t length = characterLength(text);
-    if (length == 0) return false;
-    text.remove_prefix(length);
-  }
-  return true;
-}
 
 bool hasControlCharacter(std::string_view text) {
   for (std::size_t at = 0; at < text.size(); ++at) {
@@ -63,7 +42,7 @@ NSError refusal(const std::string &name, const std::string &why) {
 }
 
 NSError checkTagName(const std::string &name) {
-  if (!isUTF8(name)) return refusal(name, "isn't UTF-8 text; nothing was changed");
+  if (!UTF8IsValid(name)) return refusal(name, "isn't UTF-8 text; nothing was changed");
   if (hasControlCharacter(name)) return refusal(name, "has a control character in it; leave that out");
   if (name.find(',') != std::string::npos)
     return refusal(name, "has a comma in it, which separates tags where they are kept; leave that out");
@@ -213,6 +192,13 @@ std::uint64_t QVDecodeFavoriteRank(std::string_view text) {
   std::uint64_t rank = 0;
   const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), rank);
   return error == std::errc() && end == text.data() + text.size() ? rank : 0;
+}
+
+NSData QVTagDataOfNames(const std::vector<std::string> &names) {
+  std::vector<FPTag> tags;
+  tags.reserve(names.size());
+  for (const std::string &name : names) tags.push_back({name, 0});
+  return FPGetTagsDataFromTags(tags);
 }
 
 int QVReadItemAttributes(const std::string &path, QVItemMetadata *metadata) {

@@ -6,6 +6,7 @@
 #include <string_view>
 #include <vector>
 
+#include "platform/foundation/NSData.h"
 #include "platform/foundation/NSError.h"
 
 // What a user notes on an item besides its contents, and how the item's file keeps it: in extended attributes
@@ -53,6 +54,9 @@ std::vector<std::string> QVDecodeTagNames(std::string_view text);
 std::string QVEncodeLastUsed(std::int64_t nanoseconds);
 std::int64_t QVDecodeLastUsed(std::string_view text);  // 0 for what is no date
 std::uint64_t QVDecodeFavoriteRank(std::string_view text);
+
+// The tag data that the framework is given for them; nil for none. Their colours aren't kept.
+NSData QVTagDataOfNames(const std::vector<std::string> &names);
 
 // What the file at `path` bears (a link itself, not its target): one system call when it bears nothing. 0 or
 // an errno.

@@ -1,6 +1,8 @@
 #include "tessaly/QVTrash.h"
 
+#include <algorithm>
 #include <cerrno>
+#include <chrono>
 #include <cstdio>
 #include <fcntl.h>
 #include <memory>
@@ -11,6 +13,7 @@
 #include <thread>
 #include <unistd.h>
 
+#include "platform/foundation/UTF8.h"
 #include "tessaly/NSURL+Tessaly.h"
 #include "tessaly/QVContainer.h"
 #include "tessaly/QVErrors.h"
@@ -66,20 +69,14 @@ void lockShared(int folder) {
   }
 }
 
-// A beginning of at most `length` bytes that cuts no character in two.
-std::string beginningOf(const std::string &text, std::size_t length) {
-  if (text.size() <= length) return text;
-  while (length > 0 && (static_cast<unsigned char>(text[length]) & 0xc0) == 0x80) --length;
-  return text.substr(0, length);
-}
-
 // "name.ext", "name 2.ext", …, short enough for all that is derived from it.
 std::string numberedName(const std::string &name, unsigned number, bool isFolder) {
   if (number == 1 && name.size() <= kLongestName) return name;
   std::size_t dot = isFolder ? std::string::npos : name.rfind('.');
   if (dot == 0 || dot == std::string::npos || name.size() - dot > 32) dot = name.size();
   const std::string ending = (number == 1 ? "" : " " + std::to_string(number)) + name.substr(dot);
-  return beginningOf(name.substr(0, dot), kLongestName - ending.size()) + ending;
+  const std::string_view base = std::string_view(name).substr(0, dot);
+  return std::string(UTF8Prefix(base, kLongestName - ending.size())) + ending;
 }
 
 // One item on its way into the trash.

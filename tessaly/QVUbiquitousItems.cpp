@@ -1,13 +1,18 @@
 #include "tessaly/QVUbiquitousItems.h"
 
 #include <array>
+#include <cerrno>
 #include <memory>
 #include <string_view>
+#include <sys/stat.h>
 #include <sys/xattr.h>
 
 #include "platform/foundation/NSFileManager.h"
+#include "platform/foundation/Paths.h"
+#include "tessaly/NSURL+Tessaly.h"
 #include "tessaly/QVDaemonConnection.h"
 #include "tessaly/QVLog.h"
+#include "tessaly/QVPhysicalURL.h"
 
 namespace droxa {
 
@@ -27,6 +32,25 @@ class DaemonItems final : public NSUbiquitousItemProviding {
     return daemon->error();
   }
   bool isDataless(const NSURL &url) override { return qv_isDataless(url); }
+
+  // Beside the daemon's own temporaries: nothing there is shown to anybody, and the daemon clears it away.
+  NSURL itemReplacementDirectoryForURL(const NSURL &url) override {
+    if (!qv_isInSyncedLocation(url)) return NSURL();
+    const NSURL storage = NSURL::fileURLWithPath(DroxaProcessHome().replica() + "/" + QVPrivateStorageName);
+    const NSURL folder = storage.URLByAppendingPathComponent(QVActionsFolderName);
+    for (const NSURL &one : {storage, folder})
+      if (::mkdir(one.path().c_str(), 0700) != 0 && errno != EEXIST) return NSURL();
+    return folder;
+  }
+  NSURL physicalURLForURL(const NSURL &url) override { return QVPhysicalURL(url); }
+  // A promise can't be given the name of a document whose promise would need a shortened name: its text tells
+  // the name then. The name that is given is too long for any file, so that the renaming fails.
+  NSURL physicalURLForName(const NSURL &folder, const std::string &name) override {
+    constexpr std::size_t kTooLong = 256;
+    return folder.URLByAppendingPathComponent(
+        QVPromiseNameForName(name).value_or(std::string(kTooLong, '.') + "droxafault"));
+  }
+
   // Where it can't be told, the deletion is one like any other.
   void willDeleteItemAtURL(const NSURL &url) override {
     const auto daemon = QVDaemonConnection::defaultConnection()->newSyncProxy();

@@ -9,6 +9,10 @@ namespace droxa {
 // and a blank, is "d" (dataless) or "e" (being evicted). Asks the file system alone. Any thread.
 bool qv_isDataless(const NSURL &url);
 
+// The daemon's own folder in the replica, and the one in it where actions on items are prepared.
+inline constexpr char QVPrivateStorageName[] = ".droxa-private";
+inline constexpr char QVActionsFolderName[] = "actions";
+
 // Makes the daemon this process's sync service: NSFileManager evicts through it, and the reachability of a
 // URL counts dataless documents out. May be called again. Any thread.
 void QVInstallUbiquitousItemProvider();

@@ -85,10 +85,12 @@ DocumentLook lookAtPromise(int folder, const PromiseFile &promise, std::uint64_t
   DocumentLook look;
   const auto facts = ReadFileFacts(folder, PromiseNameFor(promise.name), ownDevice);
   if (!facts) return look;
+  if (facts->kind != NSFileProviderItemKind::document) return look;
+  look.facts = *facts;
   look.kind = DocumentClass::dataless;
   look.marker = promise.marker;
   look.isPromised = true;
-  look.facts = *facts;
+  look.facts.isPromise = true;
   look.facts.size = promise.marker.size;
   look.facts.modified = promise.modified;
   look.facts.mode = (facts->mode & ~07777U) | promise.mode;
@@ -112,6 +114,13 @@ DocumentLook lookAtFile(int folder, const std::string &name, DocumentLook look, 
 }
 
 }  // namespace
+
+std::optional<FileFacts> ReadPromisedFacts(int folder, const std::string &name, std::uint64_t ownDevice) {
+  const auto promise = ReadPromise(folder, PromiseNameFor(name));
+  if (!promise || promise->name != name) return std::nullopt;
+  const DocumentLook look = lookAtPromise(folder, *promise, ownDevice);
+  return look.isPromised ? std::optional(look.facts) : std::nullopt;
+}
 
 DocumentLook ClassifyOpenDocument(int descriptor, std::uint64_t ownDevice) {
   DocumentLook look;

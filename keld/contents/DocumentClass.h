@@ -43,5 +43,8 @@ DocumentLook ClassifyDocument(int folder, const std::string &name, DatalessForm 
                               std::uint64_t ownDevice);
 // The same of an open regular file (open for reading), whatever its name.
 DocumentLook ClassifyOpenDocument(int descriptor, std::uint64_t ownDevice);
+// What is shown of a document that a promise stands for, as in DocumentLook::facts; nullopt when there is no
+// promise of it.
+std::optional<FileFacts> ReadPromisedFacts(int folder, const std::string &name, std::uint64_t ownDevice);
 
 }  // namespace droxa::keld

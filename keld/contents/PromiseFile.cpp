@@ -105,7 +105,10 @@ std::optional<PromiseFile> ReadPromise(int folder, const std::string &promiseNam
   std::string bytes;
   if (ReadSmallFile(folder, promiseName, kMostPromiseBytes, &bytes) != 0) return std::nullopt;
   auto promise = ParsePromise(bytes);
-  if (promise && PromiseNameFor(promise->name) != promiseName) return std::nullopt;
+  if (!promise) return std::nullopt;
+  // Who renames a document that isn't here renames its promise.
+  if (const auto name = NameOfPromise(promiseName)) promise->name = *name;
+  if (PromiseNameFor(promise->name) != promiseName) return std::nullopt;
   return promise;
 }
 

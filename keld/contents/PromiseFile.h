@@ -32,7 +32,9 @@ std::string EncodePromise(const PromiseFile &promise);
 // nullopt for anything that EncodePromise doesn't write.
 std::optional<PromiseFile> ParsePromise(std::string_view bytes);
 // Reads the promise of that file name in the folder (which may be open as a path alone); nullopt when there
-// is none, it doesn't parse, or it is the promise of a document whose promise has another name.
+// is none, it doesn't parse, or its name is a shortened one that belongs to another document's. Its
+// document's name follows from the file's name where that isn't shortened, so that a promise is renamed as
+// any file is.
 std::optional<PromiseFile> ReadPromise(int folder, const std::string &promiseName);
 
 }  // namespace droxa::keld

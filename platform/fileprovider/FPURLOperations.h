@@ -68,7 +68,8 @@ void fp_reparentUnderFolder_allowBouncing(const NSURL &url, const NSURL &folder,
 void fp_deleteWithCompletionHandler(const NSURL &url, FPErrorCompletion completion);
 void fp_coordinatedDeleteWithHandler(const NSURL &url, const FPURLCompletion &handler);
 
-// A path as it may stand in a log: names are shortened to their first and last characters, with their length.
+// A path as it may stand in a log: names are shortened to their first and last characters, with their length
+// in bytes: "/h(4)e/r(10)t". A name of two bytes or less is its length alone.
 std::string fp_obfuscatedPath(const std::string &path);
 
 }  // namespace droxa

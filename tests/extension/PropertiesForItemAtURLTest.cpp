@@ -1,5 +1,6 @@
 #include "additions/NSError+QVFPAdditions.h"
 #include "platform/fileprovider/NSFileProviderError.h"
+#include "tessaly/QVContainer.h"
 #include "tessaly/QVErrors.h"
 #include "tests/extension/ExtensionFixture.h"
 

@@ -53,6 +53,7 @@ TEST_P(Metadata, thatAnotherProgramWritesIsSeenAndGetsARank) {
     const auto item = keld.item(path);
     EXPECT_EQ(item->fields().lastUsedDate, NSDate::dateWithNanosecondsSince1970(kDate));
     EXPECT_EQ(item->fields().favoriteRank, 12U);
+    EXPECT_EQ(item->fields().tagData, QVTagDataOfNames({"Red", "Work"}));
   }
 }
 

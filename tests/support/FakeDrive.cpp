@@ -308,6 +308,7 @@ std::shared_ptr<const QVQueryItem> FakeDrive::itemOf(const Node &node) const {
   fields.isDownloaded = !node.contents.isDataless;
   const std::int64_t lastUsed = node.metadata.lastUsed;
   if (lastUsed != 0) fields.lastUsedDate = NSDate::dateWithNanosecondsSince1970(lastUsed);
+  fields.tagData = QVTagDataOfNames(node.metadata.tags);
   fields.favoriteRank = node.metadata.favoriteRank;
   return std::make_shared<const QVQueryItem>(fileObjectID, std::move(fields));
 }

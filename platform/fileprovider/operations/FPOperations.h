@@ -5,6 +5,7 @@
 #include <string>
 
 #include "platform/foundation/NSError.h"
+#include "platform/foundation/NSFileCoordinator.h"
 #include "platform/foundation/NSProgress.h"
 #include "platform/foundation/NSURL.h"
 
@@ -19,9 +20,19 @@ struct FPOutcome {
   NSError error;
 };
 
+// Gives back the coordination when it goes. Null with an error.
+using FPAccess = std::unique_ptr<NSFileAccess>;
 using FPProgress = std::shared_ptr<NSProgress>;
 
+// The access for writing that a deletion of the item needs; NSFileNoSuchFileError where there is none.
+FPAccess FPAccessForDeletion(const NSURL &url, const FPProgress &progress, NSError *error);
+
+FPOutcome FPImport(const NSURL &source, const NSURL &folder, const FPProgress &progress);
 FPOutcome FPCreateSubFolder(const NSURL &parent, const std::string &name, const FPProgress &progress);
 FPOutcome FPRename(const NSURL &url, const std::string &name, const FPProgress &progress);
+FPOutcome FPReparent(const NSURL &url, const NSURL &folder, const std::optional<std::string> &newName,
+                     bool allowBouncing, const FPProgress &progress);
+// Gives no URL.
+FPOutcome FPDelete(const NSURL &url, const FPProgress &progress);
 
 }  // namespace droxa

@@ -1,7 +1,11 @@
 #include "platform/fileprovider/operations/FPPlace.h"
 
+#include <cerrno>
+#include <filesystem>
 #include <sys/stat.h>
+#include <system_error>
 
+#include "platform/fileprovider/operations/FPErrors.h"
 #include "platform/foundation/NSFileManager.h"
 
 namespace droxa {
@@ -33,11 +37,42 @@ bool FPExists(const std::string &path, mode_t *mode) {
   return true;
 }
 
-bool FPIsTaken(const FPPlace &place) {
-  if (FPExists(place.logical.path())) return true;
-  const NSURL promise =
-      PromiseOfName(place.logical.URLByDeletingLastPathComponent(), place.logical.lastPathComponent());
+bool FPIsTakenByOtherForm(const FPPlace &place) {
+  if (place.isPromise()) return FPExists(place.logical.path());
+  const NSURL folder = place.logical.URLByDeletingLastPathComponent();
+  const NSURL promise = PromiseOfName(folder, place.logical.lastPathComponent());
   return !(promise == place.logical) && FPExists(promise.path());
+}
+
+void FPAddWriting(const FPPlace &place, std::vector<NSFileAccessIntent> *intents) {
+  intents->push_back(NSFileAccessIntent::writingIntent(place.logical));
+  if (place.isPromise()) intents->push_back(NSFileAccessIntent::writingIntent(place.onDisk));
+}
+
+bool FPIsFolder(const NSURL &url, NSError *error) {
+  struct stat status {};
+  if (!url.isFileURL()) {
+    *error = FPNoSuchFileError(url);
+  } else if (stat(url.path().c_str(), &status) != 0) {
+    *error = FPErrorFromPOSIX(errno, "there is no folder at " + url.path());
+  } else if (!S_ISDIR(status.st_mode)) {
+    *error = FPErrorFromPOSIX(ENOTDIR, "there is no folder at " + url.path());
+  } else {
+    return true;
+  }
+  return false;
+}
+
+bool FPIsWithin(const NSURL &folder, const NSURL &url) {
+  // The item itself may be a link, which nothing lies below.
+  struct stat status {};
+  if (lstat(url.path().c_str(), &status) != 0 || !S_ISDIR(status.st_mode)) return false;
+  std::error_code error;
+  const auto inner = std::filesystem::canonical(folder.path(), error);
+  if (error) return false;
+  const auto outer = std::filesystem::canonical(url.path(), error);
+  if (error) return false;
+  return NSURL::fileURLWithPath(inner.native()).isEqualToOrBelow(NSURL::fileURLWithPath(outer.native()));
 }
 
 }  // namespace droxa

@@ -1,8 +1,10 @@
+#include <cerrno>
 #include <exception>
 #include <utility>
 
 #include "platform/dispatch/dispatch.h"
 #include "platform/fileprovider/FPURLOperations.h"
+#include "platform/fileprovider/operations/FPErrors.h"
 #include "platform/fileprovider/operations/FPOperations.h"
 
 namespace droxa {
@@ -25,22 +27,20 @@ template <class Work>
 void Run(FPURLCompletion completion, Work work) {
   auto run = [completion = std::move(completion), work = std::move(work),
               progress = NSProgress::currentProgress()] {
-    const FPOutcome outcome = Guarded([&] { return work(progress); });
+    const FPOutcome outcome = progress && progress->isCancelled()
+                                  ? FPOutcome{{}, FPErrorFromPOSIX(ECANCELED, "the work was not begun")}
+                                  : Guarded([&] { return work(progress); });
     if (completion) completion(outcome.error ? NSURL() : outcome.url, outcome.error);
   };
   dispatch_async_global(std::move(run));
 }
 
-FPOutcome Unsupported() {
-  return {{}, NSError(NSCocoaErrorDomain, NSFileWriteUnknownError)};
-}
-
 // Thread contract: has no state; any thread.
 class RealOperations final : public FPURLOperations {
  public:
-  void importUnderFolder(const NSURL & /*source*/, const NSURL & /*folder*/,
-                         FPURLCompletion completion) override {
-    Run(std::move(completion), [](const FPProgress &) { return Unsupported(); });
+  void importUnderFolder(const NSURL &source, const NSURL &folder, FPURLCompletion completion) override {
+    Run(std::move(completion),
+        [source, folder](const FPProgress &progress) { return FPImport(source, folder, progress); });
   }
   void createSubFolder(const NSURL &parent, const std::string &name, FPURLCompletion completion) override {
     Run(std::move(completion),
@@ -50,21 +50,30 @@ class RealOperations final : public FPURLOperations {
     Run(std::move(completion),
         [url, name](const FPProgress &progress) { return FPRename(url, name, progress); });
   }
-  void reparentUnderFolder_withNewName(const NSURL & /*url*/, const NSURL & /*folder*/,
-                                       const std::optional<std::string> & /*newName*/,
+  void reparentUnderFolder_withNewName(const NSURL &url, const NSURL &folder,
+                                       const std::optional<std::string> &newName,
                                        FPURLCompletion completion) override {
-    Run(std::move(completion), [](const FPProgress &) { return Unsupported(); });
+    Run(std::move(completion), [url, folder, newName](const FPProgress &progress) {
+      return FPReparent(url, folder, newName, false, progress);
+    });
   }
-  void reparentUnderFolder_allowBouncing(const NSURL & /*url*/, const NSURL & /*folder*/,
-                                         bool /*allowBouncing*/, FPURLCompletion completion) override {
-    Run(std::move(completion), [](const FPProgress &) { return Unsupported(); });
+  void reparentUnderFolder_allowBouncing(const NSURL &url, const NSURL &folder, bool allowBouncing,
+                                         FPURLCompletion completion) override {
+    Run(std::move(completion), [url, folder, allowBouncing](const FPProgress &progress) {
+      return FPReparent(url, folder, std::nullopt, allowBouncing, progress);
+    });
   }
-  void deleteWithCompletionHandler(const NSURL & /*url*/, FPErrorCompletion completion) override {
-    Run([completion = std::move(completion)](const NSURL &, const NSError &error) { completion(error); },
-        [](const FPProgress &) { return Unsupported(); });
+  void deleteWithCompletionHandler(const NSURL &url, FPErrorCompletion completion) override {
+    Run(
+        [completion = std::move(completion)](const NSURL & /*url*/, const NSError &error) {
+          if (completion) completion(error);
+        },
+        [url](const FPProgress &progress) { return FPDelete(url, progress); });
   }
-  void coordinatedDeleteWithHandler(const NSURL & /*url*/, const FPURLCompletion &handler) override {
-    handler({}, Unsupported().error);
+  void coordinatedDeleteWithHandler(const NSURL &url, const FPURLCompletion &handler) override {
+    NSError error;
+    const FPAccess access = FPAccessForDeletion(url, NSProgress::currentProgress(), &error);
+    if (handler) handler(access ? url : NSURL(), access ? NSError() : error);
   }
 };
 

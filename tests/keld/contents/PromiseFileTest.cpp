@@ -69,12 +69,19 @@ TEST(PromiseFile, hostileBytesAreNoPromise) {
   EXPECT_FALSE(ParsePromise(EncodePromise(present)));
 }
 
-TEST(PromiseFile, oneUnderAnotherDocumentsNameIsNone) {
+TEST(PromiseFile, oneThatWasRenamedIsThatOfItsNewName) {
   const ContentsReplica replica(kPromises);
+  const std::string longName(255, 'x');
   replica.write(PromiseNameFor("a"), EncodePromise(somePromise("a")));
   replica.write(PromiseNameFor("b"), EncodePromise(somePromise("a")));
   EXPECT_TRUE(ReadPromise(replica.folder(), PromiseNameFor("a")));
-  EXPECT_FALSE(ReadPromise(replica.folder(), PromiseNameFor("b")));
+  const auto renamed = ReadPromise(replica.folder(), PromiseNameFor("b"));
+  ASSERT_TRUE(renamed);
+  EXPECT_EQ(*renamed, somePromise("b"));
+  replica.write(PromiseNameFor(longName), EncodePromise(somePromise("a")));
+  EXPECT_FALSE(ReadPromise(replica.folder(), PromiseNameFor(longName)));
+  replica.write(PromiseNameFor(longName), EncodePromise(somePromise(longName)));
+  EXPECT_EQ(ReadPromise(replica.folder(), PromiseNameFor(longName)), somePromise(longName));
   EXPECT_FALSE(ReadPromise(replica.folder(), PromiseNameFor("c")));
 }
 

@@ -275,6 +275,21 @@ TEST(ReplacingPlaceholders, keepsTheUsersOwnAttributes) {
   EXPECT_STREQ(value, "blue");
 }
 
+TEST(ReplacingPlaceholders, keepsTheUsersOwnAttributesOnANewerPlaceholder) {
+  const ContentsReplica replica;
+  ASSERT_TRUE(replica.publishPlaceholder("a", kBytes).isDone());
+  ASSERT_EQ(::setxattr(replica.path("a").c_str(), "user.xdg.tags", "blue", 4, 0), 0);
+  auto newer = replica.storage().preparePlaceholder(replica.markerOf("newer", "2"), 0640, {0, 5});
+  ASSERT_TRUE(newer.result.isDone());
+  ASSERT_TRUE(
+      replica.storage().replaceContents(replica.folder(), "a", newer.file, replica.look("a").facts).isDone());
+  char value[8] = {};
+  EXPECT_EQ(::getxattr(replica.path("a").c_str(), "user.xdg.tags", value, sizeof value), 4);
+  EXPECT_STREQ(value, "blue");
+  EXPECT_EQ(replica.look("a").kind, DocumentClass::dataless);
+  EXPECT_EQ(replica.look("a").facts.modified, 5);
+}
+
 TEST(ReplacingPlaceholders, refusesAPlaceholderThatSomebodyHasOpenForWriting) {
   const ContentsReplica replica;
   ASSERT_TRUE(replica.publishPlaceholder("a", kBytes).isDone());

@@ -116,6 +116,7 @@ TEST_P(DaemonConformance, whatIsNotedOnAnItemIsShownWithANewRank) {
     const Item noted = item(path);
     EXPECT_EQ(noted->fields().lastUsedDate, NSDate::dateWithNanosecondsSince1970(1'700'000'000'000'000'001));
     EXPECT_EQ(noted->fields().favoriteRank, 7U);
+    EXPECT_EQ(noted->fields().tagData, QVTagDataOfNames({"Red"}));
     EXPECT_GT(noted->fields().changeRank, before);
   }
   Once<NSError> rankAlone("the rank alone");
