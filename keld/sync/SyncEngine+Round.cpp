@@ -234,6 +234,7 @@ void SyncEngine::waitForWork() {
     const auto wait = std::max(std::chrono::milliseconds(*retry) - now, std::chrono::milliseconds(5));
     if (retryPause_.count() == 0) until = std::min(until, std::chrono::steady_clock::now() + wait);
   }
+  if (const auto retry = downloads_->nextRetry()) until = std::min(until, *retry);
   // Nobody tells of the end of the first look at the replica.
   if (!hasSeenReplica_) until = std::min(until, std::chrono::steady_clock::now() + kScanPoll);
   until = std::max(until, std::chrono::steady_clock::now() + std::chrono::milliseconds(1));

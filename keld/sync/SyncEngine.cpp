@@ -62,6 +62,7 @@ SyncEngine::SyncEngine(const std::string &replicaPath, const std::string &databa
     performAndWait([&] { result = keepBoth(location, prepared); });
     return result;
   });
+  downloads_->setRetryHandler([this] { itemsChanged(); });
   examiner_.setBoundHandler([this](ItemNumber item, const SyncRow &row) {
     if (row.isDataless && isPinnedOrBelowPin(item)) downloads_->fetchInBackground(item, row.content.size);
   });

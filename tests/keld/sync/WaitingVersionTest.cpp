@@ -55,5 +55,21 @@ TEST_F(WaitingVersion, anEditUnderAVersionThatWaitsIsKeptBesideIt) {
   }
 }
 
+TEST_F(WaitingVersion, whatCouldNotBeFetchedIsTriedAgainBeforeTheNextPoll) {
+  anna.keld.write("notes.txt", "base");
+  ASSERT_FALSE(anna.waitForUploads());
+  ASSERT_TRUE(ben.knowsSoon("notes.txt"));
+  ASSERT_EQ(ben.contents("notes.txt"), "base");
+  FaultyCloud::Fault failing;
+  failing.error = CKErrorMake(CKErrorCode::networkFailure, "no way there");
+  faulty->onEveryCall(FaultyCloud::Call::readAsset, failing);
+  const int before = faulty->count(FaultyCloud::Call::readAsset);
+  anna.keld.write("notes.txt", "from anna");
+  ASSERT_FALSE(anna.waitForUploads());
+  ASSERT_TRUE(eventually([&] { return faulty->count(FaultyCloud::Call::readAsset) > before + 2; }));
+  faulty->clearFaults();
+  EXPECT_TRUE(eventually([&] { return ben.read("notes.txt") == "from anna"; }));
+}
+
 }  // namespace
 }  // namespace droxa::keld
