@@ -59,7 +59,18 @@ void CloudApplier::placed(const DocumentRecord &document, const Place &place, co
 }
 
 void CloudApplier::noteTrash(const DocumentRecord &document, const std::string &name) {
-  if (document.putBack) PutBackNotes(context_.files, context_.store).write(name, *document.putBack);
+  if (!document.putBack) return;
+  PutBackNotes(context_.files, context_.store).write(name, *document.putBack);
+  if (!context_.files.folderPath(document.putBack->parent)) early_[name] = *document.putBack;
+}
+
+// The folder that something in the trash was in may come after it.
+void CloudApplier::noteTrashAgain() {
+  for (auto each = early_.begin(); each != early_.end();) {
+    const bool isKnown = context_.files.folderPath(each->second.parent).has_value();
+    if (isKnown) PutBackNotes(context_.files, context_.store).write(each->first, each->second);
+    each = isKnown ? early_.erase(each) : std::next(each);
+  }
 }
 
 // Has `put` try the record's name, and others where that one is somebody else's.

@@ -209,6 +209,7 @@ void CloudApplier::syncReplica() const {
 }
 
 void CloudApplier::finishBatch() {
+  noteTrashAgain();
   context_.states.flush();
   if (!touched_.empty()) context_.states.lookAt(std::exchange(touched_, {}));
 }

@@ -72,6 +72,7 @@ class CloudApplier {
   // the cloud has to be told what is here. A link bears nothing.
   bool applyMetadata(const DocumentRecord &document, int folder, const std::string &name, ItemMetadata here,
                      SyncRow *row);
+  void noteTrashAgain();
   void placed(const DocumentRecord &document, const Place &place, const std::string &name, SyncRow *row);
   bool putAtFreeName(const DocumentRecord &document, const Place &place, SyncRow *row,
                      const std::function<ContentsOutcome(const std::string &name)> &put);
@@ -102,6 +103,7 @@ class CloudApplier {
   const SyncContext &context_;
   ConflictCopies &conflicts_;
   std::vector<std::string> touched_;          // paths that the keeper is to look at
+  std::map<std::string, PutBack> early_;      // by the names in the trash, until the folder is known
   std::vector<std::string> foldersToRemove_;  // records
   std::uint64_t applied_ = 0;
   std::function<bool()> isSameCloud_;

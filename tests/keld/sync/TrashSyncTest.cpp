@@ -87,6 +87,20 @@ TEST_F(TrashSync, whatADeviceSeesInTheTrashFirstIsNotedToo) {
   EXPECT_EQ(note(ben, "notes.txt")->path, ben.keld.at("work/notes.txt"));
 }
 
+TEST_F(TrashSync, aFolderThatTheCloudTellsOfLaterIsFound) {
+  ben.keld.stop();
+  anna.keld.folder("work");
+  anna.keld.write("work/notes.txt", "hello");
+  ASSERT_FALSE(anna.waitForUploads());
+  throwAway(anna, "work/notes.txt", "notes.txt");
+  ASSERT_FALSE(anna.waitForUploads());
+  anna.keld.rename("work", "plans");
+  ASSERT_FALSE(anna.waitForUploads());
+  ben.keld.start();
+  ASSERT_TRUE(isInTrashSoon(ben, "notes.txt"));
+  EXPECT_TRUE(eventually([&] { return note(ben, "notes.txt")->path == ben.keld.at("plans/notes.txt"); }));
+}
+
 TEST_F(TrashSync, aFolderGoesAndComesBackWithAllThatIsInIt) {
   anna.keld.folder("work");
   share("work/notes.txt", "hello");
