@@ -1,5 +1,7 @@
 #include "keld/ItemAttributes.h"
 
+#include "keld/contents/DocumentMarker.h"
+
 namespace droxa::keld {
 
 namespace {
@@ -11,13 +13,15 @@ std::string pathIn(int folder, const std::string &name) {
 
 }  // namespace
 
-void ReadMetadataOfFile(int folder, const std::string &name, ItemMetadata *metadata) {
+bool ReadMetadataOfFile(int folder, const std::string &name, ItemMetadata *metadata) {
   const std::string path = pathIn(folder, name);
   ItemMetadata found;
-  if (QVReadItemAttributes(path, &found) != 0) return;
+  bool hasMarker = false;
+  if (QVReadItemAttributes(path, &found, kMarkerAttribute, &hasMarker) != 0) return true;
   // A file system without attributes lists none, like a file that bears none.
-  if (found.isEmpty() && !metadata->isEmpty() && !QVKeepsItemAttributes(path)) return;
+  if (found.isEmpty() && !metadata->isEmpty() && !QVKeepsItemAttributes(path)) return hasMarker;
   *metadata = std::move(found);
+  return hasMarker;
 }
 
 int ApplyMetadataToFile(int folder, const std::string &name, const QVItemMetadataChange &change) {

@@ -12,10 +12,12 @@
 #include "keld/contents/ContentsStorage.h"
 #include "keld/sync/DeviceName.h"
 #include "platform/cloudkit/EmbeddedCloud.h"
+#include "platform/fileprovider/FPReplacements.h"
 #include "platform/foundation/NSDate.h"
 #include "tessaly/QVErrors.h"
 #include "tessaly/QVLog.h"
 #include "tessaly/QVNotifications.h"
+#include "tessaly/QVUbiquitousItems.h"
 
 namespace droxa::keld {
 
@@ -39,6 +41,7 @@ std::shared_ptr<Keld> Keld::start(const DroxaHome &home, KeldOptions options, st
   if (!problem->empty()) return nullptr;
   *problem = MakeBuiltInContainers(daemon->replicaPath_);
   if (!problem->empty()) return nullptr;
+  daemon->removeAbandonedActions();
   try {
     daemon->open();
   } catch (const std::exception &error) {
@@ -66,6 +69,15 @@ void Keld::open() {
   if (error) os_log_error(qvc_default_log(), "[ERROR] can't read the account: %@", error);
   offerLocalAccount(!wasDamaged && !error);
   accountChanged();
+}
+
+// What actions of programs that died have left in their folder.
+void Keld::removeAbandonedActions() {
+  const NSURL folder =
+      NSURL::fileURLWithPath(replicaPath_ + "/" + QVPrivateStorageName + "/" + QVActionsFolderName);
+  const std::size_t removed = FPRemoveAbandonedReplacements(folder);
+  if (removed != 0)
+    os_log(qvc_default_log(), "[NOTICE] removed what %lu actions of items have left", removed);
 }
 
 // Asked before the keeper looks at anything; whether the storage can be opened is the sync's to tell.

@@ -81,6 +81,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
  private:
   Keld(const DroxaHome &home, KeldOptions options);
   void open();
+  void removeAbandonedActions();
   void openSync();
   bool replicaHasPromises() const;
   void offerLocalAccount(bool mayOffer);

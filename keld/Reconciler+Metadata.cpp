@@ -8,12 +8,13 @@
 
 namespace droxa::keld {
 
-// A link can't bear attributes, nor can anything on some file systems: there the row's is all there is.
-void Reconciler::readMetadata(ItemRecord &record) {
-  if (IsLink(record.facts.kind)) return;
+// Gives whether the file may bear a document's marker. A link can't bear attributes, nor can anything on some
+// file systems: there the row's is all there is.
+bool Reconciler::readMetadata(ItemRecord &record) {
+  if (IsLink(record.facts.kind)) return false;
   int error = 0;
   const auto folder = opener_.open(record.parent, &error);
-  if (folder) ReadMetadataOfFile(folder->get(), record.name, &record.metadata);
+  return !folder || ReadMetadataOfFile(folder->get(), record.name, &record.metadata);
 }
 
 NSError Reconciler::applyMetadata(ItemNumber id, const QVItemMetadataChange &change) {

@@ -189,8 +189,8 @@ void Reconciler::insertNew(const Observation &observation, std::uint32_t flags, 
   record.flags = flags;
   record.facts = *observation.facts;
   record.metadata = metadata;
-  readMetadata(record);
-  if (isDataless(record.parent, record.name, record.facts)) record.flags |= kDatalessFlag;
+  const bool mayBeMarked = readMetadata(record);
+  if (isDataless(record.parent, record.name, record.facts, mayBeMarked)) record.flags |= kDatalessFlag;
   edits_.insert(record);
   changes_.push_back({record.id, record.facts.kind, 0, record.parent, false});
   touched_.push_back(record.parent);
@@ -198,9 +198,10 @@ void Reconciler::insertNew(const Observation &observation, std::uint32_t flags, 
 }
 
 // A placeholder is never shown as a document whose contents are here, not even before the sync has seen it.
-bool Reconciler::isDataless(ItemNumber folder, const std::string &name, const FileFacts &facts) {
+bool Reconciler::isDataless(ItemNumber folder, const std::string &name, const FileFacts &facts,
+                            bool mayBeMarked) {
   if (facts.isPromise) return true;
-  if (facts.kind != NSFileProviderItemKind::document || facts.size == 0) return false;
+  if (!mayBeMarked || facts.kind != NSFileProviderItemKind::document || facts.size == 0) return false;
   int error = 0;
   const auto descriptor = opener_.open(folder, &error);
   const auto marker = descriptor ? ReadMarker(descriptor->get(), name) : std::nullopt;
@@ -250,7 +251,7 @@ void Reconciler::refresh(ItemRecord record, const FileFacts &facts) {
   if (becameAccessible && !isIdentical) foldersToScan_.push_back(record.id);
   // Attributes may be written twice while the clock of times of change stands still.
   const ItemMetadata known = record.metadata;
-  readMetadata(record);
+  const bool mayBeMarked = readMetadata(record);
   if (isIdentical && record.metadata == known) return;
   // Whatever was written here, the cloud doesn't have it yet.
   const bool isWritten =
@@ -259,7 +260,7 @@ void Reconciler::refresh(ItemRecord record, const FileFacts &facts) {
   if (isWritten) record.flags &= ~kUploadedFlag;
   if (record.facts.inode != facts.inode && !record.isFolder()) {
     record.flags &= ~kDatalessFlag;
-    if (isDataless(record.parent, record.name, facts)) record.flags |= kDatalessFlag;
+    if (isDataless(record.parent, record.name, facts, mayBeMarked)) record.flags |= kDatalessFlag;
   }
   record.facts = facts;
   if ((looksTheSame && record.metadata == known) || isUnlistedStructure(record))

@@ -104,8 +104,8 @@ class Reconciler {
   bool takeBackFromBackup(const Observation &observation, std::uint32_t flags);
   void insertNew(const Observation &observation, std::uint32_t flags, ItemNumber id,
                  const ItemMetadata &metadata = {});
-  void readMetadata(ItemRecord &record);
-  bool isDataless(ItemNumber folder, const std::string &name, const FileFacts &facts);
+  bool readMetadata(ItemRecord &record);
+  bool isDataless(ItemNumber folder, const std::string &name, const FileFacts &facts, bool mayBeMarked);
   void move(ItemRecord record, const Observation &observation, std::uint32_t flags);
   void refresh(ItemRecord record, const FileFacts &facts);
   void reflagChildren(const ItemRecord &folder);

@@ -63,6 +63,14 @@ std::string readAttribute(const std::string &path, const char *name) {
   return bytes;
 }
 
+// In a list of names of which each ends with a NUL.
+bool isListed(std::string_view list, const char *name) {
+  const std::string_view wanted(name, std::strlen(name) + 1);
+  for (std::size_t at = list.find(wanted); at != std::string_view::npos; at = list.find(wanted, at + 1))
+    if (at == 0 || list[at - 1] == '\0') return true;
+  return false;
+}
+
 // An empty value removes the attribute.
 int writeAttribute(const std::string &path, const char *name, const std::string &value) {
   if (!value.empty()) return ::lsetxattr(path.c_str(), name, value.data(), value.size(), 0) == 0 ? 0 : errno;
@@ -201,25 +209,20 @@ NSData QVTagDataOfNames(const std::vector<std::string> &names) {
   return FPGetTagsDataFromTags(tags);
 }
 
-int QVReadItemAttributes(const std::string &path, QVItemMetadata *metadata) {
+int QVReadItemAttributes(const std::string &path, QVItemMetadata *metadata, const char *other,
+                         bool *hasOther) {
   *metadata = {};
   std::array<char, 4096> names;
   const ssize_t length = ::llistxattr(path.c_str(), names.data(), names.size());
   if (length < 0 && errno != ERANGE) return errno;
   const bool isPartial = length < 0;  // too many to tell: each is asked for
   const std::string_view list(names.data(), isPartial ? 0 : static_cast<std::size_t>(length));
-  const auto text = [&](const char *name) {
-    // Each name ends with a NUL, and begins after one.
-    const std::string_view wanted(name, std::strlen(name) + 1);
-    bool isThere = isPartial;
-    for (std::size_t at = list.find(wanted); at != std::string_view::npos && !isThere;
-         at = list.find(wanted, at + 1))
-      isThere = at == 0 || list[at - 1] == '\0';
-    return isThere ? readAttribute(path, name) : std::string();
-  };
+  const auto has = [&](const char *name) { return isPartial || isListed(list, name); };
+  const auto text = [&](const char *name) { return has(name) ? readAttribute(path, name) : std::string(); };
   metadata->tags = QVDecodeTagNames(text(QVTagsAttribute));
   metadata->lastUsed = QVDecodeLastUsed(text(QVLastUsedAttribute));
   metadata->favoriteRank = QVDecodeFavoriteRank(text(QVFavoriteRankAttribute));
+  if (hasOther) *hasOther = has(other);
   return 0;
 }
 

@@ -59,8 +59,9 @@ std::uint64_t QVDecodeFavoriteRank(std::string_view text);
 NSData QVTagDataOfNames(const std::vector<std::string> &names);
 
 // What the file at `path` bears (a link itself, not its target): one system call when it bears nothing. 0 or
-// an errno.
-int QVReadItemAttributes(const std::string &path, QVItemMetadata *metadata);
+// an errno. `hasOther` (may be null) is set to whether it bears an attribute `other` besides.
+int QVReadItemAttributes(const std::string &path, QVItemMetadata *metadata, const char *other = nullptr,
+                         bool *hasOther = nullptr);
 // Whether the file at `path` could bear them at all.
 bool QVKeepsItemAttributes(const std::string &path);
 // 0 or an errno, with which some of it may have been written: ENOTSUP where the file can't bear attributes (a

@@ -233,9 +233,14 @@ bool LocalExaminer::bind(const ItemRecord &item, const std::string &parent) {
   }
   const auto location = files_.locate(item.id, nullptr);
   if (!location) return false;
-  const auto facts = ReadFileFacts(location->folder.get(), location->name, 0);
+  auto facts = ReadFileFacts(location->folder.get(), location->name, 0);
+  auto marker = ReadMarker(location->folder.get(), location->name);
+  if (isDocument && !facts && storage_.form() == DatalessForm::promise) {
+    const DocumentLook look = storage_.classify(location->folder.get(), location->name);
+    if (look.kind == DocumentClass::dataless) facts = look.facts;
+    marker = look.marker;
+  }
   if (!facts || facts->inode != item.facts.inode) return false;  // another file by now; it is told of yet
-  const auto marker = ReadMarker(location->folder.get(), location->name);
   auto row = marker ? store_.byRecord(marker->recordName) : findUnmarked(item, parent);
   if (!row || row->kind != item.facts.kind) return false;
   // A copy that somebody made with the marker on it is another document.

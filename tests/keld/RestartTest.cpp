@@ -156,4 +156,14 @@ TEST(Restart, givesAnAccountItsIdentifierAgain) {
   EXPECT_EQ(signIn("anna"), anna);
 }
 
+TEST(Restart, clearsAwayWhatActionsOfDeadProgramsHaveLeft) {
+  KeldFixture keld;
+  keld.stop();
+  const std::string actions = keld.replica() + "/.droxa-private/actions";
+  keld.folder(actions + "/.droxa-replacement-0123/below");
+  keld.write(actions + "/.droxa-replacement-0123/below/a");
+  keld.start();
+  EXPECT_TRUE(std::filesystem::is_empty(actions));
+}
+
 }  // namespace droxa::keld

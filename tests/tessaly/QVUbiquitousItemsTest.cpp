@@ -1,3 +1,6 @@
+#include <cerrno>
+#include <cstdio>
+#include <filesystem>
 #include <gtest/gtest.h>
 #include <sys/xattr.h>
 
@@ -73,6 +76,39 @@ TEST_F(UbiquitousItems, anAttributeOfAnotherKindSaysNothing) {
   EXPECT_FALSE(qv_isDataless(file_));
   setxattr(file_.path().c_str(), "user.droxa.document", "1 d", 3, 0);
   EXPECT_FALSE(qv_isDataless(file_));
+}
+
+TEST_F(UbiquitousItems, areWorkedOnInTheDaemonsOwnFolder) {
+  const auto provider = NSFileManager::defaultManager()->ubiquitousItemProvider();
+  const NSURL folder = provider->itemReplacementDirectoryForURL(file_);
+  EXPECT_EQ(folder.path(), home_.replica() + "/.droxa-private/actions");
+  EXPECT_TRUE(std::filesystem::is_directory(folder.path()));
+  EXPECT_EQ(provider->itemReplacementDirectoryForURL(file_), folder);
+  EXPECT_FALSE(provider->itemReplacementDirectoryForURL(NSURL::fileURLWithPath(home_.root() + "/outside")));
+  EXPECT_FALSE(provider->itemReplacementDirectoryForURL(NSURL()));
+}
+
+TEST_F(UbiquitousItems, thatArePromisedHaveAPhysicalURL) {
+  const auto provider = NSFileManager::defaultManager()->ubiquitousItemProvider();
+  const NSURL folder = file_.URLByDeletingLastPathComponent();
+  const NSURL promised = folder.URLByAppendingPathComponent("b");
+  const NSURL promise = folder.URLByAppendingPathComponent(".b.droxafault");
+  EXPECT_EQ(provider->physicalURLForURL(promised), promised);
+  home_.write("replica/org.example.Box/Documents/.b.droxafault", "droxa promise 1\n");
+  EXPECT_EQ(provider->physicalURLForURL(promised), promise);
+  EXPECT_EQ(provider->physicalURLForURL(file_), file_);
+  EXPECT_EQ(provider->physicalURLForName(folder, "b"), promise);
+}
+
+// Its text alone could tell the name, and a rename doesn't change that.
+TEST_F(UbiquitousItems, thatArePromisedCantBeRenamedToANameThatLeavesNoRoom) {
+  const auto provider = NSFileManager::defaultManager()->ubiquitousItemProvider();
+  const NSURL folder = file_.URLByDeletingLastPathComponent();
+  for (const std::string &name : {std::string(250, 'x'), std::string("x~0123456789abcdef")}) {
+    const NSURL target = provider->physicalURLForName(folder, name);
+    EXPECT_EQ(::rename(file_.path().c_str(), target.path().c_str()), -1);
+    EXPECT_EQ(errno, ENAMETOOLONG);
+  }
 }
 
 }  // namespace droxa
