@@ -39,6 +39,11 @@ void KeldSession::getMoveCapability(const NSURL &source, const NSURL &destinatio
   daemon_->contents().getMoveCapability(source, destination, std::move(reply));
 }
 
+// What was meant while nobody is signed in is still meant when somebody is.
+void KeldSession::allowDeletionAtURL(const NSURL &url, QVContentsErrorReply reply) {
+  daemon_->contents().allowDeletionAtURL(url, std::move(reply));
+}
+
 void KeldSession::confirmDeletions(bool carryOut, QVContentsErrorReply reply) {
   if (const NSError error = daemon_->checkSignedIn()) return reply(error);
   daemon_->contents().confirmDeletions(carryOut, std::move(reply));

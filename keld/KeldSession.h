@@ -51,6 +51,7 @@ class KeldSession final : public QVProtocol, public std::enable_shared_from_this
   void getTransferStatus(QVTransferStatusReply reply) override;
   void waitForUploadAtURL(const NSURL &url, QVContentsErrorReply reply) override;
   void getMoveCapability(const NSURL &source, const NSURL &destination, QVMoveCapabilityReply reply) override;
+  void allowDeletionAtURL(const NSURL &url, QVContentsErrorReply reply) override;
   void confirmDeletions(bool carryOut, QVContentsErrorReply reply) override;
 
  private:

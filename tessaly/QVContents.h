@@ -132,6 +132,9 @@ class QVContentsProtocol {
   // error when it isn't possible at all.
   virtual void getMoveCapability(const NSURL &source, const NSURL &destination,
                                  QVMoveCapabilityReply reply) = 0;
+  // A person asked for the item at `url` to be deleted, with everything below it: those deletions are sent
+  // however many they are, and even while others are held. Kept until the items are gone. Errors: 14 alone.
+  virtual void allowDeletionAtURL(const NSURL &url, QVContentsErrorReply reply) = 0;
   // Answers a deletion spree that was stopped: carries it out in the cloud, or brings the documents back.
   virtual void confirmDeletions(bool carryOut, QVContentsErrorReply reply) = 0;
 };

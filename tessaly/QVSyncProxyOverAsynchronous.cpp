@@ -157,6 +157,11 @@ class BlockingProxy final : public QVSyncProxy, public QVProtocol {
       daemon.getMoveCapability(source, destination, std::move(answer));
     });
   }
+  void allowDeletionAtURL(const NSURL &url, QVContentsErrorReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVContentsErrorReply answer) {
+      daemon.allowDeletionAtURL(url, std::move(answer));
+    });
+  }
   void confirmDeletions(bool carryOut, QVContentsErrorReply reply) override {
     wait(reply, [&](QVProtocol &daemon, QVContentsErrorReply answer) {
       daemon.confirmDeletions(carryOut, std::move(answer));

@@ -11,6 +11,7 @@
 #include "platform/foundation/Paths.h"
 #include "tessaly/NSURL+Tessaly.h"
 #include "tessaly/QVDaemonConnection.h"
+#include "tessaly/QVLog.h"
 #include "tessaly/QVPhysicalURL.h"
 
 namespace droxa {
@@ -48,6 +49,14 @@ class DaemonItems final : public NSUbiquitousItemProviding {
     constexpr std::size_t kTooLong = 256;
     return folder.URLByAppendingPathComponent(
         QVPromiseNameForName(name).value_or(std::string(kTooLong, '.') + "droxafault"));
+  }
+
+  // Where it can't be told, the deletion is one like any other.
+  void willDeleteItemAtURL(const NSURL &url) override {
+    const auto daemon = QVDaemonConnection::defaultConnection()->newSyncProxy();
+    (*daemon)->allowDeletionAtURL(url, [&](const NSError &error) { daemon->setObjResult({}, error); });
+    if (const NSError error = daemon->error())
+      os_log_error(qvc_default_log(), "[ERROR] the deletion of %s can't be announced: %@", url.path(), error);
   }
 };
 

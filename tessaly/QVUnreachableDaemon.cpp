@@ -69,6 +69,7 @@ class UnreachableDaemon final : public QVProtocol {
                          QVMoveCapabilityReply /*reply*/) override {
     failed_();
   }
+  void allowDeletionAtURL(const NSURL & /*url*/, QVContentsErrorReply /*reply*/) override { failed_(); }
   void confirmDeletions(bool /*carryOut*/, QVContentsErrorReply /*reply*/) override { failed_(); }
 
  private:

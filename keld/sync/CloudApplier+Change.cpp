@@ -2,10 +2,12 @@
 
 #include <cerrno>
 #include <cstdio>
+#include <cstring>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include "keld/ItemAttributes.h"
 #include "keld/sync/CloudApplier.h"
 #include "keld/sync/ConflictName.h"
 #include "platform/foundation/NSDate.h"
@@ -22,10 +24,15 @@ void CloudApplier::change(const DocumentRecord &document, const Place &place, Sy
     touch(context_.files.pathOf(item.id));
     return;
   }
+  const bool sendsMetadata =
+      applyMetadata(document, location->folder.get(), location->name, location->item.metadata, &row);
+  if (sendsMetadata) context_.store.enqueue(item.id, false, false);
+  touch(location->path);
   const bool isMoved = document.parent != row.parent || document.name != row.name;
   if (isMoved && move(document, place, &*location)) {
     row.parent = document.parent;
     row.name = document.name;
+    noteTrash(document, location->name);
   } else if (isMoved) {
     // It can't be there: what it is called here goes to the cloud again.
     row.parent = document.parent;
@@ -45,6 +52,24 @@ void CloudApplier::change(const DocumentRecord &document, const Place &place, Sy
     return;
   }
   changeContents(document, std::move(row), *location);
+}
+
+bool CloudApplier::applyMetadata(const DocumentRecord &document, int folder, const std::string &name,
+                                 ItemMetadata here, SyncRow *row) {
+  if (!document.target.empty() || !document.metadata || *document.metadata == row->metadata) return false;
+  ReadMetadataOfFile(folder, name, &here);
+  const bool isChangedHere = here != row->metadata;
+  row->metadata = *document.metadata;
+  if (here == row->metadata) return false;
+  // Both sides changed it: what was written here is saved last.
+  if (isChangedHere) return true;
+  const int error = ApplyMetadataToFile(folder, name, QVItemMetadataChange::to(row->metadata));
+  // Kept as it is here, and left alone in the cloud.
+  if (error != 0) row->metadata = here;
+  if (error != 0 && error != ENOTSUP)
+    os_log_error(qvc_default_log(), "[ERROR] can't write the tags of %s: %s", name,
+                 std::string(std::strerror(error)));
+  return false;
 }
 
 bool CloudApplier::move(const DocumentRecord &document, const Place &place, FileLocation *location) {

@@ -8,6 +8,7 @@
 
 #include "keld/sync/CloudApplier.h"
 #include "keld/sync/ConflictName.h"
+#include "keld/sync/PutBackNotes.h"
 #include "platform/foundation/NSDate.h"
 #include "tessaly/QVLog.h"
 
@@ -15,7 +16,7 @@ namespace droxa::keld {
 
 namespace {
 
-constexpr int kMostTries = 100;
+constexpr unsigned kMostTries = 100;
 
 std::optional<FileFacts> factsAt(const FileLocation &location) {
   return ReadFileFacts(location.folder.get(), location.name, 0);
@@ -48,64 +49,79 @@ void CloudApplier::create(const DocumentRecord &document, const Place &place, Sy
   if (made && row.item != 0) context_.states.show({row.item, row.isDataless, true, row.local, isDocument});
 }
 
-bool CloudApplier::createFolder(const DocumentRecord &document, const Place &place, SyncRow *row) {
-  PreparedResult prepared = context_.storage.prepareFolder(markerOf(document), document.content.mode & 0777U);
-  if (!prepared.result.isDone()) return false;
+// What the file that is there now is to bear.
+void CloudApplier::placed(const DocumentRecord &document, const Place &place, const std::string &name,
+                          SyncRow *row) {
+  noteTrash(document, name);
+  row->metadata = {};
+  const bool sendsMetadata = applyMetadata(document, place.folder.get(), name, {}, row);
+  if (sendsMetadata && row->item != 0) context_.store.enqueue(row->item, false, false);
+}
+
+void CloudApplier::noteTrash(const DocumentRecord &document, const std::string &name) {
+  if (!document.putBack) return;
+  PutBackNotes(context_.files, context_.store).write(name, *document.putBack);
+  if (!context_.files.folderPath(document.putBack->parent)) early_[name] = *document.putBack;
+}
+
+// The folder that something in the trash was in may come after it.
+void CloudApplier::noteTrashAgain() {
+  for (auto each = early_.begin(); each != early_.end();) {
+    const bool isKnown = context_.files.folderPath(each->second.parent).has_value();
+    if (isKnown) PutBackNotes(context_.files, context_.store).write(each->first, each->second);
+    each = isKnown ? early_.erase(each) : std::next(each);
+  }
+}
+
+// Has `put` try the record's name, and others where that one is somebody else's.
+bool CloudApplier::putAtFreeName(const DocumentRecord &document, const Place &place, SyncRow *row,
+                                 const std::function<ContentsOutcome(const std::string &name)> &put) {
   std::string name = document.name;
-  for (int attempt = 0; attempt < kMostTries; ++attempt) {
-    const ContentsResult result = context_.storage.publishNew(prepared.file, place.folder.get(), name);
-    if (result.isDone()) {
+  for (unsigned attempt = 1; attempt <= kMostTries; ++attempt) {
+    const ContentsOutcome outcome = put(name);
+    if (outcome == ContentsOutcome::done) {
       touch(place.folderPath + "/" + name);
+      placed(document, place, name, row);
       return true;
     }
-    if (result.outcome != ContentsOutcome::nameTaken) return false;
+    if (outcome != ContentsOutcome::nameTaken) return false;
     const Taken taken = resolveTaken(document, place, name, row);
-    if (taken == Taken::isIt) return true;
+    if (taken == Taken::isIt) {
+      placed(document, place, name, row);
+      return true;
+    }
     if (taken == Taken::useOtherName)
-      name = ConflictName(document.name, document.device, NSDate::now().nanosecondsSince1970(),
-                          static_cast<unsigned>(attempt + 1));
+      name = ConflictName(document.name, document.device, NSDate::now().nanosecondsSince1970(), attempt);
   }
   return false;
 }
 
+bool CloudApplier::createFolder(const DocumentRecord &document, const Place &place, SyncRow *row) {
+  PreparedResult prepared = context_.storage.prepareFolder(markerOf(document), document.content.mode & 0777U);
+  if (!prepared.result.isDone()) return false;
+  return putAtFreeName(document, place, row, [&](const std::string &name) {
+    return context_.storage.publishNew(prepared.file, place.folder.get(), name).outcome;
+  });
+}
+
 bool CloudApplier::createLink(const DocumentRecord &document, const Place &place, SyncRow *row) {
   if (document.target.empty()) return false;
-  std::string name = document.name;
-  for (int attempt = 0; attempt < kMostTries; ++attempt) {
-    if (::symlinkat(document.target.c_str(), place.folder.get(), name.c_str()) == 0) {
-      touch(place.folderPath + "/" + name);
-      return true;
-    }
-    if (errno != EEXIST) return false;
-    const Taken taken = resolveTaken(document, place, name, row);
-    if (taken == Taken::isIt) return true;
-    if (taken == Taken::useOtherName)
-      name = ConflictName(document.name, document.device, NSDate::now().nanosecondsSince1970(),
-                          static_cast<unsigned>(attempt + 1));
-  }
-  return false;
+  return putAtFreeName(document, place, row, [&](const std::string &name) {
+    if (::symlinkat(document.target.c_str(), place.folder.get(), name.c_str()) == 0)
+      return ContentsOutcome::done;
+    return errno == EEXIST ? ContentsOutcome::nameTaken : ContentsOutcome::error;
+  });
 }
 
 bool CloudApplier::createDocument(const DocumentRecord &document, const Place &place, SyncRow *row) {
   PreparedResult prepared = context_.storage.preparePlaceholder(
       markerOf(document), document.content.mode & 0777U, {0, document.content.modified});
   if (!prepared.result.isDone()) return false;
-  std::string name = document.name;
-  for (int attempt = 0; attempt < kMostTries; ++attempt) {
+  return putAtFreeName(document, place, row, [&](const std::string &name) {
     const ContentsResult result = context_.storage.publishNew(prepared.file, place.folder.get(), name);
-    if (result.isDone()) {
-      row->local = LocalFileOf(result.facts);
-      touch(place.folderPath + "/" + name);
-      return true;
-    }
-    if (result.outcome != ContentsOutcome::nameTaken) return false;
-    const Taken taken = resolveTaken(document, place, name, row);
-    if (taken == Taken::isIt) return true;
-    if (taken == Taken::useOtherName)
-      name = ConflictName(document.name, document.device, NSDate::now().nanosecondsSince1970(),
-                          static_cast<unsigned>(attempt + 1));
-  }
-  return false;
+    if (result.isDone()) row->local = LocalFileOf(result.facts);
+    return result.outcome;
+  });
 }
 
 // --- The name is taken.

@@ -42,6 +42,7 @@ CloudApplier::CloudApplier(const SyncContext &context, ConflictCopies &conflicts
     : context_(context), conflicts_(conflicts) {}
 
 NSError CloudApplier::fetchAndApply(const CKCallContext &call) {
+  undoUnfinished();
   NSError problem = fetchPages(call);
   if (!problem) problem = fetchAgain(call);
   if (!problem && !hasFetchedAll()) context_.store.setNumber(kHasFetchedAll, 1);
@@ -107,6 +108,7 @@ NSError CloudApplier::applyPage(const CKZoneChanges &page) {
   // Another cloud that came into this one's place has none of the records.
   if (endsAll && isSameCloud_ && !isSameCloud_())
     return CKErrorMake(CKErrorCode::changeTokenExpired, "the cloud was replaced while it was read");
+  beginUnfinished(documents);
   context_.store.transaction([&] {
     applyAll(documents);
     for (const CKDeletedRecord &deleted : page.deletedRecords) remove(deleted.recordID.recordName);
@@ -117,12 +119,8 @@ NSError CloudApplier::applyPage(const CKZoneChanges &page) {
     if (!page.moreComing) removeFolders();
     const auto token = page.token.data.bytes();
     context_.store.setText(kToken, {reinterpret_cast<const char *>(token.data()), token.size()});
-    if (!touched_.empty()) {
-      // The token says that all of this was done, so it has to be on the disk first.
-      const OwnedDescriptor replica(
-          ::open(context_.files.replicaPath().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-      if (replica) ::syncfs(replica.get());
-    }
+    // The token says that all of this was done, so it has to be on the disk first.
+    if (!touched_.empty()) syncReplica();
   });
   if (endsAll) {
     fetchesAll_ = false;
@@ -163,6 +161,7 @@ void CloudApplier::applyRecords(const std::vector<CKRecord> &records, const CKCa
   std::vector<DocumentRecord> documents;
   for (const CKRecord &record : records)
     if (auto document = ReadRecord(record)) documents.push_back(std::move(*document));
+  beginUnfinished(documents);
   context_.store.transaction([&] { applyAll(documents); });
   finishBatch();
   (void)fetchAgain(call);  // what it can't have now comes with the next fetch
@@ -178,31 +177,48 @@ NSError CloudApplier::fetchAgain(const CKCallContext &call) {
     if (wanted.empty()) return NSError();
     const CKFetchReply reply = context_.cloud.fetchRecords(wanted, std::nullopt, call);
     if (reply.error && !CKErrorIs(reply.error, CKErrorCode::partialFailure)) return reply.error;
-    context_.store.transaction([&] {
-      std::vector<DocumentRecord> documents;
-      for (const CKRecordResult &result : reply.results) {
-        const std::string &record = result.recordID.recordName;
-        const auto document = result.error ? std::nullopt : ReadRecord(result.record);
-        const bool isGone = CKErrorIs(result.error, CKErrorCode::unknownItem);
-        if (result.error && !isGone) continue;
-        context_.store.fetched(record);
-        if (isGone) remove(record);
-        if (document) documents.push_back(*document);
-      }
-      applyAll(documents);
-      removeFolders();
-    });
+    applyFetched(reply.results);
     finishBatch();
   }
 }
 
+void CloudApplier::applyFetched(const std::vector<CKRecordResult> &results) {
+  std::vector<DocumentRecord> documents;
+  std::vector<std::string> answered, gone;
+  for (const CKRecordResult &result : results) {
+    const bool isGone = CKErrorIs(result.error, CKErrorCode::unknownItem);
+    if (result.error && !isGone) continue;
+    answered.push_back(result.recordID.recordName);
+    if (isGone) gone.push_back(result.recordID.recordName);
+    auto document = isGone ? std::nullopt : ReadRecord(result.record);
+    if (document) documents.push_back(std::move(*document));
+  }
+  beginUnfinished(documents);
+  context_.store.transaction([&] {
+    for (const std::string &record : answered) context_.store.fetched(record);
+    for (const std::string &record : gone) remove(record);
+    applyAll(documents);
+    removeFolders();
+  });
+}
+
+void CloudApplier::syncReplica() const {
+  const OwnedDescriptor replica(
+      ::open(context_.files.replicaPath().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  if (replica) ::syncfs(replica.get());
+}
+
 void CloudApplier::finishBatch() {
+  noteTrashAgain();
   context_.states.flush();
   if (!touched_.empty()) context_.states.lookAt(std::exchange(touched_, {}));
 }
 
 void CloudApplier::applyAll(const std::vector<DocumentRecord> &documents) {
-  for (const DocumentRecord &document : documents) apply(document);
+  for (const DocumentRecord &document : documents) {
+    apply(document);
+    context_.store.finished(document.record);
+  }
 }
 
 bool CloudApplier::openPlace(const std::string &parentRecord, Place *place) {
@@ -288,99 +304,7 @@ DocumentMarker CloudApplier::markerOf(const DocumentRecord &document) const {
   return marker;
 }
 
-// --- Deletions.
-
-void CloudApplier::remove(const std::string &record) {
-  context_.store.dropOrphan(record);
-  const auto row = context_.store.byRecord(record);
-  if (!row) return;
-  ++applied_;
-  const auto location = row->item != 0 ? context_.files.locate(row->item, nullptr) : std::nullopt;
-  if (!location && row->item != 0 && context_.files.item(row->item)) {
-    touch(context_.files.pathOf(row->item));
-    return context_.store.fetchAgain(record);
-  }
-  if (!location) {
-    if (row->item != 0) context_.store.dropQueued(row->item);
-    // Made a moment ago, and not seen by the keeper yet.
-    const auto path = row->item == 0 ? context_.files.path(*row) : std::nullopt;
-    int code = 0;
-    if (path) {
-      FileLocation there;
-      there.path = *path;
-      there.name = row->name;
-      there.folder = context_.files.openFolder(path->substr(0, path->size() - row->name.size() - 1), &code);
-      const auto marker = there ? ReadMarker(there.folder.get(), there.name) : std::nullopt;
-      if (marker && marker->recordName == record) {
-        if (row->kind == NSFileProviderItemKind::folder) {
-          foldersToRemove_.push_back(record);
-          return;
-        }
-        return removeDocument(*row, there);
-      }
-    }
-    context_.store.erase(record);
-    return;
-  }
-  if (row->kind == NSFileProviderItemKind::folder)
-    foldersToRemove_.push_back(record);
-  else
-    removeDocument(*row, *location);
-}
-
-void CloudApplier::removeDocument(const SyncRow &row, const FileLocation &location) {
-  const auto facts = ReadFileFacts(location.folder.get(), location.name, 0);
-  const bool isLink = facts && (IsLink(facts->kind));
-  bool isUnchanged = isLink || !facts;
-  if (row.kind == NSFileProviderItemKind::document) {
-    const DocumentLook look = context_.storage.classify(location.folder.get(), location.name);
-    const bool isIntact = look.kind == DocumentClass::present || look.kind == DocumentClass::dataless ||
-                          look.kind == DocumentClass::evicting;
-    isUnchanged = (isIntact && look.marker && look.marker->recordName == row.record) ||
-                  (look.kind == DocumentClass::plain && IsSameContents(LocalFileOf(look.facts), row.local));
-  }
-  context_.store.erase(row.record);
-  if (!isUnchanged) {
-    // Deleted elsewhere, and written here since: it lives, as a document of its own.
-    if (row.item != 0) context_.store.enqueue(row.item, false, false);
-    os_log(qvc_default_log(), "[WARNING] %s was deleted elsewhere, but changed here: it is kept",
-           location.path);
-    return;
-  }
-  ::unlinkat(location.folder.get(), location.name.c_str(), 0);
-  touch(location.path);
-}
-
-// The deepest first. One that still holds something was given contents here meanwhile: it lives.
-void CloudApplier::removeFolders() {
-  struct Doomed {
-    std::string record;
-    std::string path;
-  };
-  std::vector<Doomed> doomed;
-  for (const std::string &record : std::exchange(foldersToRemove_, {})) {
-    const auto row = context_.store.byRecord(record);
-    const auto path = row ? context_.files.path(*row) : std::nullopt;
-    if (path)
-      doomed.push_back({record, *path});
-    else
-      context_.store.erase(record);
-  }
-  std::sort(doomed.begin(), doomed.end(),
-            [](const Doomed &a, const Doomed &b) { return a.path.size() > b.path.size(); });
-  for (const Doomed &folder : doomed) {
-    const auto row = context_.store.byRecord(folder.record);
-    const int result = ::rmdir(context_.files.absolute(folder.path).c_str());
-    const bool isGone = result == 0 || errno == ENOENT;
-    context_.store.erase(folder.record);
-    touch(folder.path);
-    if (isGone || !row || row->item == 0) continue;
-    // It gets a record of its own, which what is left in it has to be told.
-    context_.store.enqueue(row->item, false, false);
-    for (const SyncRow &child : context_.store.childrenOf(folder.record, UINT32_MAX))
-      if (child.item != 0) context_.store.enqueue(child.item, false, false);
-  }
-}
+// --- What is missing here.
 
 void CloudApplier::bringBack(const SyncRow &row) {
   SyncRow fresh = row;
@@ -398,6 +322,12 @@ void CloudApplier::bringBackWhatIsMissing() {
     for (const std::string &record : context_.store.unboundInCloud())
       if (const auto row = context_.store.byRecord(record)) bringBack(*row);
   });
+}
+
+void CloudApplier::replicaWasSeen() {
+  isReplicaSeen_ = true;
+  undoUnfinished();
+  bringBackWhatIsMissing();
 }
 
 }  // namespace droxa::keld

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <functional>
+#include <map>
 #include <set>
 #include <string>
 #include <vector>
@@ -25,9 +26,9 @@ class CloudApplier {
   void applyRecords(const std::vector<CKRecord> &records, const CKCallContext &call);
   // Brings back what was deleted here and not in the cloud, with the next fetch.
   void bringBack(const SyncRow &row);
-  // Asks for records again that no file stands for though the cloud has them: after the first look at the
-  // whole replica.
-  void bringBackWhatIsMissing();
+  // The whole replica was looked at: records that no file stands for though the cloud has them are asked for
+  // again, and what a process that ended in the middle had made is gone.
+  void replicaWasSeen();
   // Everything that the cloud has was seen once. Before that, what is new here may be known there.
   bool hasFetchedAll();
   // Asked before much is believed to be deleted: whether the cloud is still the same one.
@@ -44,6 +45,15 @@ class CloudApplier {
   NSError applyPage(const CKZoneChanges &page);
   void applyAll(const std::vector<DocumentRecord> &documents);
   NSError fetchAgain(const CKCallContext &call);
+  void applyFetched(const std::vector<CKRecordResult> &results);
+  // Before a transaction that makes them.
+  void beginUnfinished(const std::vector<DocumentRecord> &documents);
+  void undoUnfinished();
+  using UnfinishedRecords = std::map<std::string, UnfinishedRecord>;
+  bool removeUnfinishedIn(const std::string &folderPath, const UnfinishedRecords &records, int depth);
+  bool removeUnfinished(const FileLocation &location, const std::string &record);
+  void bringBackWhatIsMissing();
+  void syncReplica() const;
   void beginFetchOfAll();
   void removeUnseen();
   void sendAgain(const std::string &record);
@@ -56,6 +66,16 @@ class CloudApplier {
   bool createFolder(const DocumentRecord &document, const Place &place, SyncRow *row);
   bool createLink(const DocumentRecord &document, const Place &place, SyncRow *row);
   bool createDocument(const DocumentRecord &document, const Place &place, SyncRow *row);
+  // Something is in the trash under that name now.
+  void noteTrash(const DocumentRecord &document, const std::string &name);
+  // Writes what users note onto the file, unless it was changed here since the cloud was told of it. Whether
+  // the cloud has to be told what is here. A link bears nothing.
+  bool applyMetadata(const DocumentRecord &document, int folder, const std::string &name, ItemMetadata here,
+                     SyncRow *row);
+  void noteTrashAgain();
+  void placed(const DocumentRecord &document, const Place &place, const std::string &name, SyncRow *row);
+  bool putAtFreeName(const DocumentRecord &document, const Place &place, SyncRow *row,
+                     const std::function<ContentsOutcome(const std::string &name)> &put);
   // Something has the name already: whether it is the document itself, or was moved out of the way.
   enum class Taken { isIt, freed, useOtherName };
   Taken resolveTaken(const DocumentRecord &document, const Place &place, const std::string &name,
@@ -83,9 +103,11 @@ class CloudApplier {
   const SyncContext &context_;
   ConflictCopies &conflicts_;
   std::vector<std::string> touched_;          // paths that the keeper is to look at
+  std::map<std::string, PutBack> early_;      // by the names in the trash, until the folder is known
   std::vector<std::string> foldersToRemove_;  // records
   std::uint64_t applied_ = 0;
   std::function<bool()> isSameCloud_;
+  bool isReplicaSeen_ = false;
   bool fetchesAll_ = false;
   std::set<std::string> seen_;  // while everything is fetched anew
 };

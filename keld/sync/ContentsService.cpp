@@ -58,13 +58,9 @@ void ContentsService::find(const NSURL &url, Found found) {
   });
 }
 
-std::vector<ItemRecord> ContentsService::documentsBelow(
-    const ItemRecord &item, const std::function<bool(const ItemRecord &)> &wanted) {
-  std::vector<ItemRecord> documents;
-  if (!item.isFolder()) {
-    if (isDocument(item) && wanted(item)) documents.push_back(item);
-    return documents;
-  }
+void ContentsService::forEachBelow(const ItemRecord &item,
+                                   const std::function<void(ItemRecord &child)> &each) {
+  if (!item.isFolder()) return;
   (void)host_.read([&](ItemQueries &queries) {
     std::vector<ItemNumber> folders{item.id};
     while (!folders.empty()) {
@@ -77,13 +73,20 @@ std::vector<ItemRecord> ContentsService::documentsBelow(
         key.atStart = false;
         key.name = children.back().name;
         for (ItemRecord &child : children) {
-          if (child.isFolder())
-            folders.push_back(child.id);
-          else if (isDocument(child) && wanted(child))
-            documents.push_back(std::move(child));
+          if (child.isFolder()) folders.push_back(child.id);
+          each(child);
         }
       }
     }
+  });
+}
+
+std::vector<ItemRecord> ContentsService::documentsBelow(
+    const ItemRecord &item, const std::function<bool(const ItemRecord &)> &wanted) {
+  std::vector<ItemRecord> documents;
+  if (isDocument(item) && wanted(item)) documents.push_back(item);
+  forEachBelow(item, [&](ItemRecord &child) {
+    if (isDocument(child) && wanted(child)) documents.push_back(std::move(child));
   });
   return documents;
 }
@@ -328,6 +331,17 @@ void ContentsService::waitForUploadAtURL(const NSURL &url, QVContentsErrorReply 
       self->engine_->whenUploaded(std::move(items), reply);
     });
   });
+}
+
+void ContentsService::allowDeletionAtURL(const NSURL &url, QVContentsErrorReply reply) {
+  find(url,
+       [self = shared_from_this(), reply = std::move(reply)](const ItemRecord *item, const NSError &error) {
+         if (!item) return reply(error);
+         std::vector<ItemNumber> items{item->id};
+         self->forEachBelow(*item, [&](ItemRecord &child) { items.push_back(child.id); });
+         self->engine_->store().allowDeletions(items);
+         reply(NSError());
+       });
 }
 
 void ContentsService::confirmDeletions(bool carryOut, QVContentsErrorReply reply) {

@@ -35,6 +35,7 @@ class ContentsService final : public QVContentsProtocol,
   void getTransferStatus(QVTransferStatusReply reply) override;
   void waitForUploadAtURL(const NSURL &url, QVContentsErrorReply reply) override;
   void getMoveCapability(const NSURL &source, const NSURL &destination, QVMoveCapabilityReply reply) override;
+  void allowDeletionAtURL(const NSURL &url, QVContentsErrorReply reply) override;
   void confirmDeletions(bool carryOut, QVContentsErrorReply reply) override;
 
  private:
@@ -42,6 +43,8 @@ class ContentsService final : public QVContentsProtocol,
   // Finds the item at the URL, looking on disk where it isn't known. `found` comes once, on any thread.
   void find(const NSURL &url, Found found);
   std::optional<ItemRecord> known(const std::string &path, NSError *error);
+  // Calls `each` with what is below the folder, and with nothing for another item.
+  void forEachBelow(const ItemRecord &item, const std::function<void(ItemRecord &child)> &each);
   // The item, or everything below it, that `wanted` says yes to.
   std::vector<ItemRecord> documentsBelow(const ItemRecord &item,
                                          const std::function<bool(const ItemRecord &)> &wanted);

@@ -3,6 +3,7 @@
 #include <uuid/uuid.h>
 
 #include "keld/Placement.h"
+#include "tessaly/QVContainer.h"
 
 namespace droxa::keld {
 
@@ -26,6 +27,34 @@ std::int64_t integer(const CKRecord &record, const char *key, std::int64_t other
 std::string bytes(const CKRecord &record, const char *key) {
   const std::string *value = record.get<std::string>(key);
   return value ? *value : std::string();
+}
+
+CKRecordValue textOrNone(std::string text) {
+  if (text.empty()) return std::monostate();
+  return text;
+}
+
+CKRecordValue integerOrNone(std::int64_t value) {
+  if (value == 0) return std::monostate();
+  return value;
+}
+
+void setMetadata(const ItemMetadata &metadata, CKRecord *record) {
+  record->fields[kRecordKeyTags] = textOrNone(QVEncodeTagNames(metadata.tags));
+  record->fields[kRecordKeyLastUsed] = integerOrNone(metadata.lastUsed);
+  record->fields[kRecordKeyFavoriteRank] = integerOrNone(static_cast<std::int64_t>(metadata.favoriteRank));
+}
+
+bool isInTrashItself(const DocumentRecord &document) {
+  return document.parent == ContainerRecord(QVUbiquitousTrashContainerID);
+}
+
+void setPutBack(const DocumentRecord &document, CKRecord *record) {
+  if (isInTrashItself(document) && !document.putBack) return;
+  const PutBack putBack = isInTrashItself(document) ? *document.putBack : PutBack();
+  record->fields[kRecordKeyPutBackParent] = textOrNone(putBack.parent);
+  record->fields[kRecordKeyPutBackName] = textOrNone(putBack.name);
+  record->fields[kRecordKeyTrashed] = integerOrNone(putBack.trashed);
 }
 
 }  // namespace
@@ -63,6 +92,8 @@ CKRecord MakeRecord(const DocumentRecord &document) {
     record.fields[kRecordKeyTarget] = std::monostate();
   else
     record.fields[kRecordKeyTarget] = document.target;
+  if (document.metadata) setMetadata(*document.metadata, &record);
+  setPutBack(document, &record);
   return record;
 }
 
@@ -84,6 +115,14 @@ std::optional<DocumentRecord> ReadRecord(const CKRecord &record) {
   document.name = bytes(record, kRecordKeyName);
   document.target = bytes(record, kRecordKeyTarget);
   document.device = record.modifiedByDevice;
+  const std::int64_t rank = integer(record, kRecordKeyFavoriteRank, 0);
+  document.metadata =
+      ItemMetadata{QVDecodeTagNames(bytes(record, kRecordKeyTags)), integer(record, kRecordKeyLastUsed, 0),
+                   rank < 0 ? 0 : static_cast<std::uint64_t>(rank)};
+  PutBack putBack{bytes(record, kRecordKeyPutBackParent), bytes(record, kRecordKeyPutBackName),
+                  integer(record, kRecordKeyTrashed, 0)};
+  if (isInTrashItself(document) && !putBack.parent.empty() && isFileName(putBack.name))
+    document.putBack = std::move(putBack);
   const std::int64_t kind = integer(record, kRecordKeyKind, -1);
   const std::int64_t size = integer(record, kRecordKeySize, 0);
   if (kind < 0 || kind > 3 || size < 0 || size > kMostSize) return std::nullopt;

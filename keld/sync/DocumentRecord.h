@@ -11,6 +11,14 @@ namespace droxa::keld {
 // The zone that holds a drive's items.
 CKRecordZoneID DriveZone();
 
+// Where an item of the trash was, and since when it isn't there any more.
+struct PutBack {
+  std::string parent;  // as DocumentRecord's
+  std::string name;
+  std::int64_t trashed = 0;  // nanoseconds since 1970
+  bool operator==(const PutBack &) const = default;
+};
+
 // What a record of the cloud says of an item.
 struct DocumentRecord {
   std::string record;
@@ -19,8 +27,11 @@ struct DocumentRecord {
   std::string name;
   NSFileProviderItemKind kind = NSFileProviderItemKind::document;
   ContentVersion content;
-  std::string target;  // of a symbolic link or an alias
-  std::string device;  // that saved it last
+  // Saved without these, a record keeps what the cloud has.
+  std::optional<ItemMetadata> metadata;
+  std::optional<PutBack> putBack;  // of what lies in the trash itself; elsewhere there is none
+  std::string target;              // of a symbolic link or an alias
+  std::string device;              // that saved it last
 };
 
 // What stands for a container's documents folder as a parent; it has no record of its own.
@@ -37,6 +48,14 @@ inline constexpr char kRecordKeyModified[] = "modified";
 inline constexpr char kRecordKeyMode[] = "mode";
 inline constexpr char kRecordKeyTarget[] = "target";
 inline constexpr char kRecordKeyContent[] = "content";
+// What users note; a record without them has none.
+inline constexpr char kRecordKeyTags[] = "tags";  // as QVEncodeTagNames writes them
+inline constexpr char kRecordKeyLastUsed[] = "lastUsed";
+inline constexpr char kRecordKeyFavoriteRank[] = "favoriteRank";
+// Of what lies in the trash: the folder that it was in (as a parent), its name there, and when that was.
+inline constexpr char kRecordKeyPutBackParent[] = "putBackParent";
+inline constexpr char kRecordKeyPutBackName[] = "putBackName";
+inline constexpr char kRecordKeyTrashed[] = "trashed";
 
 CKRecordID RecordID(const std::string &record);
 // The record without its contents: a save leaves those that the cloud has.

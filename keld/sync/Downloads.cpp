@@ -229,6 +229,16 @@ void Downloads::noteOutcome(const Transfer &transfer, const NSError &error) {
       std::min<std::chrono::seconds>(kFirstRetry * (1 << std::min(retry.failures, 20)), kLongestRetry);
   ++retry.failures;
   retry.when = std::chrono::steady_clock::now() + pause;
+  if (retryIsKnown_) retryIsKnown_();
+}
+
+std::optional<std::chrono::steady_clock::time_point> Downloads::nextRetry() const {
+  const Lock lock(mutex_);
+  std::optional<std::chrono::steady_clock::time_point> next;
+  if (stopped_ || pausedBecause_) return next;
+  for (const auto &[item, retry] : retries_)
+    if (byItem_.count(item) == 0 && (!next || retry.when < *next)) next = retry.when;
+  return next;
 }
 
 void Downloads::end(std::uint64_t number, const NSError &outcome) {

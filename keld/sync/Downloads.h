@@ -45,6 +45,9 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
   using ConflictHandler = std::function<ContentsResult(const FileLocation &location, PreparedFile &prepared)>;
   void setConflictHandler(ConflictHandler handler) { keepBoth_ = std::move(handler); }
 
+  // Called when there is something new for retryDue(), with this object's lock held. Set once, likewise.
+  void setRetryHandler(std::function<void()> handler) { retryIsKnown_ = std::move(handler); }
+
   // One who wants the document here. The transfer is cancelled when the last of them has gone.
   class Interest {
    public:
@@ -67,6 +70,7 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
   void fetchInBackground(ItemNumber item, std::uint64_t size);
   void retryDue();
   void retryAllNow();  // the cloud is back
+  std::optional<std::chrono::steady_clock::time_point> nextRetry() const;
   // While paused nothing is begun; what runs ends with `why`.
   void pause(const NSError &why);
   void resume();
@@ -124,6 +128,7 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
   ItemStates &states_;
   const DownloadOptions options_;
   ConflictHandler keepBoth_;
+  std::function<void()> retryIsKnown_;
 
   mutable Mutex mutex_;
   std::map<std::uint64_t, Transfer> transfers_ GUARDED_BY(mutex_);  // by their numbers

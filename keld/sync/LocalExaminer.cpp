@@ -99,7 +99,7 @@ void LocalExaminer::guardAgainstSpree(const std::vector<Change> &changes) {
   std::uint64_t deaths = 0;
   const std::uint64_t rank = changes.back().rank;
   for (const Change &change : changes)
-    if (change.isDeath && store_.byItem(change.item)) ++deaths;
+    if (change.isDeath && isUnasked(change.item)) ++deaths;
   if (deaths == 0) return;
   if (isReplicaItself_ && !isReplicaItself_()) return holdDeletions();
   const std::uint64_t known = recentDeaths(deaths);
@@ -110,7 +110,7 @@ void LocalExaminer::guardAgainstSpree(const std::vector<Change> &changes) {
     std::vector<Tombstone> next;
     (void)read_([&](ItemQueries &queries) { next = queries.deadAfter(after, kChangesAtATime); });
     for (const Tombstone &death : next)
-      if (store_.byItem(death.id)) ++following;
+      if (isUnasked(death.id)) ++following;
     more = next.size() == kChangesAtATime;
     if (more) after = next.back().rank;
   }
@@ -144,20 +144,25 @@ void LocalExaminer::forgetHoldIfNothingIsHeld() {
   if (holdsDeletions_ && store_.countHeld() == 0) allowDeletions();
 }
 
+// Whether the cloud has what has died, and nobody is known to have wanted that.
+bool LocalExaminer::isUnasked(ItemNumber item) {
+  return store_.byItem(item) && !store_.isDeletionAllowed(item);
+}
+
 void LocalExaminer::examineDeath(ItemNumber item) {
-  if (store_.byItem(item))
-    queue(item, true);
-  else
-    store_.dropQueued(item);
+  if (store_.byItem(item)) return queue(item, true);
+  store_.dropQueued(item);
+  store_.forgetAllowedDeletion(item);
 }
 
 void LocalExaminer::queue(ItemNumber item, bool isDeletion) {
   std::int64_t notBefore = 0;
-  if (isDeletion)
+  const bool isUnaskedDeletion = isDeletion && !store_.isDeletionAllowed(item);
+  if (isUnaskedDeletion)
     notBefore = std::chrono::duration_cast<std::chrono::milliseconds>(
                     std::chrono::system_clock::now().time_since_epoch() + guard_.pause)
                     .count();
-  store_.enqueue(item, isDeletion, isDeletion && holdsDeletions_, notBefore);
+  store_.enqueue(item, isDeletion, isUnaskedDeletion && holdsDeletions_, notBefore);
   queuedAny_ = true;
 }
 
@@ -190,6 +195,7 @@ bool LocalExaminer::isClean(const ItemRecord &item, SyncRow &row, const std::str
       !IsSameKind(row.kind, item.facts.kind))
     return false;
   if (IsLink(item.facts.kind)) return row.local.inode == 0 || row.local.inode == item.facts.inode;
+  if (row.metadata != item.metadata) return false;
   if ((row.content.mode & 0777) != (item.facts.mode & 0777)) return false;
   return item.facts.kind == NSFileProviderItemKind::folder || hasSyncedContents(item, row);
 }

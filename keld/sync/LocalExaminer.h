@@ -67,6 +67,7 @@ class LocalExaminer {
   std::vector<Change> nextChanges(std::uint64_t after);
   void examineLive(const ItemRecord &item);
   void examineDeath(ItemNumber item);
+  bool isUnasked(ItemNumber item);
   bool bindLink(const ItemRecord &item, SyncRow row);
   bool hasSyncedContents(const ItemRecord &item, SyncRow &row);
   std::optional<SyncRow> findUnmarked(const ItemRecord &item, const std::string &parent);

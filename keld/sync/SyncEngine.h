@@ -63,8 +63,6 @@ class SyncEngine {
   bool perform(std::function<void()> work);
   // The same, and returns when it was run; false when it wasn't. Not to be called on the sync's thread.
   bool performAndWait(std::function<void()> work);
-  // Fetches what the cloud has now; `done` comes when it is applied, or couldn't be.
-  void fetchNow(std::function<void(const NSError &error)> done);
   // Calls `done` (on the pool) when nothing of `items` (empty: nothing at all) waits to be sent any more, or
   // with why one of them can't be.
   void whenUploaded(std::vector<ItemNumber> items, std::function<void(const NSError &error)> done);
@@ -93,7 +91,6 @@ class SyncEngine {
   void checkReplica();
   bool isReplicaItself() const;
   void afterFirstScan();
-  void answerFetchers(const NSError &error);
   void noteEnd();
   void bindAnew(const std::string &itemDatabase);
   void round();
@@ -144,7 +141,6 @@ class SyncEngine {
   bool hasCloudNews_ GUARDED_BY(mutex_) = true;
   std::vector<std::function<void()>> work_ GUARDED_BY(mutex_);
   std::vector<Waiter> waiters_ GUARDED_BY(mutex_);  // asked since the round began
-  std::vector<std::function<void(const NSError &)>> fetchers_ GUARDED_BY(mutex_);
   std::string cloudProblem_ GUARDED_BY(mutex_);
   TransferRate uploadRate_ GUARDED_BY(mutex_);
   std::thread thread_;

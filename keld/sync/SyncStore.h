@@ -47,6 +47,7 @@ struct SyncRow {
   ContentVersion content;
   LocalFile local;
   bool isDataless = false;
+  ItemMetadata metadata;
   // A newer version that is to replace the local contents; digest "" when there is none.
   std::string newerTag;
   ContentVersion newer;
@@ -63,6 +64,12 @@ struct QueuedUpload {
   bool isDeletion = false;
   bool isHeld = false;  // a deletion that waits for a person's word
   NSError error;        // of the last attempt
+};
+
+// A record that is about to be given a file or folder of its own here, and where that is to be.
+struct UnfinishedRecord {
+  std::string record, parent, name;
+  NSFileProviderItemKind kind = NSFileProviderItemKind::document;
 };
 
 // The device's side of the sync, in a database of its own: what is known of the cloud's records, the uploads
@@ -107,6 +114,15 @@ class SyncStore {
   void fetched(const std::string &record);
   std::uint64_t countToFetch();
 
+  // What is made before its row is committed is written down first, on the disk before this returns, so that
+  // a file that was made by a transaction that never ended isn't taken for a person's. Not to be called
+  // inside a transaction; finished() belongs to the one that has the row.
+  void beginUnfinished(const std::vector<UnfinishedRecord> &records);
+  void finished(const std::string &record);
+  std::vector<UnfinishedRecord> unfinished();
+  std::optional<UnfinishedRecord> unfinished(const std::string &record);
+  void forgetUnfinished();  // all
+
   // Contents whose save was begun, and may have been carried out without this device being told.
   void noteSent(const std::string &record, const std::string &digest);
   void forgetSent(const std::string &record);
@@ -128,10 +144,15 @@ class SyncStore {
   std::uint64_t countQueued();
   std::uint64_t countFailed();
   std::uint64_t countHeld();
-  std::uint64_t countDeletions();
-  void holdDeletions();  // all that wait
+  std::uint64_t countDeletions();  // that nobody is known to have asked for
+  void holdDeletions();            // all that wait
   void releaseHeld();
   std::vector<QueuedUpload> held(std::uint64_t limit);
+
+  // Deletions that a person asked for, before the items died; they are never held.
+  void allowDeletions(const std::vector<ItemNumber> &items);
+  bool isDeletionAllowed(ItemNumber item);
+  void forgetAllowedDeletion(ItemNumber item);
 
   // Pins, by item.
   void setPinned(ItemNumber item, bool isPinned);
@@ -147,6 +168,7 @@ class SyncStore {
   SyncRow read(const SqlStatement &row);
   std::optional<SyncRow> one(SqlStatement &statement);
   std::vector<SyncRow> all(SqlStatement &statement);
+  static std::vector<UnfinishedRecord> readUnfinished(SqlStatement &asked);
   QueuedUpload readQueued(const SqlStatement &row);
   std::vector<QueuedUpload> queuedOf(SqlStatement &statement);
   SqlStatement &statement(const char *sql) REQUIRES(mutex_);

@@ -6,7 +6,10 @@
 #include <fcntl.h>
 #include <unistd.h>
 
+#include "keld/ItemAttributes.h"
 #include "keld/sync/CloudErrors.h"
+#include "keld/sync/PutBackNotes.h"
+#include "tessaly/QVContainer.h"
 #include "tessaly/QVLog.h"
 
 namespace droxa::keld {
@@ -34,6 +37,16 @@ bool isSyncedItem(const ItemRecord &item) {
 // A lease that an eviction holds, or a writer, for a moment.
 bool isBusy(int code) {
   return code == EWOULDBLOCK || code == ETXTBSY;
+}
+
+// What the user notes on the item, where the cloud doesn't know it. The table may be a moment behind the
+// file.
+std::optional<ItemMetadata> changedMetadata(const FileLocation &location, const SyncRow &row) {
+  if (IsLink(location.item.facts.kind)) return std::nullopt;
+  ItemMetadata metadata = location.item.metadata;
+  ReadMetadataOfFile(location.folder.get(), location.name, &metadata);
+  if (metadata == row.metadata) return std::nullopt;
+  return metadata;
 }
 
 OwnedDescriptor openFile(const FileLocation &location) {
@@ -180,6 +193,9 @@ Uploader::Prepared Uploader::prepareSave(const ItemRecord &item, Plan *plan, con
   }
   if (auto bound = context_.store.byItem(item.id)) row = std::move(*bound);
   if (row.record.empty()) {
+    // The applier is about to find out whether that may stay.
+    const auto marker = ReadMarker(location->folder.get(), location->name);
+    if (marker && context_.store.unfinished(marker->recordName)) return laterWith(plan, NSError());
     // Written down before it is sent, so that a lost reply doesn't make a second record.
     row.record = NewRecordName();
     row.item = item.id;
@@ -197,6 +213,10 @@ Uploader::Prepared Uploader::prepareSave(const ItemRecord &item, Plan *plan, con
   document.kind = location->item.facts.kind;
   document.content = row.content;
   document.content.mode = location->item.facts.mode & 07777;
+  document.metadata = changedMetadata(*location, row);
+  const bool isTrash = parent == ContainerRecord(QVUbiquitousTrashContainerID);
+  if (isTrash && (row.tag.empty() || row.parent != parent))
+    document.putBack = PutBackNotes(context_.files, context_.store).read(document.name, row);
   plan->isDataless = row.isDataless;
   plan->file = LocalFileOf(location->item.facts);
   if (document.kind == NSFileProviderItemKind::folder) {
@@ -211,7 +231,8 @@ bool Uploader::changesAnything(const Plan &plan) {
   const SyncRow &row = plan.row;
   return row.tag.empty() || plan.changesTarget || row.parent != plan.document.parent ||
          row.name != plan.document.name || !IsSameKind(row.kind, plan.document.kind) ||
-         (row.content.mode & 0777) != (plan.document.content.mode & 0777);
+         (row.content.mode & 0777) != (plan.document.content.mode & 0777) ||
+         plan.document.metadata.has_value();
 }
 
 Uploader::Prepared Uploader::nothingToSend(const Plan &plan) {
@@ -277,7 +298,12 @@ Uploader::Prepared Uploader::prepareDocument(const FileLocation &location, Plan 
   if (isKnown && !row.isDataless && IsSameContents(plan->file, row.local))
     return changesAnything(*plan) ? Prepared::save : nothingToSend(*plan);
   // Written here and elsewhere: the other version is on its way here, and then both are kept.
-  if (row.hasNewer()) return laterWith(plan, NSError());
+  // Whoever waits for this one is told why that doesn't come.
+  if (row.hasNewer()) {
+    const NSError problem = problemOfNewer_ ? problemOfNewer_(plan->entry.item) : NSError();
+    context_.store.uploadFailed(plan->entry, problem, nowMilliseconds() + kSoon);
+    return Prepared::later;
+  }
   plan->hasContent = true;
   plan->changesMarker = true;
   plan->document.tag = row.tag;  // of the version that was written over: a newer one is a conflict
@@ -351,6 +377,7 @@ void Uploader::saved(const Plan &plan, const CKRecord &record) {
   row.name = plan.document.name;
   row.kind = plan.document.kind;
   row.content = plan.document.content;
+  if (plan.document.metadata) row.metadata = *plan.document.metadata;
   row.local = plan.file;
   row.isDataless = plan.isDataless;
   if (plan.hasContent) {
@@ -375,9 +402,14 @@ void Uploader::saved(const Plan &plan, const CKRecord &record) {
 void Uploader::markFile(const Plan &plan, SyncRow *row) {
   if (!context_.storage.capabilities().extendedAttributes) return;
   const auto location = context_.files.locate(plan.entry.item, nullptr);
-  if (!location) return;
-  const OwnedDescriptor file = openFile(*location);
-  if (!file) return;
+  const OwnedDescriptor file = location ? openFile(*location) : OwnedDescriptor();
+  if (!file) {
+    // Its folder was moved a moment ago, or somebody has a lease on it. With an older mark, what the cloud
+    // has would be taken for a change of this device's, so it is sent again.
+    row->local = {};
+    context_.store.enqueue(plan.entry.item, false, false);
+    return;
+  }
   if (row->kind == NSFileProviderItemKind::folder) {
     WriteMarker(file.get(), DocumentMarker::ofFolder(row->record));
     return;
@@ -400,6 +432,7 @@ void Uploader::markFile(const Plan &plan, SyncRow *row) {
 }
 
 void Uploader::removed(const Plan &plan) {
+  context_.store.forgetAllowedDeletion(plan.entry.item);
   context_.store.erase(plan.row.record);
   context_.store.forgetSent(plan.row.record);
   context_.store.uploaded(plan.entry);

@@ -35,6 +35,9 @@ class Uploader {
     needsContents_ = std::move(handler);
   }
 
+  // Asked why the newer version of a document that was written here, too, isn't here yet; nil: it is coming.
+  void setProblemOfNewer(std::function<NSError(ItemNumber item)> ask) { problemOfNewer_ = std::move(ask); }
+
   // Sends a batch of what is due.
   Round sendDue(const CKCallContext &call);
 
@@ -78,6 +81,7 @@ class Uploader {
   const SyncContext &context_;
   AssetUploads &assets_;
   std::function<void(const ItemRecord &)> needsContents_;
+  std::function<NSError(ItemNumber)> problemOfNewer_;
   ConflictCopies &conflicts_;
   LocalExaminer &examiner_;
   std::uint64_t inlineBytes_ = 0;  // sent by this round on this thread

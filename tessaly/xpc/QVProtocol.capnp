@@ -44,6 +44,7 @@ interface QVProtocol {
       -> (capability :UInt64, error :Values.Error);
   confirmDeletions @22 (carryOut :Bool) -> (error :Values.Error);
   setMetadataAtURL @23 (url :Values.Url, change :MetadataChange) -> (error :Values.Error);
+  allowDeletionAtURL @24 (url :Values.Url) -> (error :Values.Error);
 
   struct Information {
     key @0 :Data;

@@ -86,6 +86,10 @@ void QVProtocolProxy::getMoveCapability(const NSURL &source, const NSURL &destin
       });
 }
 
+void QVProtocolProxy::allowDeletionAtURL(const NSURL &url, QVContentsErrorReply reply) {
+  call(&Client::allowDeletionAtURLRequest, writeURLOf(url), std::move(reply), readOutcome);
+}
+
 void QVProtocolProxy::confirmDeletions(bool carryOut, QVContentsErrorReply reply) {
   call(
       &Client::confirmDeletionsRequest, [carryOut](auto params, Session &) { params.setCarryOut(carryOut); },

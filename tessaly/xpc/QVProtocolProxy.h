@@ -42,6 +42,7 @@ class QVProtocolProxy final : public XPCProxy<schema::QVProtocol, QVProtocol, QV
   void getTransferStatus(QVTransferStatusReply reply) override;
   void waitForUploadAtURL(const NSURL &url, QVContentsErrorReply reply) override;
   void getMoveCapability(const NSURL &source, const NSURL &destination, QVMoveCapabilityReply reply) override;
+  void allowDeletionAtURL(const NSURL &url, QVContentsErrorReply reply) override;
   void confirmDeletions(bool carryOut, QVContentsErrorReply reply) override;
 };
 

@@ -87,6 +87,12 @@ kj::Promise<void> QVProtocolServer::getMoveCapability(GetMoveCapabilityContext c
       });
 }
 
+kj::Promise<void> QVProtocolServer::allowDeletionAtURL(AllowDeletionAtURLContext context) {
+  return exported_.serve(context, [url = getURL(context.getParams())](auto &object, auto reply) {
+    object.allowDeletionAtURL(url, reply(writeOutcome));
+  });
+}
+
 kj::Promise<void> QVProtocolServer::confirmDeletions(ConfirmDeletionsContext context) {
   return exported_.serve(context,
                          [carryOut = bool(context.getParams().getCarryOut())](auto &object, auto reply) {

@@ -41,6 +41,7 @@ class QVProtocolServer final : public schema::QVProtocol::Server {
   kj::Promise<void> getTransferStatus(GetTransferStatusContext context) override;
   kj::Promise<void> waitForUploadAtURL(WaitForUploadAtURLContext context) override;
   kj::Promise<void> getMoveCapability(GetMoveCapabilityContext context) override;
+  kj::Promise<void> allowDeletionAtURL(AllowDeletionAtURLContext context) override;
   kj::Promise<void> confirmDeletions(ConfirmDeletionsContext context) override;
 
  private:

@@ -1,12 +1,31 @@
 #include <gtest/gtest.h>
 #include <optional>
+#include <random>
 #include <string>
 
+#include "tests/crash/CrashRun.h"
 #include "tests/crash/DocumentText.h"
 #include "tests/crash/Schedule.h"
 
 namespace droxa::crash {
 namespace {
+
+void expectNothingLost(std::uint64_t seed) {
+  CrashOptions options;
+  options.seed = seed;
+  const CrashReport report = RunCrashes(options);
+  EXPECT_GE(report.kills, options.kills);
+  for (const std::string &finding : report.findings) ADD_FAILURE() << finding;
+  if (!report.findings.empty()) ADD_FAILURE() << report.summary << "; left behind: " << report.folder;
+}
+
+TEST(Crash, tenKillsLoseNothing) {
+  expectNothingLost(20261121);
+}
+
+TEST(Crash, tenKillsAtOtherMomentsLoseNothing) {
+  expectNothingLost(std::random_device()());
+}
 
 TEST(Crash, aSeedGivesItsSchedule) {
   Schedule one(5), same(5), other(6);

@@ -15,15 +15,21 @@ constexpr std::size_t kMostDocuments = 60;
 constexpr std::size_t kMostFolders = 8;
 constexpr std::uint64_t kNames = 40;  // few enough that both devices use the same ones
 
+std::string lastName(const std::string &path) {
+  return path.substr(path.rfind('/') == std::string::npos ? 0 : path.rfind('/') + 1);
+}
+
+// What another device's editor is about to rename. A person who writes into it meanwhile keeps it.
+bool isTemporary(const std::string &path) {
+  const std::string name = lastName(path);
+  return name.compare(0, 7, "saving ") == 0 && name.find("conflict") == std::string::npos;
+}
+
 std::vector<std::string> pathsOf(const Tree &tree, bool folders) {
   std::vector<std::string> paths;
   for (const auto &[path, entry] : tree)
-    if (entry.isFolder == folders) paths.push_back(path);
+    if (entry.isFolder == folders && !isTemporary(path)) paths.push_back(path);
   return paths;
-}
-
-std::string lastName(const std::string &path) {
-  return path.substr(path.rfind('/') == std::string::npos ? 0 : path.rfind('/') + 1);
 }
 
 std::string below(const std::string &folder, const std::string &name) {
@@ -231,7 +237,7 @@ void Workload::editOnBoth(const Step &step) {
   const Tree other = ReadTree(devices_[1]->documents());
   std::vector<std::string> shared;
   for (const auto &[path, entry] : tree)
-    if (!entry.isFolder && other.count(path) > 0) shared.push_back(path);
+    if (!entry.isFolder && !isTemporary(path) && other.count(path) > 0) shared.push_back(path);
   if (shared.empty()) return;
   const std::string path = shared[step.pick % shared.size()];
   Step second = step;

@@ -96,6 +96,7 @@ class ScriptedDaemon final : public QVDaemonConnection {
     void getTransferStatus(QVTransferStatusReply) override { unexpected(); }
     void waitForUploadAtURL(const NSURL &, QVContentsErrorReply) override { unexpected(); }
     void getMoveCapability(const NSURL &, const NSURL &, QVMoveCapabilityReply) override { unexpected(); }
+    void allowDeletionAtURL(const NSURL &, QVContentsErrorReply) override { unexpected(); }
     void confirmDeletions(bool, QVContentsErrorReply) override { unexpected(); }
     static void unexpected() { ADD_FAILURE() << "a call that this test doesn't expect"; }
   };

@@ -225,6 +225,16 @@ void FakeDaemon::getMoveCapability(const NSURL &source, const NSURL &destination
 }
 
 // Nothing is ever held back here, so there is nothing to confirm.
+void FakeDaemon::allowDeletionAtURL(const NSURL &url, QVContentsErrorReply reply) {
+  NSError error = begin("allowDeletionAtURL", url.path());
+  {
+    const Lock lock(mutex_);
+    std::uint64_t number = 0;
+    if (!error) error = findItem(url, &number);
+  }
+  replies_->give("allowDeletionAtURL", [=, reply = std::move(reply)] { reply(error); });
+}
+
 void FakeDaemon::confirmDeletions(bool carryOut, QVContentsErrorReply reply) {
   const NSError error = begin("confirmDeletions", "carryOut " + yesOrNo(carryOut));
   replies_->give("confirmDeletions", [=, reply = std::move(reply)] { reply(error); });

@@ -197,6 +197,10 @@ class FakeDaemonProxy final : public QVProtocol {
     if (failed("getMoveCapability")) return;
     daemon_->getMoveCapability(source, destination, tracked(std::move(reply)));
   }
+  void allowDeletionAtURL(const NSURL &url, QVContentsErrorReply reply) override {
+    if (failed("allowDeletionAtURL")) return;
+    daemon_->allowDeletionAtURL(url, tracked(std::move(reply)));
+  }
   void confirmDeletions(bool carryOut, QVContentsErrorReply reply) override {
     if (failed("confirmDeletions")) return;
     daemon_->confirmDeletions(carryOut, tracked(std::move(reply)));

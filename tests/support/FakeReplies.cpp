@@ -49,6 +49,7 @@ void FakeReplies::checkName(const std::string &operation) {
       "getTransferStatus",
       "waitForUploadAtURL",
       "getMoveCapability",
+      "allowDeletionAtURL",
       "confirmDeletions",
       "waitWithReply",
       "getProgress",

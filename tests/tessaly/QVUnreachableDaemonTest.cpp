@@ -32,7 +32,8 @@ TEST(UnreachableDaemon, everyCallFailsOnceAndNeverReplies) {
   daemon->getMoveCapability(NSURL(), NSURL(), reply);
   daemon->confirmDeletions(true, reply);
   daemon->setMetadataAtURL(NSURL(), {}, reply);
-  EXPECT_EQ(failures, 24);
+  daemon->allowDeletionAtURL(NSURL(), reply);
+  EXPECT_EQ(failures, 25);
 }
 
 }  // namespace droxa

@@ -1,6 +1,9 @@
 // What a kill leaves behind, made by hand: the files, the databases and the cloud as they are then.
 
+#include <sys/xattr.h>
+
 #include "keld/Sql.h"
+#include "keld/contents/DocumentMarker.h"
 #include "tests/keld/sync/TwoDevices.h"
 
 namespace droxa::keld {
@@ -42,6 +45,107 @@ TEST_F(AfterKill, whatTheTableDoesNotSayIsWorkedOutAnew) {
   ben.keld.waitForFirstScan();
   EXPECT_TRUE(
       eventually([&] { return ben.keld.record("notes.txt")->flags == (kDatalessFlag | kUploadedFlag); }));
+}
+
+// Ben's device makes what the cloud tells of, and never gets to write down that it did.
+class WhileMaking : public AfterKill {
+ protected:
+  // Does what anna does, and ends ben's daemon when it has made `path`, in a transaction that can't end.
+  void makeAndEnd(const std::string &path, const std::function<void()> &annaDoes) {
+    ben.keld.stop();
+    const std::string name = std::filesystem::path(path).filename();
+    const std::string trigger = "CREATE TRIGGER fails BEFORE INSERT ON rows WHEN NEW.name = CAST('" + name +
+                                "' AS BLOB) BEGIN SELECT RAISE(ABORT, 'no more'); END";
+    change(ben, "sync.sqlite", trigger.c_str());
+    annaDoes();
+    ASSERT_FALSE(anna.waitForUploads());
+    ben.keld.start();
+    ASSERT_TRUE(eventually([&] { return isMarked(path); }));
+    ben.keld.stop();
+    ASSERT_TRUE(isMarked(path));
+    change(ben, "sync.sqlite", "DROP TRIGGER fails");
+  }
+  bool isMarked(const std::string &path) {
+    return ::lgetxattr(ben.keld.at(path).c_str(), kMarkerAttribute, nullptr, 0) > 0;
+  }
+  void makeAndEnd(const std::string &path, const std::string &contents) {
+    makeAndEnd(path, [&] { anna.keld.write(path, contents); });
+  }
+  // Both have the same, and ben has nothing to send.
+  void expectBothHave(const std::vector<std::string> &names) {
+    ben.keld.start();
+    ben.keld.waitForFirstScan();
+    EXPECT_TRUE(eventually([&] { return ben.names() == names; })) << testing::PrintToString(ben.names());
+    const NSError error = ben.waitForUploads();
+    EXPECT_FALSE(error) << error.description();
+    anna.keld.write("after", "after");
+    ASSERT_FALSE(anna.waitForUploads());
+    ASSERT_TRUE(ben.knowsSoon("after"));
+    anna.keld.remove("after");
+    ASSERT_FALSE(anna.waitForUploads());
+    ASSERT_TRUE(ben.losesSoon("after"));
+    EXPECT_EQ(ben.names(), names);
+    EXPECT_EQ(anna.names(), names);
+  }
+};
+
+TEST_F(WhileMaking, whatIsStillInTheCloudIsThere) {
+  makeAndEnd("notes.txt", "hello");
+  expectBothHave({"notes.txt"});
+  EXPECT_EQ(ben.contents("notes.txt"), "hello");
+}
+
+TEST_F(WhileMaking, whatWasDeletedMeanwhileGoes) {
+  makeAndEnd("saving 1", "hello");
+  anna.keld.remove("saving 1");
+  ASSERT_FALSE(anna.waitForUploads());
+  expectBothHave({});
+}
+
+TEST_F(WhileMaking, anEmptyDocumentThatWasDeletedMeanwhileGoes) {
+  makeAndEnd("saving 1", "");
+  anna.keld.remove("saving 1");
+  ASSERT_FALSE(anna.waitForUploads());
+  expectBothHave({});
+}
+
+TEST_F(WhileMaking, whatWasRenamedMeanwhileIsThereOnce) {
+  makeAndEnd("saving 1", "hello");
+  anna.keld.rename("saving 1", "notes.txt");
+  ASSERT_FALSE(anna.waitForUploads());
+  expectBothHave({"notes.txt"});
+  EXPECT_EQ(ben.contents("notes.txt"), "hello");
+}
+
+TEST_F(WhileMaking, aFolderThatWasDeletedMeanwhileGoesWithWhatWasMadeInIt) {
+  makeAndEnd("work/one.txt", [&] {
+    anna.keld.folder("work");
+    anna.keld.write("work/one.txt", "1");
+  });
+  anna.keld.remove("work");
+  ASSERT_FALSE(anna.waitForUploads());
+  expectBothHave({});
+}
+
+TEST_F(WhileMaking, whatWasWrittenIntoItSinceStays) {
+  makeAndEnd("notes.txt", "hello");
+  ben.keld.write("notes.txt", "written by ben");
+  anna.keld.remove("notes.txt");
+  ASSERT_FALSE(anna.waitForUploads());
+  expectBothHave({"notes.txt"});
+  EXPECT_EQ(ben.read("notes.txt"), "written by ben");
+  EXPECT_EQ(anna.contents("notes.txt"), "written by ben");
+}
+
+TEST_F(WhileMaking, aPersonsOwnDocumentOfTheSameContentsStays) {
+  makeAndEnd("notes.txt", [&] {
+    ben.keld.write("notes.txt", "hello");
+    anna.keld.write("notes.txt", "hello");
+  });
+  anna.keld.remove("notes.txt");
+  ASSERT_FALSE(anna.waitForUploads());
+  expectBothHave({"notes.txt"});
+  EXPECT_EQ(ben.read("notes.txt"), "hello");
 }
 
 TEST_F(AfterKill, aMarkOfAWaitIsRemoved) {

@@ -22,6 +22,11 @@ class DeletionSpree : public FaultyDrive {
     device.keld.session()->confirmDeletions(carryOut, answer.completion());
     EXPECT_FALSE(answer.value<0>());
   }
+  void allow(const std::string &path) {
+    Once<NSError> answer("word for " + path);
+    device.keld.session()->allowDeletionAtURL(device.url(path), answer.completion());
+    EXPECT_FALSE(answer.value<0>());
+  }
   bool holds(std::uint64_t deletions) {
     return eventually([&] { return device.transfers().heldDeletions == deletions; });
   }
@@ -63,6 +68,51 @@ TEST_F(DeletionSpree, whatWasNotMeantComesBackWithFoldersAndLinks) {
   EXPECT_EQ(hand.all().size(), kEverything);
   EXPECT_EQ(device.transfers().heldDeletions, 0U);
   EXPECT_TRUE(conflictCopies().empty());
+}
+
+TEST_F(DeletionSpree, whatAPersonAskedForIsNoSpree) {
+  fill();
+  allow("f");
+  device.keld.remove("f");
+  EXPECT_TRUE(eventually([&] { return hand.paths() == std::vector<std::string>{"kept"}; }));
+  EXPECT_FALSE(device.waitForUploads());
+  EXPECT_EQ(device.transfers().heldDeletions, 0U);
+}
+
+TEST_F(DeletionSpree, whatAPersonAskedForBeforeARestartIsNoSpree) {
+  fill();
+  allow("f");
+  device.keld.stop();
+  device.keld.remove("f");
+  device.keld.start();
+  EXPECT_TRUE(eventually([&] { return hand.paths() == std::vector<std::string>{"kept"}; }));
+  EXPECT_EQ(device.transfers().heldDeletions, 0U);
+}
+
+TEST_F(DeletionSpree, whatAPersonAskedForGoesWhileOthersAreHeld) {
+  fill();
+  device.keld.remove("f");
+  ASSERT_TRUE(holds(kEverything - 1));
+  allow("kept");
+  device.keld.remove("kept");
+  EXPECT_TRUE(leavesCloudSoon("kept"));
+  EXPECT_TRUE(holds(kEverything - 1));
+  EXPECT_EQ(hand.all().size(), kEverything - 1);
+}
+
+TEST_F(DeletionSpree, theWordForOneIsNoneForTheOthers) {
+  fill();
+  allow("f/g/1");
+  device.keld.remove("f");
+  EXPECT_TRUE(leavesCloudSoon("f/g/1"));
+  EXPECT_TRUE(holds(kEverything - 2));
+  EXPECT_EQ(hand.all().size(), kEverything - 1);
+}
+
+TEST_F(DeletionSpree, nothingThereIsNothingToAllow) {
+  Once<NSError> answer("word");
+  device.keld.session()->allowDeletionAtURL(device.url("nowhere"), answer.completion());
+  EXPECT_TRUE(answer.value<0>().is(QVTessalyErrorDomain, QVErrorNoSuchItem));
 }
 
 TEST_F(DeletionSpree, whatIsHeldIsHeldOverARestart) {

@@ -59,6 +59,40 @@ TEST(DocumentRecord, aFolderAndALinkComeBackAsTheyWere) {
   EXPECT_EQ(readLink->target, "../elsewhere");
 }
 
+TEST(DocumentRecord, whatUsersNoteComesBackAsItWas) {
+  DocumentRecord noted = document();
+  noted.metadata = ItemMetadata{{"Red", "Work"}, -5, 12};
+  const auto read = ReadRecord(MakeRecordWithContent(noted));
+  ASSERT_TRUE(read);
+  EXPECT_EQ(read->metadata, noted.metadata);
+  EXPECT_EQ(ReadRecord(record())->metadata, ItemMetadata()) << "of a record without it";
+  for (const char *key : {kRecordKeyTags, kRecordKeyLastUsed, kRecordKeyFavoriteRank})
+    EXPECT_EQ(record().fields.count(key), 0U) << key << " is left as it is";
+  CKRecord nonsense = record();
+  nonsense.fields[kRecordKeyTags] = std::int64_t{1};
+  nonsense.fields[kRecordKeyFavoriteRank] = std::int64_t{-1};
+  ASSERT_TRUE(ReadRecord(nonsense));
+  EXPECT_EQ(ReadRecord(nonsense)->metadata, ItemMetadata());
+}
+
+TEST(DocumentRecord, whereItemsOfTheTrashWereComesBackAsItWas) {
+  DocumentRecord trashed = document();
+  trashed.parent = ContainerRecord("com.quorva.Tessaly.trash");
+  trashed.putBack = PutBack{document().parent, "notes.txt", 5};
+  const auto read = ReadRecord(MakeRecordWithContent(trashed));
+  ASSERT_TRUE(read);
+  EXPECT_EQ(read->putBack, trashed.putBack);
+  CKRecord hostile = MakeRecordWithContent(trashed);
+  hostile.fields[kRecordKeyPutBackName] = std::string("../../escape");
+  ASSERT_TRUE(ReadRecord(hostile));
+  EXPECT_FALSE(ReadRecord(hostile)->putBack);
+  trashed.parent = document().parent;
+  EXPECT_FALSE(ReadRecord(MakeRecordWithContent(trashed))->putBack) << "elsewhere";
+  trashed = document();
+  trashed.parent = ContainerRecord("com.quorva.Tessaly.trash");
+  EXPECT_EQ(MakeRecord(trashed).fields.count(kRecordKeyPutBackParent), 0U) << "left as it is";
+}
+
 TEST(DocumentRecord, withoutItsContentsTheFieldsOfContentsAreLeftAlone) {
   const CKRecord without = MakeRecord(document());
   for (const char *key : {kRecordKeySize, kRecordKeyModified, kRecordKeyContent})

@@ -19,6 +19,7 @@ class SyncStoreTest : public testing::Test {
     made.content = {5, -7, "digest", 0644};
     made.local = {11, 5, -7, 13};
     made.isDataless = true;
+    made.metadata = {{"Red", "Work"}, -9, 12};
     made.newerTag = "t2";
     made.newer = {6, 8, "newer", 0600};
     return made;
@@ -48,6 +49,7 @@ TEST_F(SyncStoreTest, aRowComesBackAsItWasPut) {
     EXPECT_EQ(got->content, put.content);
     EXPECT_EQ(got->local, put.local);
     EXPECT_TRUE(got->isDataless);
+    EXPECT_EQ(got->metadata, put.metadata);
     EXPECT_EQ(got->newerTag, "t2");
     EXPECT_EQ(got->newer, put.newer);
   }
@@ -268,6 +270,71 @@ TEST_F(SyncStoreTest, everythingIsThereAfterOpeningItAgain) {
   EXPECT_EQ(again.countHeld(), 1U);
   EXPECT_EQ(again.number("rank"), 12U);
   EXPECT_EQ(again.text("token"), std::string("\0\1", 2));
+}
+
+TEST_F(SyncStoreTest, aDatabaseOfTheFirstVersionIsBroughtUpToDate) {
+  const std::string old = folder.path() + "/old.sqlite";
+  {
+    SyncStore made(old);
+    made.put(row("r", 7));
+  }
+  {
+    SqlDatabase database(old, SqlDatabase::Access::readWrite, 100);
+    database.execute(
+        "DROP TABLE unfinished; DROP TABLE meant; ALTER TABLE rows DROP COLUMN tags;"
+        "ALTER TABLE rows DROP COLUMN lastUsed; ALTER TABLE rows DROP COLUMN favoriteRank;"
+        "PRAGMA user_version = 1");
+  }
+  for (int time = 0; time < 2; ++time) {
+    SyncStore again(old);
+    const auto got = again.byRecord("r");
+    ASSERT_TRUE(got);
+    EXPECT_EQ(got->newer, row("r", 7).newer);
+    EXPECT_TRUE(got->metadata.isEmpty());
+    again.allowDeletions({7});
+    EXPECT_TRUE(again.isDeletionAllowed(7));
+    EXPECT_TRUE(again.unfinished().empty());
+  }
+}
+
+TEST_F(SyncStoreTest, aDatabaseOfANewerVersionIsRefused) {
+  const std::string newer = folder.path() + "/newer.sqlite";
+  SqlDatabase(newer, SqlDatabase::Access::readWrite, 100).execute("PRAGMA user_version = 1000");
+  EXPECT_THROW(SyncStore{newer}, SqlError);
+}
+
+TEST_F(SyncStoreTest, whatIsBeingMadeIsKnownUntilItIsFinished) {
+  store.beginUnfinished({{"r", "container:c", "a\n", NSFileProviderItemKind::folder}, {"s", "r", "b", {}}});
+  SyncStore again(path);
+  EXPECT_EQ(again.unfinished().size(), 2U);
+  ASSERT_TRUE(again.unfinished("r"));
+  EXPECT_EQ(again.unfinished("r")->name, "a\n");
+  EXPECT_EQ(again.unfinished("r")->kind, NSFileProviderItemKind::folder);
+  EXPECT_THROW(store.transaction([&] {
+    store.finished("r");
+    throw SqlError(1, "killed");
+  }),
+               SqlError);
+  EXPECT_TRUE(store.unfinished("r"));
+  store.finished("r");
+  EXPECT_FALSE(store.unfinished("r"));
+  store.forgetUnfinished();
+  EXPECT_TRUE(store.unfinished().empty());
+}
+
+TEST_F(SyncStoreTest, deletionsThatWereAskedForAreNotHeld) {
+  store.enqueue(1, true, false);
+  store.enqueue(2, true, false);
+  store.allowDeletions({2, 3});
+  EXPECT_EQ(store.countDeletions(), 1U);
+  store.holdDeletions();
+  EXPECT_EQ(store.countHeld(), 1U);
+  EXPECT_EQ(due(), Items{2});
+  store.forgetAllowedDeletion(2);
+  EXPECT_FALSE(store.isDeletionAllowed(2));
+  EXPECT_TRUE(store.isDeletionAllowed(3));
+  store.unbindAll();
+  EXPECT_FALSE(store.isDeletionAllowed(3)) << "numbers mean other items now";
 }
 
 TEST_F(SyncStoreTest, onlyRecordsWithATagAreInTheCloud) {
