@@ -15,10 +15,6 @@ namespace {
 constexpr std::chrono::seconds kFirstRetry{1};
 constexpr std::chrono::seconds kLongestRetry{300};
 constexpr std::size_t kMostFailuresKept = 10000;
-// A small document costs waits for the disk, which those on their way share, and little else: more of them at
-// once.
-constexpr std::uint64_t kSmallBytes = 256 * 1024;
-constexpr std::size_t kSmallOnesForALargeOne = 4;
 
 NSError cancelledError() {
   return qvc_error(QVErrorCancelled, "nobody wants it any more");
@@ -200,16 +196,13 @@ void Downloads::startMore() {
   while (!stopped_ && !waiting_.empty()) {
     const bool forReader = waiting_.begin()->first == -static_cast<int>(DownloadPriority::reader);
     // A reader never waits behind what nobody waits for.
-    const std::size_t most = (forReader ? options_.atOnce * 4 : options_.atOnce) * kSmallOnesForALargeOne;
+    const std::size_t most = forReader ? options_.atOnce * 4 : options_.atOnce;
+    if (running_ >= most) return;
     const std::uint64_t number = waiting_.begin()->second;
-    Transfer &transfer = transfers_.at(number);
-    const std::size_t weight = transfer.total <= kSmallBytes ? 1 : kSmallOnesForALargeOne;
-    if (runningWeight_ + weight > most) return;
     waiting_.erase(waiting_.begin());
+    Transfer &transfer = transfers_.at(number);
     transfer.isRunning = true;
-    transfer.weight = weight;
     ++running_;
-    runningWeight_ += weight;
     dispatch_async_global([self = shared_from_this(), number, item = transfer.item,
                            cancellation = transfer.cancellation] { self->run(number, item, cancellation); });
   }
@@ -249,7 +242,6 @@ void Downloads::end(std::uint64_t number, const NSError &outcome) {
     const auto known = byItem_.find(transfer.item);
     if (known != byItem_.end() && known->second == number) byItem_.erase(known);
     --running_;
-    runningWeight_ -= transfer.weight;
     if (error && transfer.why) error = transfer.why;
     noteOutcome(transfer, error);
     for (const auto &interest : transfer.interests) {

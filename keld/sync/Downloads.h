@@ -25,7 +25,7 @@ namespace droxa::keld {
 enum class DownloadPriority : std::uint8_t { background = 0, asked = 1, reader = 2 };
 
 struct DownloadOptions {
-  std::size_t atOnce = 4;  // large ones; four times as many for readers, and four times as many small ones
+  std::size_t atOnce = 4;
   // A transfer that doesn't move for so long has failed.
   std::chrono::milliseconds stallTimeout = std::chrono::seconds(60);
 };
@@ -86,7 +86,6 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
     std::uint64_t done = 0, total = 0;
     DownloadPriority priority = DownloadPriority::background;
     bool isRunning = false;
-    std::size_t weight = 0;  // while it runs
     std::shared_ptr<CKCancellation> cancellation = std::make_shared<CKCancellation>();
     std::set<std::shared_ptr<Interest::State>> interests;
     bool isKept = false;  // wanted by the daemon itself
@@ -134,7 +133,7 @@ class Downloads : public std::enable_shared_from_this<Downloads> {
   std::map<ItemNumber, NSError> failures_ GUARDED_BY(mutex_);
   std::map<std::string, int> digests_ GUARDED_BY(mutex_);  // under way
   std::uint64_t lastNumber_ GUARDED_BY(mutex_) = 0;
-  std::size_t running_ GUARDED_BY(mutex_) = 0, runningWeight_ GUARDED_BY(mutex_) = 0;
+  std::size_t running_ GUARDED_BY(mutex_) = 0;
   std::uint64_t done_ GUARDED_BY(mutex_) = 0, failed_ GUARDED_BY(mutex_) = 0;
   TransferRate rate_ GUARDED_BY(mutex_);
   std::condition_variable_any idle_;
