@@ -112,7 +112,7 @@ PartResult ContentsStorage::openPart(const std::string &digest, std::uint64_t si
     return failedPart(error);
   }
   std::unique_ptr<PartFile> part(new PartFile(parts_.get(), std::move(file), digest, size, false));
-  if ((error = part->readWhatIsThere()) != 0) return failedPart(error);
+  if ((error = part->goOn()) != 0) return failedPart(error);
   return {{}, std::move(part)};
 }
 

@@ -2,19 +2,21 @@
 
 #include <cerrno>
 #include <fcntl.h>
+#include <string>
+#include <sys/stat.h>
 #include <unistd.h>
-#include <vector>
 
-#include "keld/contents/ContentsDigest.h"
 #include "keld/contents/FileSteps.h"
+#include "keld/contents/FollowingDigest.h"
 #include "keld/contents/StorageNames.h"
 
 namespace droxa::keld {
 
 namespace {
-constexpr std::uint64_t kWorthKeeping = 1 << 20;
 
-constexpr std::size_t kReadBytes = 128 * 1024;
+constexpr std::uint64_t kWorthKeeping = 1 << 20;
+// The disk is told to begin whenever so much has come, so that little is left to wait for at the end.
+constexpr std::uint64_t kDiskStep = 8 << 20;
 
 }  // namespace
 
@@ -30,10 +32,7 @@ PartFile::PartFile(int partsFolder, OwnedDescriptor file, std::string digest, st
       size_(size),
       file_(std::move(file)),
       isFinished_(isFinished) {
-  if (isFinished_)
-    length_ = size_;
-  else
-    hash_ = std::make_unique<ContentsDigest>();
+  if (isFinished_) length_ = size_;
 }
 
 PartFile::~PartFile() = default;
@@ -43,16 +42,13 @@ std::string PartFile::fileName() const {
 }
 
 // What was there before is read back, not trusted: after a power cut it may be zeros.
-int PartFile::readWhatIsThere() {
-  std::vector<char> buffer(kReadBytes);
-  for (;;) {
-    const ssize_t read = ::pread(file_.get(), buffer.data(), buffer.size(), static_cast<off_t>(length_));
-    if (read < 0 && errno == EINTR) continue;
-    if (read < 0) return errno;
-    if (read == 0) return 0;
-    hash_->add(std::string_view(buffer.data(), static_cast<std::size_t>(read)));
-    length_ += static_cast<std::uint64_t>(read);
-  }
+int PartFile::goOn() {
+  struct stat status {};
+  if (::fstat(file_.get(), &status) != 0) return errno;
+  length_ = static_cast<std::uint64_t>(status.st_size);
+  hash_ = std::make_unique<FollowingDigest>(file_.get());
+  hash_->grewTo(length_);
+  return 0;
 }
 
 ContentsResult PartFile::append(std::string_view bytes) {
@@ -65,9 +61,15 @@ ContentsResult PartFile::append(std::string_view bytes) {
     const ssize_t written = ::pwrite(file_.get(), bytes.data(), bytes.size(), static_cast<off_t>(length_));
     if (written < 0 && errno == EINTR) continue;
     if (written < 0) return ContentsResult::failedWith(errno);
-    hash_->add(bytes.substr(0, static_cast<std::size_t>(written)));
     length_ += static_cast<std::uint64_t>(written);
     bytes.remove_prefix(static_cast<std::size_t>(written));
+    hash_->grewTo(length_);
+  }
+  if (length_ - handedToDisk_ >= kDiskStep) {
+    // A file system that can't begins later.
+    ::sync_file_range(file_.get(), static_cast<off_t>(handedToDisk_),
+                      static_cast<off_t>(length_ - handedToDisk_), SYNC_FILE_RANGE_WRITE);
+    handedToDisk_ = length_;
   }
   return {};
 }
@@ -75,20 +77,19 @@ ContentsResult PartFile::append(std::string_view bytes) {
 ContentsResult PartFile::finish() {
   if (isTaken_) return ContentsResult::failed(ContentsOutcome::error, EINVAL);
   if (isFinished_) return {};
-  if (length_ != size_ || hash_->finish() != digest_) {
+  std::string digest;
+  int error = length_ == size_ ? hash_->finish(&digest) : 0;
+  if (error == 0 && digest != digest_) {
     discard();
     return ContentsResult::failed(ContentsOutcome::wrongContents);
   }
-  // The hash is spent; a second try after a failure begins with reading everything.
-  hash_ = std::make_unique<ContentsDigest>();
-  int error = ::fsync(file_.get()) == 0 ? 0 : errno;
+  if (error == 0 && ::fsync(file_.get()) != 0) error = errno;
   if (error == 0)
     error = ::renameat(partsFolder_, fileName().c_str(), partsFolder_, WholePartName(digest_).c_str()) == 0
                 ? 0
                 : errno;
   if (error != 0) {
-    length_ = 0;
-    readWhatIsThere();
+    goOn();  // the digest is spent; a second try begins with reading everything
     return ContentsResult::failedWith(error);
   }
   isFinished_ = true;
@@ -102,6 +103,7 @@ void PartFile::discard() {
   if (isTaken_) return;
   ::unlinkat(partsFolder_, fileName().c_str(), 0);
   isTaken_ = true;
+  hash_.reset();  // before what it reads is closed
   file_ = OwnedDescriptor();
 }
 

@@ -10,7 +10,7 @@
 
 namespace droxa::keld {
 
-class ContentsDigest;
+class FollowingDigest;
 
 // A download on its way: a file of the storage, named by the digest of what it shall be, locked against a
 // second writer (in this process and in others) for as long as the object lives. What was appended before a
@@ -40,15 +40,16 @@ class PartFile {
  private:
   friend class ContentsStorage;
   PartFile(int partsFolder, OwnedDescriptor file, std::string digest, std::uint64_t size, bool isFinished);
-  int readWhatIsThere();
+  int goOn();
   std::string fileName() const;
 
   const int partsFolder_;  // the storage's, which outlives it
   const std::string digest_;
   const std::uint64_t size_;
   OwnedDescriptor file_;
-  std::unique_ptr<ContentsDigest> hash_;  // of the first length_ bytes; null when finished
+  std::unique_ptr<FollowingDigest> hash_;  // of the first length_ bytes; null when finished
   std::uint64_t length_ = 0;
+  std::uint64_t handedToDisk_ = 0;  // so much of it the disk was asked to begin with
   bool isFinished_ = false;
   bool isTaken_ = false;  // removed, or moved to where a document is made of it
 };

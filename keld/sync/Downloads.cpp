@@ -274,6 +274,7 @@ void Downloads::stop() {
     const Lock lock(mutex_);
     stopped_ = true;
     for (auto &[number, transfer] : transfers_) {
+      transfer.why = cancelledError();  // whatever it meets while everything ends
       transfer.cancellation->cancel();
       if (!transfer.isRunning) never.push_back(number);
     }
