@@ -31,7 +31,9 @@ class FPURLOperations {
  public:
   virtual ~FPURLOperations() = default;
 
-  // Copies the document or folder at `source` under `folder`, under its own name.
+  // Copies the document, link or folder at `source` under `folder`, under its own name, without the extended
+  // attributes "user.droxa.…". 512 for what is none of these or has its contents elsewhere, somewhere in the
+  // folder, and for a source that changed while it was read.
   virtual void importUnderFolder(const NSURL &source, const NSURL &folder, FPURLCompletion completion) = 0;
   virtual void createSubFolder(const NSURL &parent, const std::string &name, FPURLCompletion completion) = 0;
   virtual void renameWithNewName(const NSURL &url, const std::string &name, FPURLCompletion completion) = 0;
