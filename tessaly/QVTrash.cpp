@@ -132,6 +132,7 @@ NSError checkIsItem(const NSURL &url, const QVContainer &trash) {
   if (!url.isFileURL() || !qv_isInSyncedLocation(url))
     return refuse("isn't in the drive; it stays where it is");
   if (url.isEqualToOrBelow(trash.url())) return refuse("is in the trash already");
+  if (qv_isInTessalyPrivateStorages(url)) return refuse("is private to the container's owner and no item");
   if (qv_containerIDIfIsDocumentsContainerURL(url))
     return refuse("holds a container's documents and must stay");
   return NSError();

@@ -3,9 +3,10 @@
 #include <sys/file.h>
 #include <sys/mount.h>
 #include <sys/time.h>
+#include <thread>
 
 #include "KeldFixture.h"
-#include "keld/TrashNotes.h"
+#include "keld/contents/PromiseFile.h"
 #include "tessaly/QVDaemonConnection.h"
 #include "tessaly/QVDaemonConnectionInProcess.h"
 #include "tessaly/QVItemActions.h"
@@ -18,7 +19,7 @@ namespace {
 
 class Trash : public testing::Test {
  protected:
-  Trash() { connect(); }
+  explicit Trash(KeldOptions options = {}) : keld(std::move(options)) { connect(); }
   ~Trash() override { disconnect(); }
   // The connection keeps the daemon alive.
   static void disconnect() {
@@ -71,6 +72,26 @@ class Trash : public testing::Test {
 
   KeldFixture keld;
   const NSFileManager *manager = NSFileManager::defaultManager();
+};
+
+// On a file system without extended attributes.
+class TrashOfPromises : public Trash {
+ protected:
+  TrashOfPromises() : Trash(options()) {}
+  static KeldOptions options() {
+    KeldOptions options;
+    options.sync.contents.assume = ContentsCapabilities{false, false, true, true};
+    return options;
+  }
+  static PromiseFile promise(const std::string &name) {
+    PromiseFile promise;
+    promise.name = name;
+    promise.marker.state = MarkerState::dataless;
+    promise.marker.recordName = "record";
+    promise.marker.digest = std::string(64, 'b');
+    promise.marker.size = 5;
+    return promise;
+  }
 };
 
 }  // namespace
@@ -146,8 +167,12 @@ TEST_F(Trash, refusesWhatIsNoItemOfTheDrive) {
   keld.write(files("a"));
   keld.settle();
   const std::string outside = keld.home().write("outside", "x");
-  for (const NSURL &item : {NSURL::fileURLWithPath(outside), url(""), NSURL::fileURLWithPath(files("a")),
-                            NSURL::fileURLWithPath(files()), NSURL::fileURLWithPath(keld.replica())}) {
+  const NSURL documents = url("");
+  const NSURL hidden = documents.URLByDeletingLastPathComponent().URLByAppendingPathComponent("private");
+  keld.write(hidden.path());
+  for (const NSURL &item :
+       {NSURL::fileURLWithPath(outside), documents, hidden, NSURL::fileURLWithPath(files("a")),
+        NSURL::fileURLWithPath(files()), NSURL::fileURLWithPath(keld.replica())}) {
     const NSError error = refusalOf(item);
     EXPECT_TRUE(error.is(QVTessalyErrorDomain, QVErrorInvalidArgument)) << error.description();
     EXPECT_NE(error.localizedDescription().find(item.path()), std::string::npos);
@@ -177,6 +202,29 @@ TEST_F(Trash, aFailureLeavesNeitherNoteNorItem) {
   EXPECT_TRUE(refusalOf(url("a")));
   EXPECT_TRUE(exists(keld.at("a")));
   EXPECT_EQ(notes(), 0U);
+}
+
+TEST_F(Trash, isUsedByManyAtOnce) {
+  constexpr int kThreads = 4, kItems = 10;
+  for (int thread = 0; thread < kThreads; ++thread)
+    for (int item = 0; item < kItems; ++item) {
+      const std::string folder = std::to_string(thread) + "/" + std::to_string(item);
+      keld.folder(folder);
+      keld.write(folder + "/a", folder);
+    }
+  keld.settle();
+  std::vector<std::thread> threads;
+  for (int thread = 0; thread < kThreads; ++thread)
+    threads.emplace_back([this, thread] {
+      for (int item = 0; item < kItems; ++item)
+        trash(std::to_string(thread) + "/" + std::to_string(item) + "/a");
+    });
+  for (std::thread &thread : threads) thread.join();
+  EXPECT_EQ(notes(), static_cast<std::size_t>(kThreads * kItems));
+  for (int number = 1; number <= kThreads * kItems; ++number) {
+    const std::string name = number == 1 ? "a" : "a " + std::to_string(number);
+    EXPECT_EQ(putBack(name), url(contents(files(name)) + "/a")) << name;
+  }
 }
 
 TEST_F(Trash, leadsBackToTheFolderWhereverThatIsNow) {
@@ -341,6 +389,25 @@ TEST_F(Trash, showsAndLeadsBackWhatAnotherProgramPutThere) {
   keld.settle();
   EXPECT_TRUE(keld.item(files("by another"))->fields().isTrashed);
   EXPECT_EQ(putBack("by another"), url("f/was here"));
+}
+
+TEST_F(TrashOfPromises, takesThePromiseOfADocumentThatIsntHere) {
+  keld.write(PromiseNameFor("a"), EncodePromise(promise("a")));
+  keld.folder("f");
+  keld.write("f/" + PromiseNameFor("a"), EncodePromise(promise("a")));
+  keld.settle();
+  const ItemNumber number = keld.number("f/a");
+  ASSERT_NE(number, 0U);
+  EXPECT_EQ(trash("a"), "a");
+  EXPECT_EQ(trash("f/a"), "a 2");
+  EXPECT_TRUE(exists(files(PromiseNameFor("a 2"))));
+  EXPECT_FALSE(exists(keld.at("f/" + PromiseNameFor("a"))));
+  ASSERT_TRUE(eventually([&] { return keld.number(files("a 2")) == number; }));
+  EXPECT_FALSE(keld.item(files("a 2"))->fields().isDownloaded);
+  EXPECT_EQ(putBack("a 2"), url("f/a"));
+  keld.remove(files(PromiseNameFor("a")));
+  EXPECT_TRUE(eventually([&] { return !exists(note("a")); }));
+  EXPECT_TRUE(exists(note("a 2")));
 }
 
 TEST(TrashOfOldLayout, isMovedOverAtTheStartWithItsItemsAsTheyWere) {
