@@ -66,7 +66,8 @@ bool CloudApplier::applyMetadata(const DocumentRecord &document, int folder, con
   const int error = ApplyMetadataToFile(folder, name, QVItemMetadataChange::to(row->metadata));
   // Kept as it is here, and left alone in the cloud.
   if (error != 0) row->metadata = here;
-  if (error != 0 && error != ENOTSUP)
+  const bool canBear = error != ENOTSUP && error != ENOENT;  // as a promise can't
+  if (error != 0 && canBear)
     os_log_error(qvc_default_log(), "[ERROR] can't write the tags of %s: %s", name,
                  std::string(std::strerror(error)));
   return false;

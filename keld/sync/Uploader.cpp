@@ -194,7 +194,8 @@ Uploader::Prepared Uploader::prepareSave(const ItemRecord &item, Plan *plan, con
   if (auto bound = context_.store.byItem(item.id)) row = std::move(*bound);
   if (row.record.empty()) {
     // The applier is about to find out whether that may stay.
-    const auto marker = ReadMarker(location->folder.get(), location->name);
+    auto marker = context_.storage.classify(location->folder.get(), location->name).marker;
+    if (!marker) marker = ReadMarker(location->folder.get(), location->name);  // a folder's
     if (marker && context_.store.unfinished(marker->recordName)) return laterWith(plan, NSError());
     // Written down before it is sent, so that a lost reply doesn't make a second record.
     row.record = NewRecordName();
