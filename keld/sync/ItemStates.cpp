@@ -40,7 +40,11 @@ void ItemStates::flush(std::function<void()> done) {
     states.swap(states_);
   }
   Keeper *keeper = keeper_();
-  if (!keeper || states.empty()) return done();
+  if (!done) {
+    if (states.empty()) return;
+    done = [] {};
+  }
+  if (!keeper) return done();
   keeper->perform(
       [states = std::move(states)](Reconciler &reconciler, ItemQueries &queries, ItemEdits &) {
         // The table has to know the files that the states are of.

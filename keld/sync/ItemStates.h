@@ -25,8 +25,9 @@ class ItemStates {
   explicit ItemStates(std::function<Keeper *()> keeper) : keeper_(std::move(keeper)) {}
 
   void show(const ItemState &state);
-  // Hands over what was collected; `done` is called on the pool when it is committed.
-  void flush(std::function<void()> done = [] {});
+  // Hands over what was collected; `done` is called on the pool when that, and what was handed over before,
+  // is committed.
+  void flush(std::function<void()> done = nullptr);
   // Has the keeper look at these paths below the replica now instead of when the watcher tells.
   void lookAt(
       std::vector<std::string> paths, std::function<void()> done = [] {});

@@ -221,7 +221,8 @@ void SyncEngine::answerWaiters() {
       waiting_.push_back(std::move(waiter));
       continue;
     }
-    dispatch_async_global([done = std::move(waiter.done), failure] { done(failure); });
+    // When whoever asks for the states sees that it is there.
+    states_.flush([done = std::move(waiter.done), failure] { done(failure); });
   }
 }
 

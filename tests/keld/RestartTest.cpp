@@ -160,8 +160,8 @@ TEST(Restart, clearsAwayWhatActionsOfDeadProgramsHaveLeft) {
   KeldFixture keld;
   keld.stop();
   const std::string actions = keld.replica() + "/.droxa-private/actions";
-  keld.folder(actions + "/.droxa-replacement-0123/below");
-  keld.write(actions + "/.droxa-replacement-0123/below/a");
+  keld.folder(actions + "/.droxa-replacement-5F0C3A1E-7B7D-4C43-9D6A-2F8E1B0C4D5E/below");
+  keld.write(actions + "/.droxa-replacement-5F0C3A1E-7B7D-4C43-9D6A-2F8E1B0C4D5E/below/a");
   keld.start();
   EXPECT_TRUE(std::filesystem::is_empty(actions));
 }
