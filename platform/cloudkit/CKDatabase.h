@@ -1,15 +1,11 @@
 #pragma once
 
-#include <cstdint>
 #include <memory>
 
 #include "platform/cloudkit/CKCloud.h"
 #include "platform/cloudkit/CKOperation.h"
 
 namespace droxa {
-
-// Whose zones a database holds: the account's own, or those of others in which something is shared with it.
-enum class CKDatabaseScope : std::uint8_t { privateDatabase, sharedDatabase };
 
 // A cloud with the operations that run on it, concurrently, on the process's thread pool. Releasing it
 // neither waits for nor cancels its operations.
