@@ -29,6 +29,9 @@ class EmbeddedWorld {
   void setQuota(std::optional<std::uint64_t> bytes) const {
     EXPECT_FALSE(openEmbedded("quota")->setQuota(bytes, {}));
   }
+  void setQuotaOf(const std::string &accountName, std::optional<std::uint64_t> bytes) const {
+    EXPECT_FALSE(openEmbedded("quota", accountName)->setQuota(bytes, {}));
+  }
   std::string folder() const { return folder_.path() + "/cloud"; }
 
  private:

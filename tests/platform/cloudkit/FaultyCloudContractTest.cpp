@@ -21,6 +21,9 @@ class FaultlessWorld {
     return std::make_shared<FaultyCloud>(world_.openAnotherCloud(deviceName));
   }
   void setQuota(std::optional<std::uint64_t> bytes) const { world_.setQuota(bytes); }
+  void setQuotaOf(const std::string &accountName, std::optional<std::uint64_t> bytes) const {
+    world_.setQuotaOf(accountName, bytes);
+  }
 
  private:
   EmbeddedWorld world_;

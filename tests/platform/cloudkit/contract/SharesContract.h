@@ -17,11 +17,11 @@ TYPED_TEST_P(CloudShares, savingMakesAURLAndStampsOwnerAndParticipants) {
   ASSERT_TRUE(share.owner());
   EXPECT_EQ(share.owner()->userIdentity.accountName, "alice");
   EXPECT_EQ(share.owner()->acceptanceStatus, Acceptance::accepted);
-  const CKShareParticipant *bob = share.participantWithAccountName("bob");
-  ASSERT_TRUE(bob);
-  EXPECT_EQ(bob->role, Role::privateUser);
-  EXPECT_EQ(bob->permission, Permission::readOnly);
-  EXPECT_EQ(bob->acceptanceStatus, Acceptance::pending);
+  const CKShareParticipant *invited = share.participantWithAccountName("bob");
+  ASSERT_TRUE(invited);
+  EXPECT_EQ(invited->role, Role::privateUser);
+  EXPECT_EQ(invited->permission, Permission::readOnly);
+  EXPECT_EQ(invited->acceptanceStatus, Acceptance::pending);
   EXPECT_EQ(*share.template get<std::string>(CKShareTitleKey), "about root");
   EXPECT_EQ(fetchShare(*this->alice, share.recordID), share);
 }
@@ -89,22 +89,22 @@ TYPED_TEST_P(CloudShares, participantsMustBeAccountsEachOnceAndNotTooMany) {
 
 TYPED_TEST_P(CloudShares, accountsAreFoundByNameAndByHandle) {
   this->world.setUserIdentity("bob", "Bob B.", "bob@droxa.test");
-  const CKUserIdentity bob{"bob", "Bob B.", "bob@droxa.test"};
-  EXPECT_EQ(this->bob->currentUserIdentity(patiently()).identity, bob);
+  const CKUserIdentity identity{"bob", "Bob B.", "bob@droxa.test"};
+  EXPECT_EQ(this->bob->currentUserIdentity(patiently()).identity, identity);
   const CKShareParticipantsReply reply =
       this->alice->lookUpShareParticipants({"bob@droxa.test", "nobody", "bob", ""}, patiently());
   EXPECT_CODE(reply.error, partialFailure);
   ASSERT_EQ(reply.results.size(), 4U);
-  EXPECT_EQ(reply.results[0].participant.userIdentity, bob);
+  EXPECT_EQ(reply.results[0].participant.userIdentity, identity);
   EXPECT_CODE(reply.results[1].error, unknownItem);
-  EXPECT_EQ(reply.results[2].participant.userIdentity, bob);
+  EXPECT_EQ(reply.results[2].participant.userIdentity, identity);
   EXPECT_CODE(reply.results[3].error, unknownItem);
   save(*this->alice, item("root"));
   CKShareParticipant byHandle;
   byHandle.userIdentity.handle = "bob@droxa.test";
   const CKShare share = saveShare(*this->alice, shareOf("root", {byHandle}));
   ASSERT_EQ(share.participants.size(), 2U);
-  EXPECT_EQ(share.participants[1].userIdentity, bob);
+  EXPECT_EQ(share.participants[1].userIdentity, identity);
   const std::vector<std::string> tooMany(CKMostShareParticipants + 1, "bob");
   EXPECT_CODE(this->alice->lookUpShareParticipants(tooMany, patiently()).error, limitExceeded);
 }
@@ -210,9 +210,9 @@ TYPED_TEST_P(CloudShares, aParticipantLeavesByDeletingTheShareAndMayComeBack) {
 
 TYPED_TEST_P(CloudShares, aSaveCantSayThatSomebodyHasAccepted) {
   this->makeTree();
-  CKShareParticipant bob = named("bob");
-  bob.acceptanceStatus = Acceptance::accepted;
-  const CKShare share = saveShare(*this->alice, shareOf("folder", {bob}));
+  CKShareParticipant invited = named("bob");
+  invited.acceptanceStatus = Acceptance::accepted;
+  const CKShare share = saveShare(*this->alice, shareOf("folder", {invited}));
   EXPECT_EQ(share.participantWithAccountName("bob")->acceptanceStatus, Acceptance::pending);
   EXPECT_TRUE(this->bobs->listZones(patiently()).zones.empty());
 }
