@@ -10,6 +10,7 @@
 #include "platform/cloudkit/CKCallContext.h"
 #include "platform/cloudkit/CKError.h"
 #include "platform/cloudkit/CKRecord.h"
+#include "platform/cloudkit/CKShare.h"
 #include "platform/foundation/UUID.h"
 
 namespace droxa {
@@ -21,6 +22,9 @@ struct CKServerChangeToken {
   explicit operator bool() const { return static_cast<bool>(data); }
   bool operator==(const CKServerChangeToken &) const = default;
 };
+
+// Whose zones a database holds: the account's own, or those of others in which something is shared with it.
+enum class CKDatabaseScope : std::uint8_t { privateDatabase, sharedDatabase };
 
 enum class CKAccountStatus : std::uint8_t {
   couldNotDetermine,
@@ -107,6 +111,37 @@ struct CKAccountReply {
   CKAccountStatus status = CKAccountStatus::couldNotDetermine;
 };
 
+struct CKUserIdentityReply {
+  NSError error;
+  CKUserIdentity identity;
+};
+struct CKShareParticipantResult {
+  std::string lookup;  // as it was asked for
+  NSError error;
+  CKShareParticipant participant;  // a privateUser, readOnly and pending: to be put into a share
+};
+struct CKShareParticipantsReply {
+  NSError error;
+  std::vector<CKShareParticipantResult> results;  // one a name or handle, in that order
+};
+struct CKShareMetadataReply {
+  NSError error;
+  CKShareMetadata metadata;
+};
+// Both are opaque texts of printable characters.
+struct CKShareTokens {
+  NSError error;
+  std::string shareToken;  // says that the account may read the record by the share it is in, if it is in one
+  std::string baseToken;   // says that the account may read the record
+};
+enum class CKShareTokenKind : std::uint8_t { share, base };
+struct CKShareTokenReply {
+  NSError error;
+  CKShareTokenKind kind = CKShareTokenKind::base;
+  CKRecordID recordID;      // as the account that asks writes it
+  std::string accountName;  // that the token was given to
+};
+
 // Called on the thread of the call, with bytes done and bytes in all; not after the call returned.
 using CKProgressHandler = std::function<void(std::uint64_t done, std::uint64_t total)>;
 // Takes the next bytes, at most 4 MiB at a time, on the thread of the call. An error that it returns ends the
@@ -128,7 +163,36 @@ class CKSubscription {
 inline constexpr std::size_t CKMostRecordsPerCall = 1000;
 inline constexpr std::uint64_t CKLargestRecord = 1024 * 1024;  // bytes, assets not counted
 
-// A cloud database as one account on one device sees it. Calls are synchronous; they return
+// A cloud database as one account on one device sees it: its private one, with its own zones, or its shared
+// one (sharedDatabase()), with those zones of others in which something is shared with it.
+//
+// Shares. A CKShare shares its root record and all that lies below it, by CKRecordParentKey, whenever it came
+// there. Its owner, whose zone it is in, saves it through the private database; the root must be there, or be
+// saved in the same call. The save makes a URL that can't be guessed, and stamps owner and participants:
+// - participants are named by account name or, where that is "", by handle; new ones are pending until they
+//   accept by the URL. Those left out have lost their access at once. Who came by the URL alone (publicUser)
+//   stays only while the public permission isn't none, and has that permission.
+// - unknownItem: no such account, or no root. alreadyShared: another share has the root. tooManyParticipants.
+//   invalidArguments: no root in the share's zone, another root than before, or not the fields of a share.
+// Deleting the share or its root withdraws the URL and everybody's access at once. Records may be in several
+// shares, one inside the other; each account may what the most permissive of its shares allows.
+//
+// In the shared database a zone bears its owner's account name. There the account sees the records of the
+// shares that it has accepted with a permission other than none, these shares themselves, and nothing else:
+// - what it doesn't see is as if it weren't there, for every call. The zone is gone for it (zoneNotFound, and
+//   not listed) as soon as nothing in it is shared with it.
+// - a record that it may not see any more is told as deleted in the feed of changes, one that it now may see
+//   as changed; tokens of the feed are good for this database and account alone.
+// - permissionFailure: any change by one who may only read; saving a share; deleting a share's root; a new
+//   record whose parent it can't write (give the parent first), or with a name that is taken, or that records
+//   name as their parent; a record taken out of a share that it sees, or put where it can't write; making or
+//   deleting the zone.
+// - deleting a share there is leaving it: the account's part becomes `removed` (a publicUser's is gone).
+//
+// Assets can be read, and referred to by records, by accounts that see a record that refers to them, in
+// either database, and by those that uploaded them. The bytes of all records of a zone count for its owner.
+//
+// Calls are synchronous; they return
 // operationCancelled within about 50 ms after the context was cancelled and a timeout (CKErrorIsTimeout)
 // after its deadline, and do not retry: CKOperation does. What a modification acknowledged has reached the
 // disk. Every call can also answer any transient error (CKErrorIsTransient), notAuthenticated and
@@ -144,6 +208,9 @@ class CKCloud {
   virtual CKAccountReply accountStatus(const CKCallContext &context) = 0;
   virtual const std::string &deviceName() const = 0;
   virtual std::string description() const = 0;  // for people
+
+  // The same account's and device's shared database; of a shared database, one like itself.
+  virtual std::shared_ptr<CKCloud> sharedDatabase() = 0;
 
   // Makes the zone; nil also when there is one. invalidArguments for a name or an owner that can't be.
   virtual NSError saveZone(const CKRecordZoneID &zone, const CKCallContext &context) = 0;
@@ -189,6 +256,28 @@ class CKCloud {
                             const CKProgressHandler &progress, const CKCallContext &context) = 0;
 
   virtual CKAssetPresence hasAsset(const CKAssetReference &asset, const CKCallContext &context) = 0;
+
+  // Who the account is.
+  virtual CKUserIdentityReply currentUserIdentity(const CKCallContext &context) = 0;
+  // Finds accounts, each by its name or its handle, exactly as written. Per result: unknownItem. Of the call:
+  // limitExceeded (more than CKMostShareParticipants), partialFailure.
+  virtual CKShareParticipantsReply lookUpShareParticipants(const std::vector<std::string> &namesOrHandles,
+                                                           const CKCallContext &context) = 0;
+  // Of the share with that URL. unknownItem: there is none, or not any more. participantMayNeedVerification:
+  // the account isn't among the participants, and the public permission is none.
+  virtual CKShareMetadataReply fetchShareMetadata(const NSURL &url, const CKCallContext &context) = 0;
+  // Makes the account one of those who see what is shared, by the URL; what was accepted before stays so, and
+  // the owner's own share is answered as it is. Errors as fetchShareMetadata's, and permissionFailure (the
+  // participant's permission is none), tooManyParticipants.
+  virtual CKShareMetadataReply acceptShare(const NSURL &url, const CKCallContext &context) = 0;
+
+  // Tokens by which the account can show to others that it may read a record. unknownItem, zoneNotFound and
+  // invalidArguments as for fetching it.
+  virtual CKShareTokens shareTokens(const CKRecordID &record, const CKCallContext &context) = 0;
+  // What a token says, now: unknownItem unless the asking account itself sees the record (in its private
+  // database or its shared one); permissionFailure when the token's account doesn't any more, or not by that
+  // share; invalidArguments when this cloud never gave it.
+  virtual CKShareTokenReply verifyShareToken(const std::string &token, const CKCallContext &context) = 0;
 
   // Null, with an error, when changes can't be watched. Changes made before it returned aren't told. Keeps
   // itself going when the cloud object is released first.

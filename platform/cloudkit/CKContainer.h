@@ -7,12 +7,11 @@
 
 namespace droxa {
 
-// An application's databases in the cloud: the account's own, and the one of what others share with it. The
-// shared database has no zones, and none can be made in it: nothing can be shared so far.
+// An application's databases in the cloud: the account's own, and the one of what others share with it.
 // Thread contract: immutable; every member may be called on any thread.
 class CKContainer {
  public:
-  CKContainer(std::string containerIdentifier, std::shared_ptr<CKCloud> privateCloud);
+  CKContainer(std::string containerIdentifier, const std::shared_ptr<CKCloud> &privateCloud);
 
   const std::string &containerIdentifier() const { return identifier_; }
   const std::shared_ptr<CKDatabase> &privateCloudDatabase() const { return private_; }

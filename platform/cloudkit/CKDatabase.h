@@ -12,18 +12,22 @@ namespace droxa {
 // Thread contract: every member may be called on any thread.
 class CKDatabase {
  public:
-  explicit CKDatabase(std::shared_ptr<CKCloud> cloud);
+  explicit CKDatabase(std::shared_ptr<CKCloud> cloud,
+                      CKDatabaseScope scope = CKDatabaseScope::privateDatabase);
 
   // Runs the operation once; one that was added before is a mistake, which is logged and ignored.
   void addOperation(const std::shared_ptr<CKOperation> &operation);
   void cancelAllOperations();
   void waitUntilAllOperationsAreFinished();
 
+  CKDatabaseScope databaseScope() const { return scope_; }
+
   // For calls that are not retried: zones, the account, subscriptions.
   const std::shared_ptr<CKCloud> &cloud() const { return cloud_; }
 
  private:
   const std::shared_ptr<CKCloud> cloud_;
+  const CKDatabaseScope scope_;
   NSOperationQueue queue_;
 };
 

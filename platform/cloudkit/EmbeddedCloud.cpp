@@ -30,6 +30,18 @@ std::shared_ptr<EmbeddedCloud> EmbeddedCloud::open(const std::string &folder, co
   return std::shared_ptr<EmbeddedCloud>(new EmbeddedCloud(std::make_shared<State>(State{home})));
 }
 
+std::shared_ptr<CKCloud> EmbeddedCloud::sharedDatabase() {
+  const embedded::Home &home = *state_->home;
+  const auto shared = std::make_shared<embedded::Home>(home.folder(), home.accountName(), home.deviceName(),
+                                                       CKDatabaseScope::sharedDatabase);
+  return std::shared_ptr<EmbeddedCloud>(new EmbeddedCloud(std::make_shared<State>(State{shared})));
+}
+
+NSError EmbeddedCloud::setUserIdentity(const std::string &displayName, const std::string &handle,
+                                       const CKCallContext &context) {
+  return embedded::SetUserIdentity(*state_->home, displayName, handle, context);
+}
+
 NSError EmbeddedCloud::setQuota(std::optional<std::uint64_t> bytes, const CKCallContext &context) {
   constexpr std::uint64_t kMost = std::numeric_limits<std::int64_t>::max();
   using embedded::Home;
@@ -124,6 +136,31 @@ NSError EmbeddedCloud::readAsset(const CKAssetReference &asset, std::uint64_t of
 
 CKAssetPresence EmbeddedCloud::hasAsset(const CKAssetReference &asset, const CKCallContext &context) {
   return embedded::HasAsset(*state_->home, asset, context);
+}
+
+CKUserIdentityReply EmbeddedCloud::currentUserIdentity(const CKCallContext &context) {
+  return embedded::CurrentUserIdentity(*state_->home, context);
+}
+
+CKShareParticipantsReply EmbeddedCloud::lookUpShareParticipants(
+    const std::vector<std::string> &namesOrHandles, const CKCallContext &context) {
+  return embedded::LookUpShareParticipants(*state_->home, namesOrHandles, context);
+}
+
+CKShareMetadataReply EmbeddedCloud::fetchShareMetadata(const NSURL &url, const CKCallContext &context) {
+  return embedded::FetchShareMetadata(*state_->home, url, context);
+}
+
+CKShareMetadataReply EmbeddedCloud::acceptShare(const NSURL &url, const CKCallContext &context) {
+  return embedded::AcceptShare(*state_->home, url, context);
+}
+
+CKShareTokens EmbeddedCloud::shareTokens(const CKRecordID &record, const CKCallContext &context) {
+  return embedded::ShareTokens(*state_->home, record, context);
+}
+
+CKShareTokenReply EmbeddedCloud::verifyShareToken(const std::string &token, const CKCallContext &context) {
+  return embedded::VerifyShareToken(*state_->home, token, context);
 }
 
 std::unique_ptr<CKSubscription> EmbeddedCloud::subscribe(CKZonesChangedHandler handler, NSError *error) {

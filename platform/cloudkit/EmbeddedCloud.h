@@ -28,6 +28,11 @@ class EmbeddedCloud final : public CKCloud {
   // The most bytes of assets that the account's records may refer to, each record's counted; absent: no
   // limit. Kept in the cloud, for all devices. What is there already stays.
   NSError setQuota(std::optional<std::uint64_t> bytes, const CKCallContext &context);
+  // By what people know the account, and find it; each at most 255 bytes without NUL, "" for none.
+  // invalidArguments: they can't be, or the handle is another account's handle or name. Shares that name the
+  // account show it once they are saved again.
+  NSError setUserIdentity(const std::string &displayName, const std::string &handle,
+                          const CKCallContext &context);
   struct Usage {
     NSError error;
     std::uint64_t bytes = 0;  // of assets that the account's records refer to, each record's counted
@@ -49,6 +54,7 @@ class EmbeddedCloud final : public CKCloud {
   CKAccountReply accountStatus(const CKCallContext &context) override;
   const std::string &deviceName() const override;
   std::string description() const override;
+  std::shared_ptr<CKCloud> sharedDatabase() override;
   NSError saveZone(const CKRecordZoneID &zone, const CKCallContext &context) override;
   NSError deleteZone(const CKRecordZoneID &zone, const CKCallContext &context) override;
   CKZoneList listZones(const CKCallContext &context) override;
@@ -63,6 +69,13 @@ class EmbeddedCloud final : public CKCloud {
   NSError readAsset(const CKAssetReference &asset, std::uint64_t offset, const CKAssetSink &sink,
                     const CKProgressHandler &progress, const CKCallContext &context) override;
   CKAssetPresence hasAsset(const CKAssetReference &asset, const CKCallContext &context) override;
+  CKUserIdentityReply currentUserIdentity(const CKCallContext &context) override;
+  CKShareParticipantsReply lookUpShareParticipants(const std::vector<std::string> &namesOrHandles,
+                                                   const CKCallContext &context) override;
+  CKShareMetadataReply fetchShareMetadata(const NSURL &url, const CKCallContext &context) override;
+  CKShareMetadataReply acceptShare(const NSURL &url, const CKCallContext &context) override;
+  CKShareTokens shareTokens(const CKRecordID &record, const CKCallContext &context) override;
+  CKShareTokenReply verifyShareToken(const std::string &token, const CKCallContext &context) override;
   std::unique_ptr<CKSubscription> subscribe(CKZonesChangedHandler handler, NSError *error) override;
 
  private:

@@ -60,7 +60,8 @@ void FaultyCloud::onEveryCall(Call call, Fault fault) {
 }
 
 void FaultyCloud::onEveryCall(const Fault &fault) {
-  for (int i = 0; i <= static_cast<int>(Call::hasAsset); ++i) onEveryCall(static_cast<Call>(i), fault);
+  for (int i = 0; i <= static_cast<int>(Call::verifyShareToken); ++i)
+    onEveryCall(static_cast<Call>(i), fault);
 }
 
 void FaultyCloud::clearFaults() {
@@ -188,6 +189,39 @@ NSError FaultyCloud::readAsset(const CKAssetReference &asset, std::uint64_t offs
 CKAssetPresence FaultyCloud::hasAsset(const CKAssetReference &asset, const CKCallContext &context) {
   return perform<CKAssetPresence>(Call::hasAsset, context,
                                   [&](const Fault &) { return cloud_->hasAsset(asset, context); });
+}
+
+CKUserIdentityReply FaultyCloud::currentUserIdentity(const CKCallContext &context) {
+  return perform<CKUserIdentityReply>(Call::currentUserIdentity, context,
+                                      [&](const Fault &) { return cloud_->currentUserIdentity(context); });
+}
+
+CKShareParticipantsReply FaultyCloud::lookUpShareParticipants(const std::vector<std::string> &namesOrHandles,
+                                                              const CKCallContext &context) {
+  return perform<CKShareParticipantsReply>(Call::lookUpShareParticipants, context, [&](const Fault &) {
+    return cloud_->lookUpShareParticipants(namesOrHandles, context);
+  });
+}
+
+CKShareMetadataReply FaultyCloud::fetchShareMetadata(const NSURL &url, const CKCallContext &context) {
+  return perform<CKShareMetadataReply>(Call::fetchShareMetadata, context, [&](const Fault &) {
+    return cloud_->fetchShareMetadata(url, context);
+  });
+}
+
+CKShareMetadataReply FaultyCloud::acceptShare(const NSURL &url, const CKCallContext &context) {
+  return perform<CKShareMetadataReply>(Call::acceptShare, context,
+                                       [&](const Fault &) { return cloud_->acceptShare(url, context); });
+}
+
+CKShareTokens FaultyCloud::shareTokens(const CKRecordID &record, const CKCallContext &context) {
+  return perform<CKShareTokens>(Call::shareTokens, context,
+                                [&](const Fault &) { return cloud_->shareTokens(record, context); });
+}
+
+CKShareTokenReply FaultyCloud::verifyShareToken(const std::string &token, const CKCallContext &context) {
+  return perform<CKShareTokenReply>(Call::verifyShareToken, context,
+                                    [&](const Fault &) { return cloud_->verifyShareToken(token, context); });
 }
 
 }  // namespace droxa

@@ -27,6 +27,12 @@ class FaultyCloud final : public CKCloud {
     uploadAsset,
     readAsset,
     hasAsset,
+    currentUserIdentity,
+    lookUpShareParticipants,
+    fetchShareMetadata,
+    acceptShare,
+    shareTokens,
+    verifyShareToken,
   };
   // What goes wrong with a call, in this order. Waits end early, as they should, with the call's context.
   struct Fault {
@@ -58,6 +64,10 @@ class FaultyCloud final : public CKCloud {
   const std::string &deviceName() const override { return cloud_->deviceName(); }
   std::string description() const override { return cloud_->description(); }
   CKAccountReply accountStatus(const CKCallContext &context) override;
+  // A faulty cloud of its own, whose faults are set apart.
+  std::shared_ptr<CKCloud> sharedDatabase() override {
+    return std::make_shared<FaultyCloud>(cloud_->sharedDatabase());
+  }
   NSError saveZone(const CKRecordZoneID &zone, const CKCallContext &context) override;
   NSError deleteZone(const CKRecordZoneID &zone, const CKCallContext &context) override;
   CKZoneList listZones(const CKCallContext &context) override;
@@ -72,6 +82,13 @@ class FaultyCloud final : public CKCloud {
   NSError readAsset(const CKAssetReference &asset, std::uint64_t offset, const CKAssetSink &sink,
                     const CKProgressHandler &progress, const CKCallContext &context) override;
   CKAssetPresence hasAsset(const CKAssetReference &asset, const CKCallContext &context) override;
+  CKUserIdentityReply currentUserIdentity(const CKCallContext &context) override;
+  CKShareParticipantsReply lookUpShareParticipants(const std::vector<std::string> &namesOrHandles,
+                                                   const CKCallContext &context) override;
+  CKShareMetadataReply fetchShareMetadata(const NSURL &url, const CKCallContext &context) override;
+  CKShareMetadataReply acceptShare(const NSURL &url, const CKCallContext &context) override;
+  CKShareTokens shareTokens(const CKRecordID &record, const CKCallContext &context) override;
+  CKShareTokenReply verifyShareToken(const std::string &token, const CKCallContext &context) override;
   std::unique_ptr<CKSubscription> subscribe(CKZonesChangedHandler handler, NSError *error) override {
     return cloud_->subscribe(std::move(handler), error);
   }

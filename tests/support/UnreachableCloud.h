@@ -14,6 +14,7 @@ class UnreachableCloud final : public CKCloud {
   CKAccountReply accountStatus(const CKCallContext &) override { return {error(), {}}; }
   const std::string &deviceName() const override { return device_; }
   std::string description() const override { return "no cloud"; }
+  std::shared_ptr<CKCloud> sharedDatabase() override { return std::make_shared<UnreachableCloud>(); }
   NSError saveZone(const CKRecordZoneID &, const CKCallContext &) override { return error(); }
   NSError deleteZone(const CKRecordZoneID &, const CKCallContext &) override { return error(); }
   CKZoneList listZones(const CKCallContext &) override { return {error(), {}}; }
@@ -39,6 +40,19 @@ class UnreachableCloud final : public CKCloud {
   }
   CKAssetPresence hasAsset(const CKAssetReference &, const CKCallContext &) override {
     return {error(), false};
+  }
+  CKUserIdentityReply currentUserIdentity(const CKCallContext &) override { return {error(), {}}; }
+  CKShareParticipantsReply lookUpShareParticipants(const std::vector<std::string> &,
+                                                   const CKCallContext &) override {
+    return {error(), {}};
+  }
+  CKShareMetadataReply fetchShareMetadata(const NSURL &, const CKCallContext &) override {
+    return {error(), {}};
+  }
+  CKShareMetadataReply acceptShare(const NSURL &, const CKCallContext &) override { return {error(), {}}; }
+  CKShareTokens shareTokens(const CKRecordID &, const CKCallContext &) override { return {error(), {}, {}}; }
+  CKShareTokenReply verifyShareToken(const std::string &, const CKCallContext &) override {
+    return {error(), {}, {}, {}};
   }
   std::unique_ptr<CKSubscription> subscribe(CKZonesChangedHandler, NSError *problem) override {
     if (problem) *problem = error();

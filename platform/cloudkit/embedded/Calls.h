@@ -20,6 +20,15 @@ CKUploadReply UploadAsset(Home &home, int descriptor, std::uint64_t size, const 
 NSError ReadAsset(Home &home, const CKAssetReference &asset, std::uint64_t offset, const CKAssetSink &sink,
                   const CKProgressHandler &progress, const CKCallContext &context);
 CKAssetPresence HasAsset(Home &home, const CKAssetReference &asset, const CKCallContext &context);
+CKUserIdentityReply CurrentUserIdentity(Home &home, const CKCallContext &context);
+NSError SetUserIdentity(Home &home, const std::string &displayName, const std::string &handle,
+                        const CKCallContext &context);
+CKShareParticipantsReply LookUpShareParticipants(Home &home, const std::vector<std::string> &namesOrHandles,
+                                                 const CKCallContext &context);
+CKShareMetadataReply FetchShareMetadata(Home &home, const NSURL &url, const CKCallContext &context);
+CKShareMetadataReply AcceptShare(Home &home, const NSURL &url, const CKCallContext &context);
+CKShareTokens ShareTokens(Home &home, const CKRecordID &record, const CKCallContext &context);
+CKShareTokenReply VerifyShareToken(Home &home, const std::string &token, const CKCallContext &context);
 std::unique_ptr<CKSubscription> Subscribe(std::shared_ptr<Home> home, CKZonesChangedHandler handler,
                                           NSError *error);
 EmbeddedCloud::Garbage CollectGarbage(Home &home, std::chrono::seconds grace, const CKCallContext &context);

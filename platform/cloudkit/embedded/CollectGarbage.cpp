@@ -32,6 +32,7 @@ class Collection {
         forgotten = unreferred(connection);
         for (const std::string &digest : forgotten) {
           connection.use("DELETE FROM pieces WHERE asset = ?").bind(digest).run();
+          connection.use("DELETE FROM uploads WHERE asset = ?").bind(digest).run();
           connection.use("DELETE FROM assets WHERE digest = ?").bind(digest).run();
         }
       });

@@ -10,9 +10,9 @@ CKRecordResult fetchOne(const Connection &connection, const CKRecordID &id,
     return {id, CKErrorMake(CKErrorCode::invalidArguments, "No record can be named " + id.description()), {}};
   }
   try {
-    std::optional<CKRecord> record =
-        FindRecord(connection, ZoneNumber(connection, id.zoneID), id, desiredKeys);
-    if (record) return {id, {}, std::move(*record)};
+    const Zone zone = FindZone(connection, id.zoneID);
+    std::optional<CKRecord> record = FindRecord(connection, zone.number, id, desiredKeys);
+    if (record && Sees(connection, zone, id.recordName)) return {id, {}, std::move(*record)};
     return {id, CKErrorMake(CKErrorCode::unknownItem, "No record " + id.description()), {}};
   } catch (const CallFailed &failed) {
     return {id, failed.error, {}};

@@ -41,13 +41,34 @@ void makeAccount(SqlDatabase &database, const std::string &name) {
     isEmpty = version.step() && version.integer(0) == 0;
   }
   if (isEmpty) CreateTables(database);
+  UpgradeTables(database);
+  {
+    // Whoever shares with that handle means the account that has it.
+    SqlUse taken = database.use("SELECT 1 FROM accounts WHERE handle = ?1 AND name <> ?1");
+    if (taken.bind(name).step()) {
+      Fail(CKErrorCode::invalidArguments, "The account's name is the handle of another account: " + name);
+    }
+  }
   database.use("INSERT OR IGNORE INTO accounts (name) VALUES (?)").bind(name).run();
   transaction.commit();
 }
 
-void checkFormat(SqlDatabase &database, const std::string &path) {
+std::int64_t formatOf(SqlDatabase &database) {
   SqlUse version = database.use("PRAGMA user_version");
-  const std::int64_t format = version.step() ? version.integer(0) : 0;
+  return version.step() ? version.integer(0) : 0;
+}
+
+// A cloud that an earlier version left, or put into this one's place.
+void upgradeIfOld(SqlDatabase &database) {
+  const std::int64_t format = formatOf(database);
+  if (format < kOldestFormat || format >= kFormat) return;
+  SqlTransaction transaction(database, SqlTransaction::Kind::writing);
+  UpgradeTables(database);
+  transaction.commit();
+}
+
+void checkFormat(SqlDatabase &database, const std::string &path) {
+  const std::int64_t format = formatOf(database);
   if (format == kFormat) return;
   if (format == 0) Fail(CKErrorCode::serviceUnavailable, "The cloud is being made: " + path);
   Fail(CKErrorCode::internalError, "Not a cloud of this version: " + path);
@@ -69,10 +90,11 @@ void Fail(CKErrorCode code, std::string description) {
   throw CallFailed{CKErrorMake(code, std::move(description))};
 }
 
-Home::Home(std::string folder, std::string account, std::string device)
+Home::Home(std::string folder, std::string account, std::string device, CKDatabaseScope scope)
     : folder_(std::move(folder)),
       account_(std::move(account)),
       device_(std::move(device)),
+      scope_(scope),
       session_(randomNumber()),
       chunks_(folder_) {}
 
@@ -95,8 +117,10 @@ std::unique_ptr<Connection> Home::connect(bool mayCreate) const {
   } else if (now != connection->identity) {
     Fail(CKErrorCode::serviceUnavailable, "The cloud is being replaced: " + folder_);
   }
+  upgradeIfOld(*connection->database);
   checkFormat(*connection->database, databaseFile());
   connection->cloud = cloudUUID(*connection->database);
+  connection->scope = scope_;
   connection->account = accountNumber(*connection->database, account_);
   if (connection->account == 0) {
     // Another cloud came into its place; the account is opened there as it was here.
@@ -198,14 +222,6 @@ void Home::wakeWatchers() const {
                  errno);
   }
   if (file >= 0) close(file);
-}
-
-std::int64_t ZoneNumber(const Connection &connection, const CKRecordZoneID &zone) {
-  if (zone.ownerName == CKCurrentUserDefaultName) {
-    SqlUse row = connection.use("SELECT id FROM zones WHERE account = ? AND name = ?");
-    if (row.bind(connection.account).bind(zone.zoneName).step()) return row.integer(0);
-  }
-  Fail(CKErrorCode::zoneNotFound, "No zone " + zone.description());
 }
 
 }  // namespace droxa::embedded

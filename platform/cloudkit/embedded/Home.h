@@ -32,16 +32,18 @@ struct Connection {
   FileIdentity identity;
   UUID cloud;
   std::int64_t account = 0;
+  CKDatabaseScope scope = CKDatabaseScope::privateDatabase;
 
   SqlUse use(const char *sql) const { return database->use(sql); }
 };
 
-// One device's opening of a cloud folder: its names, its connections, the chunks beside the database.
+// One device's opening of a database of a cloud folder: its names, its connections, the chunks beside it.
 // Thread contract: every member may be called on any thread; mutex_ guards the idle connections and is held
 // for no call to the database.
 class Home {
  public:
-  Home(std::string folder, std::string account, std::string device);
+  Home(std::string folder, std::string account, std::string device,
+       CKDatabaseScope scope = CKDatabaseScope::privateDatabase);
 
   // Makes what is missing. Call once, before anything else.
   NSError create();
@@ -55,6 +57,7 @@ class Home {
   const std::string &folder() const { return folder_; }
   const std::string &accountName() const { return account_; }
   const std::string &deviceName() const { return device_; }
+  CKDatabaseScope scope() const { return scope_; }
   // Tells this object's writes from those of others.
   std::int64_t session() const { return session_; }
   ChunkStore &chunks() { return chunks_; }
@@ -73,14 +76,12 @@ class Home {
   const std::string folder_;
   const std::string account_;
   const std::string device_;
+  const CKDatabaseScope scope_;
   const std::int64_t session_;
   ChunkStore chunks_;
 
   Mutex mutex_;
   std::vector<std::unique_ptr<Connection>> idle_ GUARDED_BY(mutex_);
 };
-
-// The number of the account's zone. Throws CallFailed: zoneNotFound.
-std::int64_t ZoneNumber(const Connection &connection, const CKRecordZoneID &zone);
 
 }  // namespace droxa::embedded

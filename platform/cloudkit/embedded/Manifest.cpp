@@ -5,8 +5,23 @@
 namespace droxa::embedded {
 
 bool KnowsAsset(const Connection &connection, const CKAssetReference &asset) {
-  SqlUse row = connection.use("SELECT size FROM assets WHERE digest = ?");
-  return row.bind(asset.sha256).step() && static_cast<std::uint64_t>(row.integer(0)) == asset.size;
+  SqlUse row = connection.use(
+      "SELECT size FROM assets WHERE digest = ?1 AND ("
+      "EXISTS (SELECT 1 FROM uploads WHERE asset = ?1 AND account = ?2)"
+      " OR EXISTS (SELECT 1 FROM record_assets JOIN zones ON zones.id = record_assets.zone"
+      " WHERE record_assets.asset = ?1 AND zones.account = ?2)"
+      " OR EXISTS (SELECT 1 FROM record_assets JOIN views ON views.zone = record_assets.zone"
+      " JOIN view_records ON view_records.view = views.id AND view_records.record = record_assets.record"
+      " WHERE record_assets.asset = ?1 AND views.account = ?2 AND view_records.visible))");
+  return row.bind(asset.sha256).bind(connection.account).step() &&
+         static_cast<std::uint64_t>(row.integer(0)) == asset.size;
+}
+
+void NoteUpload(const Connection &connection, const CKAssetReference &asset) {
+  connection.use("INSERT OR IGNORE INTO uploads (asset, account) VALUES (?, ?)")
+      .bind(asset.sha256)
+      .bind(connection.account)
+      .run();
 }
 
 std::vector<Piece> PiecesFrom(const Connection &connection, const CKAssetReference &asset,

@@ -3,7 +3,6 @@
 #include "platform/cloudkit/CKAssetFile.h"
 #include "platform/cloudkit/embedded/Calls.h"
 #include "platform/cloudkit/embedded/RecordSaver.h"
-#include "platform/cloudkit/embedded/StoredRecord.h"
 
 namespace droxa::embedded {
 namespace {
@@ -45,8 +44,14 @@ class Modification {
     if (NSError stopped = prepare()) return {stopped, {}, {}};
     if (!mustGiveUp()) {
       NSError error = home_.run(Home::Access::write, context_, [this](const Connection &connection) {
-        remove(connection);
-        save(connection);
+        RecordSaver saver(home_, connection);
+        // In another's zone last: what is moved out of a folder that goes must still be seen to be there.
+        const bool isShared = connection.scope == CKDatabaseScope::sharedDatabase;
+        if (!isShared) remove(saver, isShared);
+        save(saver, false);
+        save(saver, true);
+        if (isShared) remove(saver, isShared);
+        saver.finish();
         // Only now, so that every conflict is told. Rolls back; the results say why.
         if (mustGiveUp()) throw CallFailed{};
       });
@@ -88,27 +93,35 @@ class Modification {
     return {};
   }
 
-  void remove(const Connection &connection) {
+  void remove(RecordSaver &saver, bool isShared) {
+    std::vector<bool> isToBeRemoved(reply_.deleted.size(), true);
+    for (std::size_t i = 0; i < reply_.deleted.size() && isShared; ++i) {
+      attempt(reply_.deleted[i].error,
+              [&] { isToBeRemoved[i] = saver.mayRemove(request_.recordsToDelete[i]); });
+    }
     for (std::size_t i = 0; i < reply_.deleted.size(); ++i) {
-      NSError &error = reply_.deleted[i].error;
-      if (error) continue;
-      try {
-        RecordSaver(home_, connection).remove(request_.recordsToDelete[i]);
-      } catch (const CallFailed &failed) {
-        error = failed.error;
-      }
+      if (!isToBeRemoved[i]) continue;
+      attempt(reply_.deleted[i].error, [&] { saver.remove(request_.recordsToDelete[i]); });
     }
   }
 
-  void save(const Connection &connection) {
+  // Shares after all others: their roots may come in the same call.
+  void save(RecordSaver &saver, bool shares) {
     for (std::size_t i = 0; i < records_.size(); ++i) {
+      if ((records_[i].recordType == CKRecordTypeShare) != shares) continue;
       CKRecordResult &result = reply_.saved[i];
-      if (result.error) continue;
-      try {
-        result.record = RecordSaver(home_, connection).save(records_[i], request_.savePolicy);
-      } catch (const CallFailed &failed) {
-        result.error = failed.error;
-      }
+      attempt(result.error, [&] { result.record = saver.save(records_[i], request_.savePolicy); });
+    }
+  }
+
+  // Unless the record has failed already.
+  template <class Body>
+  static void attempt(NSError &error, const Body &body) {
+    if (error) return;
+    try {
+      body();
+    } catch (const CallFailed &failed) {
+      error = failed.error;
     }
   }
 

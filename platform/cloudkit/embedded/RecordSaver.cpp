@@ -3,6 +3,9 @@
 #include <random>
 #include <set>
 
+#include "platform/cloudkit/embedded/Manifest.h"
+#include "platform/cloudkit/embedded/ShareGuard.h"
+#include "platform/cloudkit/embedded/ShareStamp.h"
 #include "platform/cloudkit/embedded/StoredRecord.h"
 
 namespace droxa::embedded {
@@ -60,8 +63,9 @@ NSError RecordError(const CKRecord &record) {
 }
 
 CKRecord RecordSaver::save(const CKRecord &record, CKRecordSavePolicy policy) {
-  const std::int64_t zone = ZoneNumber(connection_, record.recordID.zoneID);
-  std::optional<CKRecord> current = FindRecord(connection_, zone, record.recordID, {});
+  const Zone zone = FindZone(connection_, record.recordID.zoneID);
+  std::optional<CKRecord> current = FindRecord(connection_, zone.number, record.recordID, {});
+  if (!zone.isOwn()) ShareGuard(connection_, zone).checkSave(record, current);
   if (policy == CKRecordSavePolicy::ifServerRecordUnchanged) {
     if (!current && !record.recordChangeTag.empty()) {
       Fail(CKErrorCode::unknownItem, "The record is gone: " + record.recordID.description());
@@ -75,14 +79,46 @@ CKRecord RecordSaver::save(const CKRecord &record, CKRecordSavePolicy policy) {
   }
   CKRecord saved = record;
   saved.fields = merged(record, current, policy);
-  const std::string encoded = EncodeFields(saved.fields);
-  if (encoded.size() > CKLargestRecord) {
-    Fail(CKErrorCode::limitExceeded, "The record is too large: " + record.recordID.description());
+  if (saved.recordType == CKRecordTypeShare) return saveShare(zone, std::move(saved), current);
+  if (!zone.isOwn()) ShareGuard(connection_, zone).checkPlace(saved, !current);
+  saved = commit(zone, std::move(saved));
+  if (zone.hasShares) {
+    Hierarchy(connection_, zone.number).put(saved);
+    views(zone).noteChange(saved.recordID.recordName, !current || ParentOf(*current) != ParentOf(saved));
   }
+  return saved;
+}
+
+CKRecord RecordSaver::saveShare(const Zone &zone, CKRecord saved, const std::optional<CKRecord> &current) {
+  const CKShare share = StampedShare(connection_, zone, saved, current);
+  const CKRecord stamped = share.record();
+  saved.fields = stamped.fields;
+  saved = commit(zone, std::move(saved));
+  views(zone).noteAccess(ShareTable(connection_, zone.number).put(share));
+  views(zone).noteChange(saved.recordID.recordName, false);
+  return saved;
+}
+
+CKRecord RecordSaver::rewriteShare(const Zone &zone, const CKShare &share) {
+  CKRecord saved = put(zone, share.record());
+  views(zone).noteAccess(ShareTable(connection_, zone.number).put(share));
+  views(zone).noteChange(share.recordID.recordName, false);
+  return saved;
+}
+
+// What whoever saves the record answers for.
+CKRecord RecordSaver::commit(const Zone &zone, CKRecord saved) {
   checkAssets(saved);
   checkQuota(zone, saved);
-  const std::int64_t seq = nextChange(connection_, zone);
-  saved.recordChangeTag = changeTag(seq);
+  return put(zone, std::move(saved));
+}
+
+CKRecord RecordSaver::put(const Zone &zone, CKRecord saved) {
+  const std::string encoded = EncodeFields(saved.fields);
+  if (encoded.size() > CKLargestRecord) {
+    Fail(CKErrorCode::limitExceeded, "The record is too large: " + saved.recordID.description());
+  }
+  saved.recordChangeTag = changeTag(nextChange(connection_, zone.number));
   saved.modificationDate = NSDate::now();
   saved.modifiedByDevice = home_.deviceName();
   refer(zone, saved);
@@ -90,18 +126,81 @@ CKRecord RecordSaver::save(const CKRecord &record, CKRecordSavePolicy policy) {
   return saved;
 }
 
+bool RecordSaver::mayRemove(const CKRecordDeletion &deletion) const {
+  const Zone zone = FindZone(connection_, deletion.recordID.zoneID);
+  if (!Sees(connection_, zone, deletion.recordID.recordName)) return false;
+  if (zone.isOwn() || ShareTable(connection_, zone.number).byRecord(deletion.recordID.recordName))
+    return true;
+  ShareGuard(connection_, zone).checkRemoval(deletion.recordID);
+  return true;
+}
+
 void RecordSaver::remove(const CKRecordDeletion &deletion) {
-  const std::int64_t zone = ZoneNumber(connection_, deletion.recordID.zoneID);
-  std::optional<CKRecord> current = FindRecord(connection_, zone, deletion.recordID, {});
+  const Zone zone = FindZone(connection_, deletion.recordID.zoneID);
+  std::optional<CKRecord> current = FindRecord(connection_, zone.number, deletion.recordID, {});
   if (!current) return;
   if (!deletion.recordChangeTag.empty() && current->recordChangeTag != deletion.recordChangeTag) {
     throw CallFailed{CKErrorMakeServerRecordChanged(std::move(*current))};
   }
-  current->recordChangeTag = changeTag(nextChange(connection_, zone));
-  current->modificationDate = NSDate::now();
-  current->modifiedByDevice = home_.deviceName();
-  ReleaseAssets(connection_, zone, deletion.recordID.recordName);
-  write(zone, *current, {}, true);
+  if (current->recordType == CKRecordTypeShare) {
+    zone.isOwn() ? removeShare(zone, *current) : leave(zone, *current);
+    return;
+  }
+  const std::string name = deletion.recordID.recordName;
+  bury(zone, std::move(*current));
+  if (!zone.hasShares) return;
+  Hierarchy(connection_, zone.number).remove(name);
+  views(zone).noteChange(name, true);
+  const auto place = ShareTable(connection_, zone.number).byRoot(name);
+  if (!place) return;
+  // There is nothing left that the share could be of.
+  const CKRecordID share{place->record, deletion.recordID.zoneID};
+  if (const auto record = FindRecord(connection_, zone.number, share, {})) removeShare(zone, *record);
+}
+
+void RecordSaver::removeShare(const Zone &zone, const CKRecord &share) {
+  const ShareTable table(connection_, zone.number);
+  if (const auto place = table.byRecord(share.recordID.recordName)) {
+    views(zone).noteAccess(table.remove(*place));
+  }
+  views(zone).noteChange(share.recordID.recordName, false);
+  bury(zone, share);
+}
+
+// The account's own part ends; the share stays.
+void RecordSaver::leave(const Zone &zone, const CKRecord &record) {
+  std::optional<CKShare> share = CKShare::shareWithRecord(record);
+  if (!share) Fail(CKErrorCode::internalError, "The cloud's share is damaged: " + record.description());
+  const std::string name = AccountByNumber(connection_, connection_.account).identity.accountName;
+  for (CKShareParticipant &participant : share->participants) {
+    if (participant.userIdentity.accountName == name) {
+      participant.acceptanceStatus = CKShareParticipantAcceptanceStatus::removed;
+    }
+  }
+  std::erase_if(share->participants, [](const CKShareParticipant &participant) {
+    return participant.role == CKShareParticipantRole::publicUser &&
+           participant.acceptanceStatus == CKShareParticipantAcceptanceStatus::removed;
+  });
+  rewriteShare(zone, *share);
+}
+
+// Leaves of a record what the feed of changes tells of a deletion.
+void RecordSaver::bury(const Zone &zone, CKRecord record) {
+  record.recordChangeTag = changeTag(nextChange(connection_, zone.number));
+  record.modificationDate = NSDate::now();
+  record.modifiedByDevice = home_.deviceName();
+  ReleaseAssets(connection_, zone, record.recordID.recordName);
+  write(zone, record, {}, true);
+}
+
+Views &RecordSaver::views(const Zone &zone) {
+  std::unique_ptr<Views> &views = views_[zone.number];
+  if (!views) views = std::make_unique<Views>(home_, connection_, zone.number);
+  return *views;
+}
+
+void RecordSaver::finish() {
+  for (const auto &entry : views_) entry.second->finish();
 }
 
 Fields RecordSaver::merged(const CKRecord &record, const std::optional<CKRecord> &current,
@@ -121,21 +220,20 @@ Fields RecordSaver::merged(const CKRecord &record, const std::optional<CKRecord>
 // Inside the transaction: contents that are there now can't be collected before the record refers to them.
 void RecordSaver::checkAssets(const CKRecord &record) const {
   for (const CKAssetReference &asset : assetsOf(record)) {
-    SqlUse row = connection_.use("SELECT size FROM assets WHERE digest = ?");
-    if (row.bind(asset.sha256).step() && static_cast<std::uint64_t>(row.integer(0)) == asset.size) continue;
+    if (KnowsAsset(connection_, asset)) continue;
     Fail(CKErrorCode::assetFileNotFound,
          "The cloud has no contents " + asset.description() + " for " + record.recordID.description());
   }
 }
 
-void RecordSaver::checkQuota(std::int64_t zone, const CKRecord &record) const {
+void RecordSaver::checkQuota(const Zone &zone, const CKRecord &record) const {
   SqlUse account = connection_.use("SELECT quota, used FROM accounts WHERE id = ?");
-  if (!account.bind(connection_.account).step() || account.isNull(0)) return;
+  if (!account.bind(zone.owner).step() || account.isNull(0)) return;
   const auto quota = static_cast<std::uint64_t>(account.integer(0));
   const auto used = static_cast<std::uint64_t>(account.integer(1));
   SqlUse row =
       connection_.use("SELECT coalesce(sum(size), 0) FROM record_assets WHERE zone = ? AND record = ?");
-  row.bind(zone).bind(record.recordID.recordName).step();
+  row.bind(zone.number).bind(record.recordID.recordName).step();
   const auto before = static_cast<std::uint64_t>(row.integer(0));
   const std::uint64_t after = bytesOf(assetsOf(record));
   // What doesn't grow is taken even when the quota was lowered below what is there.
@@ -144,13 +242,13 @@ void RecordSaver::checkQuota(std::int64_t zone, const CKRecord &record) const {
   }
 }
 
-void RecordSaver::refer(std::int64_t zone, const CKRecord &record) {
+void RecordSaver::refer(const Zone &zone, const CKRecord &record) {
   const std::string &name = record.recordID.recordName;
   ReleaseAssets(connection_, zone, name);
   const std::set<CKAssetReference> assets = assetsOf(record);
   for (const CKAssetReference &asset : assets) {
     connection_.use("INSERT INTO record_assets (zone, record, asset, size) VALUES (?, ?, ?, ?)")
-        .bind(zone)
+        .bind(zone.number)
         .bind(name)
         .bind(asset.sha256)
         .bind(static_cast<std::int64_t>(asset.size))
@@ -159,20 +257,20 @@ void RecordSaver::refer(std::int64_t zone, const CKRecord &record) {
   if (assets.empty()) return;
   connection_.use("UPDATE accounts SET used = used + ? WHERE id = ?")
       .bind(static_cast<std::int64_t>(bytesOf(assets)))
-      .bind(connection_.account)
+      .bind(zone.owner)
       .run();
 }
 
-void RecordSaver::write(std::int64_t zone, const CKRecord &record, const std::string &encoded,
+void RecordSaver::write(const Zone &zone, const CKRecord &record, const std::string &encoded,
                         bool isDeleted) {
   SqlUse last = connection_.use("SELECT seq FROM zones WHERE id = ?");
-  last.bind(zone).step();
+  last.bind(zone.number).step();
   connection_
       .use(
           "INSERT OR REPLACE INTO records (zone, name, seq, type, tag, time, device, session, deleted, "
           "fields)"
           " VALUES (?, ?, ?, ?, ?, ?, ?, ?, ?, ?)")
-      .bind(zone)
+      .bind(zone.number)
       .bind(record.recordID.recordName)
       .bind(last.integer(0))
       .bind(record.recordType)

@@ -2,6 +2,7 @@
 
 #include <ctime>
 
+#include "platform/cloudkit/CKShare.h"
 #include "platform/cloudkit/embedded/RecordCoding.h"
 
 namespace droxa::embedded {
@@ -13,7 +14,8 @@ CKRecord ReadRecord(const SqlUse &row, const CKRecordZoneID &zone, const CKDesir
   record.recordChangeTag = row.text(2);
   record.modificationDate = NSDate::dateWithNanosecondsSince1970(row.integer(3));
   record.modifiedByDevice = row.text(4);
-  std::optional<Fields> fields = DecodeFields(row.bytes(5), desiredKeys);
+  const bool isShare = record.recordType == CKRecordTypeShare;
+  std::optional<Fields> fields = DecodeFields(row.bytes(5), isShare ? CKDesiredKeys() : desiredKeys);
   if (!fields) {
     Fail(CKErrorCode::internalError, "The cloud's record is damaged: " + record.recordID.description());
   }
@@ -29,41 +31,44 @@ std::optional<CKRecord> FindRecord(const Connection &connection, std::int64_t zo
   return ReadRecord(row, id.zoneID, desiredKeys);
 }
 
-void ReleaseAssets(const Connection &connection, std::int64_t zone, const std::string &record) {
+void ReleaseAssets(const Connection &connection, const Zone &zone, const std::string &record) {
   connection
       .use(
           "UPDATE accounts SET used = used - (SELECT coalesce(sum(size), 0) FROM record_assets"
           " WHERE zone = ? AND record = ?) WHERE id = ?")
-      .bind(zone)
+      .bind(zone.number)
       .bind(record)
-      .bind(connection.account)
+      .bind(zone.owner)
       .run();
   connection
       .use(
           "UPDATE assets SET touched = ? WHERE digest IN"
           " (SELECT asset FROM record_assets WHERE zone = ? AND record = ?)")
       .bind(SecondsNow())
-      .bind(zone)
+      .bind(zone.number)
       .bind(record)
       .run();
-  connection.use("DELETE FROM record_assets WHERE zone = ? AND record = ?").bind(zone).bind(record).run();
+  connection.use("DELETE FROM record_assets WHERE zone = ? AND record = ?")
+      .bind(zone.number)
+      .bind(record)
+      .run();
 }
 
-void ReleaseZoneAssets(const Connection &connection, std::int64_t zone) {
+void ReleaseZoneAssets(const Connection &connection, const Zone &zone) {
   connection
       .use(
           "UPDATE accounts SET used = used - (SELECT coalesce(sum(size), 0) FROM record_assets WHERE zone = "
           "?)"
           " WHERE id = ?")
-      .bind(zone)
-      .bind(connection.account)
+      .bind(zone.number)
+      .bind(zone.owner)
       .run();
   connection
       .use("UPDATE assets SET touched = ? WHERE digest IN (SELECT asset FROM record_assets WHERE zone = ?)")
       .bind(SecondsNow())
-      .bind(zone)
+      .bind(zone.number)
       .run();
-  connection.use("DELETE FROM record_assets WHERE zone = ?").bind(zone).run();
+  connection.use("DELETE FROM record_assets WHERE zone = ?").bind(zone.number).run();
 }
 
 std::int64_t SecondsNow() {

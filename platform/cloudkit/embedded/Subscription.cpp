@@ -19,10 +19,24 @@ namespace {
 constexpr int kLookAnywayMilliseconds = 2000;
 
 struct ZoneState {
-  std::int64_t number;
+  std::int64_t number;  // the zone's; in a shared database the view's
   std::int64_t seq;
   bool isOwn;  // made through this very object
 };
+
+// The zones that a database has, with the numbers of their last changes; and whether others made any since.
+struct Queries {
+  const char *zones;
+  const char *changes;
+};
+constexpr Queries kPrivate{"SELECT id, name, seq, session, NULL FROM zones WHERE account = ?",
+                           "SELECT 1 FROM records WHERE zone = ? AND seq > ? AND session <> ? LIMIT 1"};
+constexpr Queries kShared{
+    "SELECT views.id, zones.name, views.seq, 0, accounts.name FROM views JOIN zones ON zones.id = views.zone"
+    " JOIN accounts ON accounts.id = zones.account WHERE views.account = ? AND EXISTS"
+    " (SELECT 1 FROM share_access JOIN shares ON shares.id = share"
+    " WHERE share_access.account = views.account AND shares.zone = zones.id)",
+    "SELECT 1 FROM view_records WHERE view = ? AND seq > ? AND session <> ? LIMIT 1"};
 
 // Watches the cloud on a thread of its own, which ends when stop() was called.
 // Thread contract: begin() and look() on one thread at a time; stop() on any thread.
@@ -31,6 +45,7 @@ class Watch {
   Watch(std::shared_ptr<Home> home, CKZonesChangedHandler handler)
       : home_(std::move(home)),
         handler_(std::move(handler)),
+        queries_(home_->scope() == CKDatabaseScope::privateDatabase ? kPrivate : kShared),
         inotify_(inotify_init1(IN_NONBLOCK | IN_CLOEXEC)),
         stopped_(eventfd(0, EFD_NONBLOCK | EFD_CLOEXEC)) {
     context_.cancellation = std::make_shared<CKCancellation>();
@@ -67,7 +82,7 @@ class Watch {
   }
 
  private:
-  using Zones = std::map<std::string, ZoneState>;
+  using Zones = std::map<CKRecordZoneID, ZoneState>;
 
   bool watchFile() const {
     return inotify_add_watch(inotify_, home_->watchedFile().c_str(), IN_MODIFY | IN_ATTRIB) >= 0;
@@ -82,26 +97,27 @@ class Watch {
   // Reads the zones as they are; and which of them others changed since the last look.
   NSError readZones(Zones &zones, std::vector<CKRecordZoneID> *changed) const {
     return home_->run(Home::Access::read, context_, [&](const Connection &connection) {
-      SqlUse row = connection.use("SELECT id, name, seq, session FROM zones WHERE account = ?");
+      SqlUse row = connection.use(queries_.zones);
       row.bind(connection.account);
       while (row.step()) {
         const ZoneState state{row.integer(0), row.integer(2), row.integer(3) == home_->session()};
-        const std::string name = row.text(1);
-        zones[name] = state;
-        if (changed && isChangedByOthers(connection, name, state)) changed->push_back({name});
+        CKRecordZoneID zone{row.text(1)};
+        if (!row.isNull(4)) zone.ownerName = row.text(4);
+        zones[zone] = state;
+        if (changed && isChangedByOthers(connection, zone, state)) changed->push_back(zone);
       }
     });
   }
 
-  bool isChangedByOthers(const Connection &connection, const std::string &name,
+  bool isChangedByOthers(const Connection &connection, const CKRecordZoneID &zone,
                          const ZoneState &state) const {
-    const auto before = zones_.find(name);
+    const auto before = zones_.find(zone);
     const bool isNew = before == zones_.end() || before->second.number != state.number;
     if (isNew && !state.isOwn) return true;
     const std::int64_t seq = isNew ? 0 : before->second.seq;
     if (state.seq == seq) return false;
     if (state.seq < seq) return true;  // put back to an earlier state
-    SqlUse row = connection.use("SELECT 1 FROM records WHERE zone = ? AND seq > ? AND session <> ? LIMIT 1");
+    SqlUse row = connection.use(queries_.changes);
     return row.bind(state.number).bind(seq).bind(home_->session()).step();
   }
 
@@ -116,7 +132,7 @@ class Watch {
       return;
     }
     for (const auto &zone : zones_) {
-      if (!zones.contains(zone.first)) changed.push_back({zone.first});
+      if (!zones.contains(zone.first)) changed.push_back(zone.first);
     }
     zones_ = std::move(zones);
     if (!changed.empty() && !context_.isCancelled()) handler_(changed);
@@ -124,6 +140,7 @@ class Watch {
 
   const std::shared_ptr<Home> home_;
   const CKZonesChangedHandler handler_;
+  const Queries &queries_;
   const int inotify_;
   const int stopped_;
   CKCallContext context_;

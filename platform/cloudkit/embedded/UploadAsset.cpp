@@ -106,6 +106,7 @@ class Upload {
         }
       }
       WriteManifest(connection, asset, pieces_);
+      NoteUpload(connection, asset);
     });
     if (error || lostChunks_) return {error, {}};
     return {{}, CKAsset::assetWithReference(asset)};
@@ -115,8 +116,9 @@ class Upload {
   bool lostChunks() const { return lostChunks_; }
 
  private:
-  // A file that is larger than all that the account may have never gets in.
+  // A file that is larger than all that the account may have never gets in; into another's zone it may.
   NSError checkQuota() {
+    if (home_.scope() == CKDatabaseScope::sharedDatabase) return {};
     return home_.run(Home::Access::read, context_, [&](const Connection &connection) {
       SqlUse row = connection.use("SELECT quota FROM accounts WHERE id = ?");
       if (!row.bind(connection.account).step() || row.isNull(0)) return;

@@ -162,7 +162,7 @@ TEST_F(CKOperationTest, theSharedDatabaseHasNoZonesAndTakesNone) {
   EXPECT_EQ(container.privateCloudDatabase()->cloud(), cloud);
   CKCloud &shared = *container.sharedCloudDatabase()->cloud();
   EXPECT_TRUE(shared.listZones(patiently()).zones.empty());
-  EXPECT_CODE(shared.saveZone(kZone, patiently()), invalidArguments);
+  EXPECT_CODE(shared.saveZone(kZone, patiently()), permissionFailure);
   EXPECT_CODE(fetch(shared, item("a").recordID).error, zoneNotFound);
   EXPECT_CODE(saveError(shared, item("a")), zoneNotFound);
   EXPECT_CODE(changes(shared).error, zoneNotFound);
