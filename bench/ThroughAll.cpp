@@ -1,0 +1,338 @@
+// What a person's actions cost through client, fileproviderd, extension and keld, beside the system calls
+// that do the same to files on the same disk: what bench/bench_through_all is made of.
+//
+//   bench_through_all_calls HOME FOLDER each COUNT     every kind of action, COUNT times; times in
+//   microseconds bench_through_all_calls HOME FOLDER import COUNT   a folder of COUNT small files, beside cp
+//   -r bench_through_all_calls HOME FOLDER move NAME…     folders of the drive to another folder and back
+//
+// The plain calls work in FOLDER, which is made if it isn't there. Plain call and action take turns.
+
+#include <algorithm>
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <fcntl.h>
+#include <filesystem>
+#include <fstream>
+#include <functional>
+#include <future>
+#include <string>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <sys/xattr.h>
+#include <unistd.h>
+#include <vector>
+
+#include "bench/RunningDrive.h"
+#include "platform/fileprovider/FPTags.h"
+#include "platform/foundation/Paths.h"
+#include "platform/xpc/NSXPCProxyCreating.h"
+
+namespace droxa::bench {
+namespace {
+
+namespace fs = std::filesystem;
+using Clock = std::chrono::steady_clock;
+using Kind = FPDActionRequest::Kind;
+using Item = std::shared_ptr<const NSFileProviderItem>;
+constexpr std::chrono::seconds kLongest{600};
+constexpr int kRepetitions = 5;
+constexpr int kMoves = 100;
+
+double microseconds(const std::function<void()> &work) {
+  const Clock::time_point begin = Clock::now();
+  work();
+  return std::chrono::duration<double, std::micro>(Clock::now() - begin).count();
+}
+
+void check(bool ok, const std::string &what) {
+  if (!ok) fail(what);
+}
+
+// Of times that were taken by turns.
+struct Times {
+  std::vector<double> plain, through;
+};
+
+double share(std::vector<double> times, double part) {
+  std::sort(times.begin(), times.end());
+  return times[static_cast<std::size_t>(part * static_cast<double>(times.size() - 1))];
+}
+
+void print(const std::string &what, const Times &times) {
+  const double plain = share(times.plain, 0.5), through = share(times.through, 0.5);
+  std::printf("%-26s %9.1f %9.1f %10.1f %10.1f %10.1f %8.1f\n", what.c_str(), plain, share(times.plain, 0.99),
+              through, share(times.through, 0.99), through - plain, through / plain);
+  std::fflush(stdout);
+}
+
+// The running drive, and a folder beside it for the plain calls. Thread contract: one thread.
+class Bench {
+ public:
+  Bench(const std::string &home, std::string folder) : drive_(home), plain_(std::move(folder)) {
+    fs::create_directories(plain_);
+  }
+
+  RunningDrive &drive() { return drive_; }
+  std::string plain(const std::string &name) const { return plain_ + "/" + name; }
+
+  Item act(const FPDActionRequest &request) {
+    struct End {
+      Item item;
+      NSError error;
+    };
+    std::shared_ptr<FPDAction> action;
+    drive_.host().performAction(request, [&](const auto &begun, const NSError &error) {
+      check(begun != nullptr, error.description());
+      action = begun;
+    });
+    const auto end = std::make_shared<std::promise<End>>();
+    std::future<End> future = end->get_future();
+    NSXPCProxyWithErrorHandler<FPDAction>(action, [end](const NSError &error) {
+      end->set_value({nullptr, error});
+    })->waitWithReply([end](const Item &item, const NSError &error) {
+      end->set_value({item, error});
+    });
+    check(future.wait_for(kLongest) == std::future_status::ready, "an action didn't end");
+    const End got = future.get();
+    check(!got.error, FPDActionName(request.kind) + ": " + got.error.description());
+    check(got.item || request.kind == Kind::deleteItem, FPDActionName(request.kind) + ": no item came back");
+    return got.item;
+  }
+
+  std::string makeFolder(const std::string &name) {
+    FPDActionRequest request;
+    request.kind = Kind::createDirectory;
+    request.parentIdentifier = root();
+    request.name = name;
+    return act(request)->itemIdentifier();
+  }
+
+  // What was done before is in the cloud, so that one measurement doesn't pay for another.
+  void settle() {
+    drive_.keld().waitForUploadAtURL(NSURL(),
+                                     [](const NSError &error) { check(!error, error.description()); });
+  }
+
+  static std::string root() { return NSFileProviderRootContainerItemIdentifier; }
+
+ private:
+  RunningDrive drive_;
+  const std::string plain_;
+};
+
+// A few bytes as a copy makes them.
+void copyFile(const std::string &source, const std::string &target) {
+  const int from = open(source.c_str(), O_RDONLY | O_CLOEXEC);
+  const int to = open(target.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0644);
+  char bytes[4096];
+  check(read(from, bytes, sizeof bytes) == sizeof bytes, source);
+  check(write(to, bytes, sizeof bytes) == sizeof bytes, target);
+  close(to);
+  close(from);
+}
+
+void rename(const std::string &from, const std::string &to) {
+  check(::rename(from.c_str(), to.c_str()) == 0, "rename " + from);
+}
+
+void note(const std::string &file, const char *attribute, const std::string &value) {
+  check(setxattr(file.c_str(), attribute, value.data(), value.size(), 0) == 0, "setxattr " + file);
+}
+
+// Every action of a person on a row of documents, one kind after the other.
+class Each {
+ public:
+  Each(Bench &bench, int count) : bench_(bench), identifiers_(static_cast<std::size_t>(count)) {}
+
+  void run() {
+    prepare();
+    creating();
+    placing();
+    noting();
+    trashing();
+  }
+
+ private:
+  using Plain = std::function<void(const std::string &number)>;
+  using Fill = std::function<void(FPDActionRequest &request, const std::string &number)>;
+
+  void prepare() {
+    for (const char *name : {"source", "in", "out", "trash"}) fs::create_directory(bench_.plain(name));
+    for (std::size_t i = 0; i < identifiers_.size(); ++i)
+      std::ofstream(source(std::to_string(i))) << std::string(4096, 'x');
+    in_ = bench_.makeFolder("in");
+    out_ = bench_.makeFolder("out");
+  }
+
+  std::string source(const std::string &number) const { return bench_.plain("source/" + number + ".txt"); }
+  std::string in(const std::string &name) const { return bench_.plain("in/" + name + ".txt"); }
+  std::string out(const std::string &name) const { return bench_.plain("out/" + name + ".txt"); }
+  std::string trashed(const std::string &name) const { return bench_.plain("trash/" + name + ".txt"); }
+
+  void measure(const std::string &what, Kind kind, const Plain &plain, const Fill &fill) {
+    bench_.settle();
+    Times times;
+    for (std::size_t i = 0; i < identifiers_.size(); ++i) {
+      const std::string number = std::to_string(i);
+      FPDActionRequest request;
+      request.kind = kind;
+      request.identifier = identifiers_[i];
+      fill(request, number);
+      times.plain.push_back(microseconds([&] { plain(number); }));
+      Item item;
+      times.through.push_back(microseconds([&] { item = bench_.act(request); }));
+      if (item && kind != Kind::createDirectory) identifiers_[i] = item->itemIdentifier();
+    }
+    print(what, times);
+  }
+
+  void creating() {
+    measure(
+        "mkdir", Kind::createDirectory,
+        [&](const std::string &number) { check(mkdir(out(number).c_str(), 0777) == 0, "mkdir"); },
+        [&](FPDActionRequest &request, const std::string &number) {
+          request.parentIdentifier = bench_.root();
+          request.name = "folder " + number;
+        });
+    for (std::size_t i = 0; i < identifiers_.size(); ++i) rmdir(out(std::to_string(i)).c_str());
+    measure(
+        "import of 4 KiB", Kind::importDocument,
+        [&](const std::string &number) { copyFile(source(number), in(number)); },
+        [&](FPDActionRequest &request, const std::string &number) {
+          request.url = NSURL::fileURLWithPath(source(number));
+          request.parentIdentifier = in_;
+        });
+  }
+
+  void placing() {
+    measure(
+        "rename", Kind::rename, [&](const std::string &number) { rename(in(number), in("new " + number)); },
+        [](FPDActionRequest &request, const std::string &number) {
+          request.name = "new " + number + ".txt";
+        });
+    measure(
+        "move", Kind::reparent, [&](const std::string &number) { rename(in("new " + number), out(number)); },
+        [&](FPDActionRequest &request, const std::string &) { request.parentIdentifier = out_; });
+  }
+
+  void noting() {
+    measure(
+        "tag", Kind::setTagData,
+        [&](const std::string &number) { note(out(number), "user.xdg.tags", "urgent"); },
+        [](FPDActionRequest &request, const std::string &) {
+          request.tagData = FPGetTagsDataFromTags({{"urgent", 0}});
+        });
+    measure(
+        "favourite", Kind::setFavoriteRank,
+        [&](const std::string &number) { note(out(number), "user.rank", "7"); },
+        [](FPDActionRequest &request, const std::string &) { request.favoriteRank = 7; });
+    measure(
+        "used", Kind::setLastUsedDate,
+        [&](const std::string &number) { note(out(number), "user.used", "1790000000000000000"); },
+        [](FPDActionRequest &request, const std::string &) { request.date = NSDate::now(); });
+  }
+
+  void trashing() {
+    const Fill nothing = [](FPDActionRequest &, const std::string &) {};
+    measure(
+        "trash", Kind::trash, [&](const std::string &number) { rename(out(number), trashed(number)); },
+        nothing);
+    measure(
+        "restore", Kind::untrash, [&](const std::string &number) { rename(trashed(number), out(number)); },
+        nothing);
+    measure(
+        "delete", Kind::deleteItem,
+        [&](const std::string &number) { check(unlink(out(number).c_str()) == 0, "unlink"); }, nothing);
+  }
+
+  Bench &bench_;
+  std::vector<std::string> identifiers_;
+  std::string in_, out_;
+};
+
+void runCommand(const std::vector<std::string> &words) {
+  std::vector<char *> arguments;
+  for (const std::string &word : words) arguments.push_back(const_cast<char *>(word.c_str()));
+  arguments.push_back(nullptr);
+  const pid_t child = vfork();
+  if (child == 0) {
+    execvp(arguments[0], arguments.data());
+    _exit(127);
+  }
+  int status = 0;
+  check(child > 0 && waitpid(child, &status, 0) == child && status == 0, words[0] + " failed");
+}
+
+// The fastest of each: a folder that is imported again and again, under names of its own.
+void importFolder(Bench &bench, int count) {
+  Times times;
+  for (int round = 0; round < kRepetitions; ++round) {
+    const std::string name = "imported " + std::to_string(round);
+    const std::string source = bench.plain(name);
+    fs::create_directory(source);
+    for (int i = 0; i < count; ++i) std::ofstream(source + "/" + std::to_string(i)) << std::string(512, 'x');
+    bench.settle();
+    times.plain.push_back(microseconds([&] { runCommand({"cp", "-r", source, source + " copy"}); }));
+    FPDActionRequest request;
+    request.kind = Kind::importDocument;
+    request.url = NSURL::fileURLWithPath(source);
+    request.parentIdentifier = Bench::root();
+    times.through.push_back(microseconds([&] { bench.act(request); }));
+  }
+  const double plain = share(times.plain, 0), through = share(times.through, 0);
+  std::printf("a folder of %d files: import %.1f ms, cp -r %.1f ms, ratio %.2f (fastest of %d)\n", count,
+              through / 1000, plain / 1000, through / plain, kRepetitions);
+}
+
+// To another folder and back, the folders by turns. The plain ones are beside the drive, under the same
+// names.
+void moveFolders(Bench &bench, const std::vector<std::string> &names) {
+  const std::string to = bench.makeFolder("moved");
+  fs::create_directory(bench.plain("moved"));
+  std::vector<Times> times(names.size());
+  std::vector<std::string> identifiers;
+  for (const std::string &name : names) identifiers.push_back(bench.drive().itemAtPath(name).itemIdentifier);
+  for (int move = 0; move < kMoves; ++move) {
+    const bool isThere = move % 2 == 1;
+    for (std::size_t i = 0; i < names.size(); ++i) {
+      const std::string here = bench.plain(names[i]), there = bench.plain("moved/" + names[i]);
+      times[i].plain.push_back(microseconds([&] { isThere ? rename(there, here) : rename(here, there); }));
+      FPDActionRequest request;
+      request.kind = Kind::reparent;
+      request.identifier = identifiers[i];
+      request.parentIdentifier = isThere ? Bench::root() : to;
+      times[i].through.push_back(microseconds([&] { bench.act(request); }));
+    }
+  }
+  for (std::size_t i = 0; i < names.size(); ++i) print("move of " + names[i], times[i]);
+  const double first = share(times.front().through, 0.5), last = share(times.back().through, 0.5);
+  std::printf("a move of %s takes %.2f times that of %s\n", names.back().c_str(), last / first,
+              names.front().c_str());
+}
+
+int run(const std::vector<std::string> &words) {
+  if (words.size() < 4) fail("HOME, FOLDER, a command and its argument are needed");
+  Bench bench(DroxaHome(words[0]).root(), words[1]);
+  const std::string &command = words[2];
+  if (command != "import") {
+    std::printf("%-26s %9s %9s %10s %10s %10s %8s\n", "us", "plain", "99%", "through", "99%", "added",
+                "ratio");
+  }
+  if (command == "each")
+    Each(bench, std::atoi(words[3].c_str())).run();
+  else if (command == "import")
+    importFolder(bench, std::atoi(words[3].c_str()));
+  else if (command == "move")
+    moveFolders(bench, {words.begin() + 3, words.end()});
+  else
+    fail("no such command: " + command);
+  return 0;
+}
+
+}  // namespace
+}  // namespace droxa::bench
+
+int main(int argc, char **argv) {
+  return droxa::bench::run({argv + 1, argv + argc});
+}
