@@ -128,8 +128,9 @@ class SyncEngine {
   std::vector<Waiter> waiting_;
   std::set<std::string> unbound_;  // records at the last poll
   std::chrono::milliseconds retryPause_{0};
-  std::chrono::milliseconds againPause_{0};  // before what couldn't be applied is fetched again
-  NSError problems_[2];                      // by direction
+  std::chrono::steady_clock::time_point pauseEnd_;  // after the last problem
+  std::chrono::milliseconds againPause_{0};         // before what couldn't be applied is fetched again
+  NSError problems_[2];                             // by direction
   bool hasSeenReplica_ = false;
   std::chrono::steady_clock::time_point nextPoll_;
 
