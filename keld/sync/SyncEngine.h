@@ -67,6 +67,8 @@ class SyncEngine {
   // with why one of them can't be.
   void whenUploaded(std::vector<ItemNumber> items, std::function<void(const NSError &error)> done);
   void answerDeletions(bool carryOut);
+  // A person asked for the deletion of these, which is about to be done.
+  void announceDeletions(const std::vector<ItemNumber> &items);
   bool isPinnedOrBelowPin(ItemNumber item);
 
   struct Status {
