@@ -271,6 +271,7 @@ void CloudApplier::apply(const DocumentRecord &document) {
   if (row && row->hasNewer() && row->newerTag == document.tag && context_.files.item(row->item) &&
       !context_.store.queued(row->item))
     return;
+  if (row && isOwnSaveOfDead(document, *row)) return followOwnSave(document, std::move(*row));
   Place place;
   if (!openPlace(document.parent, &place)) {
     waitForPlace(document);
@@ -291,6 +292,29 @@ void CloudApplier::apply(const DocumentRecord &document) {
     create(document, place, std::move(made));
   }
   if (document.kind == NSFileProviderItemKind::folder) context_.store.fetchOrphansOf(document.record);
+}
+
+// Whether this device has saved that itself and lost the reply, and what it saved was deleted here since.
+// Devices may have the same name: contents that this one has never had aren't its own.
+bool CloudApplier::isOwnSaveOfDead(const DocumentRecord &document, const SyncRow &row) {
+  if (row.item == 0 || document.device != context_.cloud.deviceName() || context_.files.item(row.item))
+    return false;
+  return document.content.digest == row.content.digest ||
+         context_.store.wasSent(document.record, document.content.digest);
+}
+
+// Nobody has changed it elsewhere, so that the deletion is newer and is to be sent. It isn't brought back.
+void CloudApplier::followOwnSave(const DocumentRecord &document, SyncRow row) {
+  const auto queued = context_.store.queued(row.item);
+  // The keeper is about to tell whether it was deleted or is only on its way elsewhere.
+  if (!queued || !queued->isDeletion) return context_.store.fetchAgain(document.record);
+  row.tag = document.tag;
+  row.parent = document.parent;
+  row.name = document.name;
+  row.content = document.content;
+  row.newerTag.clear();
+  row.newer = {};
+  context_.store.put(row);
 }
 
 DocumentMarker CloudApplier::markerOf(const DocumentRecord &document) const {

@@ -60,6 +60,8 @@ class CloudApplier {
   void apply(const DocumentRecord &document);
   void findLink(SyncRow *row);
   void waitForPlace(const DocumentRecord &document);
+  bool isOwnSaveOfDead(const DocumentRecord &document, const SyncRow &row);
+  void followOwnSave(const DocumentRecord &document, SyncRow row);
   bool openPlace(const std::string &parentRecord, Place *place);
 
   void create(const DocumentRecord &document, const Place &place, SyncRow row);

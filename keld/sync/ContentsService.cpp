@@ -339,7 +339,7 @@ void ContentsService::allowDeletionAtURL(const NSURL &url, QVContentsErrorReply 
          if (!item) return reply(error);
          std::vector<ItemNumber> items{item->id};
          self->forEachBelow(*item, [&](ItemRecord &child) { items.push_back(child.id); });
-         self->engine_->store().allowDeletions(items);
+         self->engine_->announceDeletions(items);
          reply(NSError());
        });
 }

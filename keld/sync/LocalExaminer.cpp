@@ -20,6 +20,12 @@ bool isSynced(const ItemRecord &item) {
   return isPlaced && (item.flags & kExcludedFlag) == 0 && item.parent != kLimboFolder;
 }
 
+std::int64_t nowMilliseconds() {
+  return std::chrono::duration_cast<std::chrono::milliseconds>(
+             std::chrono::system_clock::now().time_since_epoch())
+      .count();
+}
+
 }  // namespace
 
 LocalExaminer::LocalExaminer(SyncStore &store, ReplicaFiles &files, const ContentsStorage &storage,
@@ -115,7 +121,8 @@ void LocalExaminer::guardAgainstSpree(const std::vector<Change> &changes) {
     if (more) after = next.back().rank;
   }
   // Those of the window that were carried out aren't among the rows any more.
-  const std::uint64_t all = store_.countRows() + known - std::min(known, store_.countDeletions() + deaths);
+  const std::uint64_t all =
+      store_.countRows() + known - std::min(known, store_.countDeletions(nowMilliseconds()) + deaths);
   const std::uint64_t sum = known + following;
   if (sum < guard_.atLeast || static_cast<double>(sum) <= guard_.share * static_cast<double>(all)) return;
   os_log_error(qvc_default_log(),
@@ -128,7 +135,7 @@ void LocalExaminer::guardAgainstSpree(const std::vector<Change> &changes) {
 void LocalExaminer::holdDeletions() {
   holdsDeletions_ = true;
   store_.setNumber(kHoldsDeletions, 1);
-  store_.holdDeletions();
+  store_.holdDeletions(nowMilliseconds());
 }
 
 void LocalExaminer::allowDeletions() {
@@ -146,22 +153,30 @@ void LocalExaminer::forgetHoldIfNothingIsHeld() {
 
 // Whether the cloud has what has died, and nobody is known to have wanted that.
 bool LocalExaminer::isUnasked(ItemNumber item) {
-  return store_.byItem(item) && !store_.isDeletionAllowed(item);
+  return store_.byItem(item) && !isAllowed(item);
+}
+
+bool LocalExaminer::isAllowed(ItemNumber item) {
+  return store_.isDeletionAllowed(item, nowMilliseconds());
 }
 
 void LocalExaminer::examineDeath(ItemNumber item) {
-  if (store_.byItem(item)) return queue(item, true);
-  store_.dropQueued(item);
-  store_.forgetAllowedDeletion(item);
+  const bool isInCloud = store_.byItem(item).has_value();
+  // Done in time, it is meant however late it can be sent.
+  if (isInCloud && isAllowed(item))
+    store_.keepAllowedDeletion(item);
+  else
+    store_.forgetAllowedDeletion(item);
+  if (isInCloud)
+    queue(item, true);
+  else
+    store_.dropQueued(item);
 }
 
 void LocalExaminer::queue(ItemNumber item, bool isDeletion) {
   std::int64_t notBefore = 0;
-  const bool isUnaskedDeletion = isDeletion && !store_.isDeletionAllowed(item);
-  if (isUnaskedDeletion)
-    notBefore = std::chrono::duration_cast<std::chrono::milliseconds>(
-                    std::chrono::system_clock::now().time_since_epoch() + guard_.pause)
-                    .count();
+  const bool isUnaskedDeletion = isDeletion && !isAllowed(item);
+  if (isUnaskedDeletion) notBefore = nowMilliseconds() + guard_.pause.count();
   store_.enqueue(item, isDeletion, isUnaskedDeletion && holdsDeletions_, notBefore);
   queuedAny_ = true;
 }

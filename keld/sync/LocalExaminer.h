@@ -21,6 +21,8 @@ struct DeletionGuard {
   std::uint64_t atLeast = 25;  // deletions
   // No deletion is sent sooner, so that the first ones of many are still here when the rest is noticed.
   std::chrono::milliseconds pause{700};
+  // How long the announcement of a deletion stands, unless that was done before.
+  std::chrono::milliseconds announced{300'000};
 };
 
 // Reads the item table's feed of changes and finds out which of them the cloud doesn't know: those it puts
@@ -68,6 +70,7 @@ class LocalExaminer {
   void examineLive(const ItemRecord &item);
   void examineDeath(ItemNumber item);
   bool isUnasked(ItemNumber item);
+  bool isAllowed(ItemNumber item);
   bool bindLink(const ItemRecord &item, SyncRow row);
   bool hasSyncedContents(const ItemRecord &item, SyncRow &row);
   std::optional<SyncRow> findUnmarked(const ItemRecord &item, const std::string &parent);

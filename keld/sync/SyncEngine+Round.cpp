@@ -182,7 +182,7 @@ void SyncEngine::noteCloudProblem(Direction direction, const NSError &error) {
   if (isNews) os_log_error(qvc_default_log(), "[ERROR] the cloud: %@", error);
   retryPause_ = std::min(std::max(retryPause_ * 2, kFirstPause), kLongestPause);
   if (const auto asked = CKErrorRetryAfter(error)) retryPause_ = std::max(retryPause_, *asked);
-  nextPoll_ = std::chrono::steady_clock::now() + retryPause_;
+  nextPoll_ = pauseEnd_ = std::chrono::steady_clock::now() + retryPause_;
 }
 
 // What was made here and was gone again before the keeper saw it: no deletion is known of it, so it comes
@@ -233,7 +233,8 @@ void SyncEngine::waitForWork() {
     const auto now = std::chrono::duration_cast<std::chrono::milliseconds>(
         std::chrono::system_clock::now().time_since_epoch());
     const auto wait = std::max(std::chrono::milliseconds(*retry) - now, std::chrono::milliseconds(5));
-    if (retryPause_.count() == 0) until = std::min(until, std::chrono::steady_clock::now() + wait);
+    // What wasn't due yet when the cloud could be reached again isn't left to the next poll.
+    until = std::min(until, std::max(std::chrono::steady_clock::now() + wait, pauseEnd_));
   }
   if (const auto retry = downloads_->nextRetry()) until = std::min(until, *retry);
   // Nobody tells of the end of the first look at the replica.

@@ -275,6 +275,12 @@ void SyncEngine::answerDeletions(bool carryOut) {
   });
 }
 
+void SyncEngine::announceDeletions(const std::vector<ItemNumber> &items) {
+  const auto now = std::chrono::duration_cast<std::chrono::milliseconds>(
+      std::chrono::system_clock::now().time_since_epoch());
+  store_.allowDeletions(items, now.count(), (now + options_.deletionGuard.announced).count());
+}
+
 bool SyncEngine::isPinnedOrBelowPin(ItemNumber item) {
   const std::vector<ItemNumber> pins = store_.pins();
   if (pins.empty()) return false;

@@ -67,6 +67,8 @@ class SyncEngine {
   // with why one of them can't be.
   void whenUploaded(std::vector<ItemNumber> items, std::function<void(const NSError &error)> done);
   void answerDeletions(bool carryOut);
+  // A person asked for the deletion of these, which is about to be done.
+  void announceDeletions(const std::vector<ItemNumber> &items);
   bool isPinnedOrBelowPin(ItemNumber item);
 
   struct Status {
@@ -128,8 +130,9 @@ class SyncEngine {
   std::vector<Waiter> waiting_;
   std::set<std::string> unbound_;  // records at the last poll
   std::chrono::milliseconds retryPause_{0};
-  std::chrono::milliseconds againPause_{0};  // before what couldn't be applied is fetched again
-  NSError problems_[2];                      // by direction
+  std::chrono::steady_clock::time_point pauseEnd_;  // after the last problem
+  std::chrono::milliseconds againPause_{0};         // before what couldn't be applied is fetched again
+  NSError problems_[2];                             // by direction
   bool hasSeenReplica_ = false;
   std::chrono::steady_clock::time_point nextPoll_;
 

@@ -10,6 +10,9 @@ namespace {
 
 constexpr std::int64_t kLongestDelay = 3'600'000;  // milliseconds
 
+// Of the announcements that stand at ?1. None is made for longer than until ?2: the clock was put back.
+#define STANDS "(until = 0 OR (until > ?1 AND until <= ?2))"
+
 #define UPLOAD_COLUMNS \
   "sequence, item, generation, attempts, deletion, held, errorDomain, errorCode, errorText"
 
@@ -140,13 +143,25 @@ std::uint64_t SyncStore::countHeld() {
   return count("SELECT count(*) FROM uploads WHERE held = 1");
 }
 
-std::uint64_t SyncStore::countDeletions() {
-  return count("SELECT count(*) FROM uploads WHERE deletion = 1 AND item NOT IN (SELECT item FROM meant)");
+std::uint64_t SyncStore::countDeletions(std::int64_t now) {
+  const RecursiveLock lock(mutex_);
+  SqlStatement &asked = statement(
+      "SELECT count(*) FROM uploads WHERE deletion = 1"
+      " AND item NOT IN (SELECT item FROM meant WHERE " STANDS ")");
+  asked.bind(1, now).bind(2, now + kLongestDelay);
+  const std::uint64_t number = asked.step() ? asked.number(0) : 0;
+  asked.reset();
+  return number;
 }
 
-void SyncStore::holdDeletions() {
+void SyncStore::holdDeletions(std::int64_t now) {
   const RecursiveLock lock(mutex_);
-  statement("UPDATE uploads SET held = 1 WHERE deletion = 1 AND item NOT IN (SELECT item FROM meant)").run();
+  statement(
+      "UPDATE uploads SET held = 1 WHERE deletion = 1"
+      " AND item NOT IN (SELECT item FROM meant WHERE " STANDS ")")
+      .bind(1, now)
+      .bind(2, now + kLongestDelay)
+      .run();
 }
 
 void SyncStore::releaseHeld() {
@@ -156,18 +171,29 @@ void SyncStore::releaseHeld() {
 
 // --- Deletions that were asked for.
 
-void SyncStore::allowDeletions(const std::vector<ItemNumber> &items) {
+void SyncStore::allowDeletions(const std::vector<ItemNumber> &items, std::int64_t now, std::int64_t until) {
   const RecursiveLock lock(mutex_);
   transaction([&]() NO_THREAD_SAFETY_ANALYSIS {
+    statement("DELETE FROM meant WHERE NOT " STANDS).bind(1, now).bind(2, now + kLongestDelay).run();
     for (const ItemNumber item : items)
-      statement("INSERT OR IGNORE INTO meant VALUES (?)").bind(1, item).run();
+      statement(
+          "INSERT INTO meant(item, until) VALUES (?1, ?2)"
+          " ON CONFLICT(item) DO UPDATE SET until = ?2 WHERE until <> 0")
+          .bind(1, item)
+          .bind(2, until)
+          .run();
   });
 }
 
-bool SyncStore::isDeletionAllowed(ItemNumber item) {
+void SyncStore::keepAllowedDeletion(ItemNumber item) {
   const RecursiveLock lock(mutex_);
-  SqlStatement &asked = statement("SELECT 1 FROM meant WHERE item = ?");
-  asked.bind(1, item);
+  statement("UPDATE meant SET until = 0 WHERE item = ?").bind(1, item).run();
+}
+
+bool SyncStore::isDeletionAllowed(ItemNumber item, std::int64_t now) {
+  const RecursiveLock lock(mutex_);
+  SqlStatement &asked = statement("SELECT 1 FROM meant WHERE item = ?3 AND " STANDS);
+  asked.bind(1, now).bind(2, now + kLongestDelay).bind(3, item);
   const bool found = asked.step();
   asked.reset();
   return found;

@@ -77,8 +77,14 @@ ALTER TABLE rows ADD COLUMN lastUsed INTEGER NOT NULL DEFAULT 0;
 ALTER TABLE rows ADD COLUMN favoriteRank INTEGER NOT NULL DEFAULT 0;
 )sql";
 
+// Until when the announcement of a deletion stands, in milliseconds since 1970; 0: it was carried out in
+// time. Those that were made before say nothing of when.
+constexpr char kMeantUntil[] = R"sql(
+ALTER TABLE meant ADD COLUMN until INTEGER NOT NULL DEFAULT 1;
+)sql";
+
 // Each step leads from the version of its place to the next; version 0 is an empty database.
-constexpr const char *kSteps[] = {kTables, kUnfinished, kMeant};
+constexpr const char *kSteps[] = {kTables, kUnfinished, kMeant, kMeantUntil};
 
 }  // namespace
 

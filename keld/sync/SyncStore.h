@@ -144,14 +144,18 @@ class SyncStore {
   std::uint64_t countQueued();
   std::uint64_t countFailed();
   std::uint64_t countHeld();
-  std::uint64_t countDeletions();  // that nobody is known to have asked for
-  void holdDeletions();            // all that wait
+  // Deletions that nobody is known to have asked for.
+  std::uint64_t countDeletions(std::int64_t nowMilliseconds);
+  void holdDeletions(std::int64_t nowMilliseconds);  // all of them that wait
   void releaseHeld();
   std::vector<QueuedUpload> held(std::uint64_t limit);
 
-  // Deletions that a person asked for, before the items died; they are never held.
-  void allowDeletions(const std::vector<ItemNumber> &items);
-  bool isDeletionAllowed(ItemNumber item);
+  // Deletions that a person asked for, before the items died; they are never held. What wasn't deleted by
+  // that time is an item like any other again; what was is kept allowed until the deletion is sent.
+  void allowDeletions(const std::vector<ItemNumber> &items, std::int64_t nowMilliseconds,
+                      std::int64_t untilMilliseconds);
+  bool isDeletionAllowed(ItemNumber item, std::int64_t nowMilliseconds);
+  void keepAllowedDeletion(ItemNumber item);
   void forgetAllowedDeletion(ItemNumber item);
 
   // Pins, by item.

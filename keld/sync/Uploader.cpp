@@ -22,6 +22,9 @@ constexpr std::uint64_t kInlineBytes = 16 << 20;  // of one round
 constexpr std::chrono::seconds kTransferTimeout{60};
 constexpr std::int64_t kSoon = 300;  // milliseconds
 constexpr std::int64_t kLongestPause = 300'000;
+// No record has it. Without a tag the record would go in whatever state it is, and a save whose reply was
+// lost may have been followed by another device's.
+constexpr char kUnknownTag[] = "unknown";
 
 std::int64_t nowMilliseconds() {
   return std::chrono::duration_cast<std::chrono::milliseconds>(
@@ -94,7 +97,8 @@ Uploader::Round Uploader::sendDue(const CKCallContext &call) {
     request.recordsToSave.push_back(std::move(record));
   }
   for (const Plan &plan : removals)
-    request.recordsToDelete.push_back({RecordID(plan.row.record), plan.row.tag});
+    request.recordsToDelete.push_back(
+        {RecordID(plan.row.record), plan.row.tag.empty() ? kUnknownTag : plan.row.tag});
   // The outcome of a call that is cut off isn't known: what this device itself has sent isn't a conflict.
   context_.store.transaction([&] {
     for (const Plan &plan : saves)
@@ -141,7 +145,10 @@ Uploader::Prepared Uploader::prepare(const QueuedUpload &entry, Plan *plan, cons
 
 Uploader::Prepared Uploader::prepareDeletion(const std::optional<ItemRecord> &item, Plan *plan) {
   // What was never seen to die is missing for another reason: the keeper hasn't told yet.
-  if (!plan->entry.isDeletion && !plan->row.record.empty()) return laterWith(plan, NSError());
+  if (!plan->entry.isDeletion && !plan->row.record.empty()) {
+    if (item) examiner_.examineItem(item->id);  // it isn't missing: it left what is synced
+    return laterWith(plan, NSError());
+  }
   if (plan->row.record.empty()) {
     context_.store.uploaded(plan->entry);
     return Prepared::nothing;

@@ -1,11 +1,17 @@
+#include <filesystem>
+#include <fstream>
 #include <gtest/gtest.h>
 #include <optional>
 #include <random>
 #include <string>
+#include <unistd.h>
 
 #include "tests/crash/CrashRun.h"
 #include "tests/crash/DocumentText.h"
+#include "tests/crash/RenamingEdit.h"
+#include "tests/crash/ReplicaReading.h"
 #include "tests/crash/Schedule.h"
+#include "tests/platform/TemporaryFolder.h"
 
 namespace droxa::crash {
 namespace {
@@ -46,6 +52,30 @@ TEST(Crash, onlyAWholeTextIsAVersion) {
   EXPECT_EQ(ReadDocumentText(mixed), std::nullopt);
   EXPECT_EQ(ReadDocumentText(text + '\0'), std::nullopt);
   EXPECT_EQ(ReadDocumentText(""), std::nullopt);
+}
+
+TEST(Crash, anEditWhoseFolderIsMovedLeavesNoTemporaryFile) {
+  for (const bool isBeside : {true, false}) {
+    const TemporaryFolder folder;
+    const std::filesystem::path root = folder.path();
+    std::filesystem::create_directories(root / "f");
+    std::filesystem::create_directories(root / "outside");
+    std::ofstream(root / "f/a") << "old";
+    for (const bool isDone : {false, true}) {
+      {
+        RenamingEdit edit(root / "f/a", isBeside ? "" : root / "outside", "saving 1");
+        ASSERT_TRUE(edit.makeTemporary());
+        ASSERT_EQ(::write(edit.temporary(), "new", 3), 3);
+        std::filesystem::rename(root / "f", root / "g");
+        if (isDone) {
+          EXPECT_TRUE(edit.renameOver());
+        }
+      }
+      std::filesystem::rename(root / "g", root / "f");
+      EXPECT_EQ(ReadAll(root / "f/a"), isDone ? "new" : "old");
+    }
+    EXPECT_EQ(ReadTree(root).size(), 3U) << "both folders and the document";
+  }
 }
 
 }  // namespace

@@ -7,6 +7,8 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include "tests/crash/RenamingEdit.h"
+
 namespace droxa::crash {
 
 namespace {
@@ -54,8 +56,12 @@ Workload::Open::~Open() {
 }
 
 std::unique_ptr<Workload::Open> Workload::open(const std::string &path, int flags) const {
+  return read(::open(path.c_str(), flags | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
+}
+
+std::unique_ptr<Workload::Open> Workload::read(int file) const {
   auto opened = std::make_unique<Open>();
-  opened->file = ::open(path.c_str(), flags | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC);
+  opened->file = file;
   struct stat status = {};
   if (opened->file < 0 || ::fstat(opened->file, &status) != 0 || !S_ISREG(status.st_mode)) return nullptr;
   opened->inode = status.st_ino;
@@ -204,32 +210,26 @@ bool Workload::editByTruncating(CrashDevice &device, const std::string &path, co
   return true;
 }
 
-// The temporary lies beside the document for one half, and where the drive doesn't see it for the other.
+// The temporary lies beside the document for one half, and where the drive doesn't see it for the other. The
+// daemon may move the document's folder meanwhile.
 bool Workload::editByRenamingOver(CrashDevice &device, const std::string &path, const Step &step) {
   const bool isBeside = step.otherPick % 2 == 0;
   const std::string name = "saving " + std::to_string(++temporaries_);
-  const std::string target = device.at(path);
-  const std::string temporary =
-      isBeside ? target.substr(0, target.rfind('/') + 1) + name : device.outside() + "/" + name;
-  const auto document = open(target, O_RDONLY);
-  if (!document || !document->version) return false;
+  RenamingEdit edit(device.at(path), isBeside ? "" : device.outside(), name);
+  const auto document = read(edit.openDocument());
+  if (!document || !document->version || !edit.makeTemporary()) return false;
   const VersionName version =
       model_.begin(document->version, step.length, device.name() + " renamed a new file over " + path);
-  const int file = ::open(temporary.c_str(), O_CREAT | O_EXCL | O_RDWR | O_CLOEXEC, 0644);
-  if (file < 0) return false;
-  bool done = writeWhole(file, DocumentText(version, step.length));
+  bool done = writeWhole(edit.temporary(), DocumentText(version, step.length));
   // What is replaced has to be what was read; the daemon may have brought something newer meanwhile.
-  const auto now = open(target, O_RDONLY);
-  done = done && now && now->version == document->version;
-  done = done && ::rename(temporary.c_str(), target.c_str()) == 0;
-  if (done) {
-    model_.acknowledge(version);
-    model_.count("edited by renaming over");
-  } else {
-    ::unlink(temporary.c_str());
-  }
-  ::close(file);
-  return done;
+  const auto now = read(edit.openDocument());
+  done = done && now && now->version == document->version && edit.renameOver();
+  model_.note(device.name() + (done ? " renamed " : " gave up ") + name + ", which was for " + path + " as " +
+              version.description());
+  if (!done) return false;
+  model_.acknowledge(version);
+  model_.count("edited by renaming over");
+  return true;
 }
 
 void Workload::editOnBoth(const Step &step) {

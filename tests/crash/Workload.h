@@ -36,6 +36,7 @@ class Workload {
     ~Open();
   };
   std::unique_ptr<Open> open(const std::string &path, int flags) const;
+  std::unique_ptr<Open> read(int file) const;  // which is its own from then on
 
   void noteWriting(const Open &document, const std::string &path, const VersionName &name);
   void create(CrashDevice &device, const Tree &tree, const Step &step);

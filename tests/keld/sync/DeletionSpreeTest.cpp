@@ -7,6 +7,8 @@ constexpr int kDocuments = 40;
 
 class DeletionSpree : public FaultyDrive {
  protected:
+  explicit DeletionSpree(KeldOptions options = {}) : FaultyDrive(std::move(options)) {}
+
   void fill() {
     device.keld.folder("f/g");
     for (int index = 0; index < kDocuments; ++index)
@@ -107,6 +109,27 @@ TEST_F(DeletionSpree, theWordForOneIsNoneForTheOthers) {
   EXPECT_TRUE(leavesCloudSoon("f/g/1"));
   EXPECT_TRUE(holds(kEverything - 2));
   EXPECT_EQ(hand.all().size(), kEverything - 1);
+}
+
+// Nothing is deleted in time here.
+class LateDeletion : public DeletionSpree {
+ protected:
+  LateDeletion() : DeletionSpree(options()) {}
+  static KeldOptions options() {
+    KeldOptions options;
+    options.sync.deletionGuard.announced = std::chrono::milliseconds(0);
+    return options;
+  }
+};
+
+TEST_F(LateDeletion, whatWasAskedForLongAgoIsASpreeLikeAnyOther) {
+  fill();
+  allow("f");
+  device.keld.remove("f");
+  EXPECT_TRUE(holds(kEverything - 1));
+  EXPECT_EQ(hand.all().size(), kEverything);
+  confirm(true);
+  EXPECT_TRUE(eventually([&] { return hand.paths() == std::vector<std::string>{"kept"}; }));
 }
 
 TEST_F(DeletionSpree, nothingThereIsNothingToAllow) {

@@ -160,8 +160,8 @@ TEST_F(SyncStoreTest, heldDeletionsAreNotDueUntilTheyAreReleased) {
   store.enqueue(3, false, false);
   EXPECT_EQ(due(), (Items{2, 3}));
   EXPECT_EQ(store.countHeld(), 1U);
-  EXPECT_EQ(store.countDeletions(), 2U);
-  store.holdDeletions();
+  EXPECT_EQ(store.countDeletions(0), 2U);
+  store.holdDeletions(0);
   EXPECT_EQ(due(), Items{3});
   EXPECT_EQ(store.held(100).size(), 2U);
   store.releaseHeld();
@@ -291,8 +291,8 @@ TEST_F(SyncStoreTest, aDatabaseOfTheFirstVersionIsBroughtUpToDate) {
     ASSERT_TRUE(got);
     EXPECT_EQ(got->newer, row("r", 7).newer);
     EXPECT_TRUE(got->metadata.isEmpty());
-    again.allowDeletions({7});
-    EXPECT_TRUE(again.isDeletionAllowed(7));
+    again.allowDeletions({7}, 1000, 2000);
+    EXPECT_TRUE(again.isDeletionAllowed(7, 1000));
     EXPECT_TRUE(again.unfinished().empty());
   }
 }
@@ -325,16 +325,46 @@ TEST_F(SyncStoreTest, whatIsBeingMadeIsKnownUntilItIsFinished) {
 TEST_F(SyncStoreTest, deletionsThatWereAskedForAreNotHeld) {
   store.enqueue(1, true, false);
   store.enqueue(2, true, false);
-  store.allowDeletions({2, 3});
-  EXPECT_EQ(store.countDeletions(), 1U);
-  store.holdDeletions();
+  store.allowDeletions({2, 3}, 1000, 2000);
+  EXPECT_EQ(store.countDeletions(1000), 1U);
+  store.holdDeletions(1000);
   EXPECT_EQ(store.countHeld(), 1U);
   EXPECT_EQ(due(), Items{2});
   store.forgetAllowedDeletion(2);
-  EXPECT_FALSE(store.isDeletionAllowed(2));
-  EXPECT_TRUE(store.isDeletionAllowed(3));
+  EXPECT_FALSE(store.isDeletionAllowed(2, 1000));
+  EXPECT_TRUE(store.isDeletionAllowed(3, 1000));
   store.unbindAll();
-  EXPECT_FALSE(store.isDeletionAllowed(3)) << "numbers mean other items now";
+  EXPECT_FALSE(store.isDeletionAllowed(3, 1000)) << "numbers mean other items now";
+}
+
+TEST_F(SyncStoreTest, theWordForADeletionEndsWithItsTime) {
+  store.enqueue(1, true, false);
+  store.allowDeletions({1, 2}, 1000, 2000);
+  EXPECT_TRUE(store.isDeletionAllowed(1, 1999));
+  EXPECT_FALSE(store.isDeletionAllowed(1, 2000));
+  EXPECT_FALSE(store.isDeletionAllowed(1, -10'000'000)) << "of another year";
+  EXPECT_EQ(store.countDeletions(1999), 0U);
+  EXPECT_EQ(store.countDeletions(2000), 1U);
+  store.allowDeletions({2}, 1500, 2500);
+  EXPECT_TRUE(store.isDeletionAllowed(2, 2400)) << "it was said again";
+  SyncStore again(path);
+  EXPECT_TRUE(again.isDeletionAllowed(2, 2400));
+  EXPECT_FALSE(again.isDeletionAllowed(2, 2500)) << "over a restart, too";
+  store.holdDeletions(2000);
+  EXPECT_EQ(store.countHeld(), 1U);
+}
+
+TEST_F(SyncStoreTest, theWordForADeletionThatWasDoneInTimeStays) {
+  store.enqueue(1, true, false);
+  store.allowDeletions({1}, 1000, 2000);
+  store.keepAllowedDeletion(1);
+  store.keepAllowedDeletion(2);
+  store.allowDeletions({1, 3}, 5000, 6000);
+  EXPECT_TRUE(store.isDeletionAllowed(1, 9000));
+  EXPECT_FALSE(store.isDeletionAllowed(2, 1000)) << "nobody asked for that";
+  EXPECT_EQ(store.countDeletions(9000), 0U);
+  store.holdDeletions(9000);
+  EXPECT_EQ(store.countHeld(), 0U);
 }
 
 TEST_F(SyncStoreTest, onlyRecordsWithATagAreInTheCloud) {

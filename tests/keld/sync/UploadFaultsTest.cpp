@@ -105,6 +105,115 @@ TEST_F(UploadFaults, anEditAfterALostReplyIsNoConflict) {
   }
 }
 
+// Carries out the next save and loses its reply, and does something on the device meanwhile.
+class LostSave : public FaultyDrive {
+ protected:
+  void during(const std::function<void()> &save, const std::function<void()> &meanwhile) {
+    Fault lost;
+    lost.dropsReply = true;
+    lost.delay = std::chrono::milliseconds(300);
+    const int calls = cloud->count(Call::modifyRecords);
+    cloud->onNextCall(Call::modifyRecords, lost);
+    save();
+    ASSERT_TRUE(eventually([&] { return cloud->count(Call::modifyRecords) > calls; }));
+    meanwhile();
+  }
+  // For good: also after the device has followed the cloud once more.
+  void expectOnBoth(std::vector<std::string> names) {
+    EXPECT_TRUE(eventually([&] { return hand.paths() == names; })) << testing::PrintToString(hand.paths());
+    hand.put("zzz after", "after");
+    ASSERT_TRUE(device.knowsSoon("zzz after"));
+    EXPECT_FALSE(device.waitForUploads());
+    names.emplace_back("zzz after");
+    EXPECT_EQ(hand.paths(), names);
+    EXPECT_EQ(device.names(), names);
+  }
+};
+
+TEST_F(LostSave, ofADocumentThatIsDeletedMeanwhileLeavesNothing) {
+  during([&] { device.keld.write("a", "contents"); }, [&] { device.keld.remove("a"); });
+  expectOnBoth({});
+}
+
+TEST_F(LostSave, ofATemporaryFileThatIsRenamedOverADocumentLeavesTheDocument) {
+  sent("a", "contents");
+  during([&] { device.keld.write("saving", "the next version"); },
+         [&] { device.keld.rename("saving", "a"); });
+  expectOnBoth({"a"});
+  EXPECT_EQ(device.read("a"), "the next version");
+  EXPECT_TRUE(eventually([&] { return hand.contents("a") == "the next version"; }));
+}
+
+TEST_F(LostSave, ofAFolderThatIsDeletedMeanwhileLeavesNothing) {
+  during([&] { device.keld.folder("f"); }, [&] { device.keld.remove("f"); });
+  expectOnBoth({});
+}
+
+TEST_F(LostSave, ofAnEditOfADocumentThatIsDeletedMeanwhileLeavesNothing) {
+  sent("a", "contents");
+  during([&] { device.keld.write("a", "other contents"); }, [&] { device.keld.remove("a"); });
+  expectOnBoth({});
+}
+
+TEST_F(LostSave, ofARenamedDocumentThatIsDeletedMeanwhileLeavesNothing) {
+  sent("a", "contents");
+  during([&] { device.keld.rename("a", "b"); }, [&] { device.keld.remove("b"); });
+  expectOnBoth({});
+}
+
+TEST_F(LostSave, ofADocumentInAFolderThatIsDeletedMeanwhileLeavesNothing) {
+  device.keld.folder("f");
+  sent("f/old", "contents");
+  during([&] { device.keld.write("f/new", "other contents"); }, [&] { device.keld.remove("f"); });
+  expectOnBoth({});
+}
+
+TEST_F(LostSave, ofADocumentThatBecomesExcludedMeanwhileLeavesItHere) {
+  during([&] { device.keld.write("a", "contents"); }, [&] { device.keld.rename("a", "a.nosync"); });
+  EXPECT_TRUE(leavesCloudSoon("a"));
+  EXPECT_EQ(device.read("a.nosync"), "contents");
+}
+
+TEST_F(LostSave, ofADocumentThatIsDeletedBeforeARestartLeavesNothing) {
+  during([&] { device.keld.write("a", "contents"); },
+         [&] {
+           ASSERT_TRUE(isInCloudSoon("a"));
+           device.keld.stop();
+           device.keld.remove("a");
+         });
+  device.keld.start();
+  device.keld.waitForFirstScan();
+  expectOnBoth({});
+}
+
+TEST_F(LostSave, thatNobodyTellsOfIsNotDeletedOverAnotherDevicesChange) {
+  during([&] { device.keld.write("a", "contents"); },
+         [&] {
+           cloud->onEveryCall(Call::fetchZoneChanges, failing(CKErrorCode::serviceUnavailable));
+           device.keld.remove("a");
+           ASSERT_TRUE(isInCloudSoon("a"));
+           hand.put("a", "written by anna");
+         });
+  const int calls = cloud->count(Call::modifyRecords);
+  EXPECT_TRUE(eventually([&] { return cloud->count(Call::modifyRecords) > calls; }));
+  cloud->onEveryCall(Call::fetchZoneChanges, {});
+  EXPECT_TRUE(device.knowsSoon("a"));
+  expectOnBoth({"a"});
+  EXPECT_EQ(device.contents("a"), "written by anna");
+}
+
+TEST_F(LostSave, ofADocumentThatAnotherDeviceChangesBeforeTheDeletionKeepsThatChange) {
+  during([&] { device.keld.write("a", "contents"); },
+         [&] {
+           device.keld.remove("a");
+           ASSERT_TRUE(isInCloudSoon("a"));
+           hand.put("a", "written by anna");
+         });
+  EXPECT_TRUE(device.knowsSoon("a"));
+  expectOnBoth({"a"});
+  EXPECT_EQ(device.contents("a"), "written by anna");
+}
+
 TEST_F(UploadFaults, aLostReplyOfADeletionIsNoFailure) {
   sent("a", "contents");
   Fault lost;
