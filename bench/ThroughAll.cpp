@@ -143,11 +143,13 @@ void note(const std::string &file, const char *attribute, const std::string &val
 // Every action of a person on a row of documents, one kind after the other.
 class Each {
  public:
-  Each(Bench &bench, int count) : bench_(bench), identifiers_(static_cast<std::size_t>(count)) {}
+  Each(Bench &bench, bool rests, int count)
+      : bench_(bench), rests_(rests), identifiers_(static_cast<std::size_t>(count)) {}
 
   void run() {
     prepare();
     creating();
+    calls();
     placing();
     noting();
     trashing();
@@ -156,6 +158,38 @@ class Each {
  private:
   using Plain = std::function<void(const std::string &number)>;
   using Fill = std::function<void(FPDActionRequest &request, const std::string &number)>;
+
+  // What an action is made of, beside a system call without any work.
+  void measureCall(const std::string &what, const std::function<void()> &call) {
+    Times times;
+    for (std::size_t i = 0; i < identifiers_.size(); ++i) {
+      if (rests_) bench_.settle();
+      times.plain.push_back(microseconds([] { getppid(); }));
+      times.through.push_back(microseconds(call));
+    }
+    print(what, times);
+  }
+
+  void calls() {
+    RunningDrive &drive = bench_.drive();
+    const std::string &identifier = identifiers_.front();
+    const auto checked = [](const auto &, const NSError &error) { check(!error, error.description()); };
+    NSURL url;
+    drive.keld().getURLForItemIdentifier(identifier,
+                                         [&](const NSURL &found, const NSError &) { url = found; });
+    check(!url.path().empty(), "keld doesn't know what was imported");
+    measureCall("empty call, fileproviderd", [&] { drive.emptyCall(); });
+    measureCall("empty call, keld", [&] { drive.emptyKeldCall(); });
+    measureCall("keld: where an item is", [&] { drive.keld().getURLForItemIdentifier(identifier, checked); });
+    measureCall("keld: what is known of it", [&] { drive.keld().getQueryItemForURL(url, false, checked); });
+    measureCall("keld: a look at it", [&] { drive.keld().getQueryItemForURL(url, true, checked); });
+    int changes = 0;
+    measureCall("keld: of what changed", [&] {
+      note(url.path(), "user.xdg.tags", std::to_string(++changes));
+      drive.keld().getQueryItemForURL(url, true, checked);
+    });
+    measureCall("the item, through all", [&] { drive.itemForIdentifier(identifier); });
+  }
 
   void prepare() {
     for (const char *name : {"source", "in", "out", "trash"}) fs::create_directory(bench_.plain(name));
@@ -175,6 +209,7 @@ class Each {
     Times times;
     for (std::size_t i = 0; i < identifiers_.size(); ++i) {
       const std::string number = std::to_string(i);
+      if (rests_) bench_.settle();
       FPDActionRequest request;
       request.kind = kind;
       request.identifier = identifiers_[i];
@@ -247,6 +282,7 @@ class Each {
   }
 
   Bench &bench_;
+  const bool rests_;  // until the cloud has the action before
   std::vector<std::string> identifiers_;
   std::string in_, out_;
 };
@@ -319,8 +355,8 @@ int run(const std::vector<std::string> &words) {
     std::printf("%-26s %9s %9s %10s %10s %10s %8s\n", "us", "plain", "99%", "through", "99%", "added",
                 "ratio");
   }
-  if (command == "each")
-    Each(bench, std::atoi(words[3].c_str())).run();
+  if (command == "each" || command == "row")
+    Each(bench, command == "each", std::atoi(words[3].c_str())).run();
   else if (command == "import")
     importFolder(bench, std::atoi(words[3].c_str()));
   else if (command == "move")
