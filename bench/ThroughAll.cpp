@@ -1,21 +1,23 @@
 // What a person's actions cost through client, fileproviderd, extension and keld, beside the system calls
 // that do the same to files on the same disk: what bench/bench_through_all is made of.
 //
-//   bench_through_all_calls HOME FOLDER each COUNT     every kind of action, COUNT times; times in
-//   microseconds bench_through_all_calls HOME FOLDER import COUNT   a folder of COUNT small files, beside cp
-//   -r bench_through_all_calls HOME FOLDER move NAME…     folders of the drive to another folder and back
+// bench_through_all_calls HOME FOLDER each COUNT: every kind of action, COUNT times, each when the cloud has
+// the one before.
+//
+// bench_through_all_calls HOME FOLDER row COUNT: the same without a pause.
+//
+// bench_through_all_calls HOME FOLDER import COUNT: a folder of COUNT small files, beside cp -r.
+//
+// bench_through_all_calls HOME FOLDER move NAME…: folders of the drive to another folder and back.
 //
 // The plain calls work in FOLDER, which is made if it isn't there. Plain call and action take turns.
 
-#include <algorithm>
-#include <chrono>
 #include <cstdio>
 #include <cstdlib>
 #include <fcntl.h>
 #include <filesystem>
 #include <fstream>
 #include <functional>
-#include <future>
 #include <string>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -23,103 +25,18 @@
 #include <unistd.h>
 #include <vector>
 
-#include "bench/RunningDrive.h"
+#include "bench/Acting.h"
 #include "platform/fileprovider/FPTags.h"
 #include "platform/foundation/Paths.h"
-#include "platform/xpc/NSXPCProxyCreating.h"
 
 namespace droxa::bench {
 namespace {
 
 namespace fs = std::filesystem;
-using Clock = std::chrono::steady_clock;
 using Kind = FPDActionRequest::Kind;
-using Item = std::shared_ptr<const NSFileProviderItem>;
-constexpr std::chrono::seconds kLongest{600};
+using Item = Acting::Item;
 constexpr int kRepetitions = 5;
 constexpr int kMoves = 100;
-
-double microseconds(const std::function<void()> &work) {
-  const Clock::time_point begin = Clock::now();
-  work();
-  return std::chrono::duration<double, std::micro>(Clock::now() - begin).count();
-}
-
-void check(bool ok, const std::string &what) {
-  if (!ok) fail(what);
-}
-
-// Of times that were taken by turns.
-struct Times {
-  std::vector<double> plain, through;
-};
-
-double share(std::vector<double> times, double part) {
-  std::sort(times.begin(), times.end());
-  return times[static_cast<std::size_t>(part * static_cast<double>(times.size() - 1))];
-}
-
-void print(const std::string &what, const Times &times) {
-  const double plain = share(times.plain, 0.5), through = share(times.through, 0.5);
-  std::printf("%-26s %9.1f %9.1f %10.1f %10.1f %10.1f %8.1f\n", what.c_str(), plain, share(times.plain, 0.99),
-              through, share(times.through, 0.99), through - plain, through / plain);
-  std::fflush(stdout);
-}
-
-// The running drive, and a folder beside it for the plain calls. Thread contract: one thread.
-class Bench {
- public:
-  Bench(const std::string &home, std::string folder) : drive_(home), plain_(std::move(folder)) {
-    fs::create_directories(plain_);
-  }
-
-  RunningDrive &drive() { return drive_; }
-  std::string plain(const std::string &name) const { return plain_ + "/" + name; }
-
-  Item act(const FPDActionRequest &request) {
-    struct End {
-      Item item;
-      NSError error;
-    };
-    std::shared_ptr<FPDAction> action;
-    drive_.host().performAction(request, [&](const auto &begun, const NSError &error) {
-      check(begun != nullptr, error.description());
-      action = begun;
-    });
-    const auto end = std::make_shared<std::promise<End>>();
-    std::future<End> future = end->get_future();
-    NSXPCProxyWithErrorHandler<FPDAction>(action, [end](const NSError &error) {
-      end->set_value({nullptr, error});
-    })->waitWithReply([end](const Item &item, const NSError &error) {
-      end->set_value({item, error});
-    });
-    check(future.wait_for(kLongest) == std::future_status::ready, "an action didn't end");
-    const End got = future.get();
-    check(!got.error, FPDActionName(request.kind) + ": " + got.error.description());
-    check(got.item || request.kind == Kind::deleteItem, FPDActionName(request.kind) + ": no item came back");
-    return got.item;
-  }
-
-  std::string makeFolder(const std::string &name) {
-    FPDActionRequest request;
-    request.kind = Kind::createDirectory;
-    request.parentIdentifier = root();
-    request.name = name;
-    return act(request)->itemIdentifier();
-  }
-
-  // What was done before is in the cloud, so that one measurement doesn't pay for another.
-  void settle() {
-    drive_.keld().waitForUploadAtURL(NSURL(),
-                                     [](const NSError &error) { check(!error, error.description()); });
-  }
-
-  static std::string root() { return NSFileProviderRootContainerItemIdentifier; }
-
- private:
-  RunningDrive drive_;
-  const std::string plain_;
-};
 
 // A few bytes as a copy makes them.
 void copyFile(const std::string &source, const std::string &target) {
@@ -143,11 +60,13 @@ void note(const std::string &file, const char *attribute, const std::string &val
 // Every action of a person on a row of documents, one kind after the other.
 class Each {
  public:
-  Each(Bench &bench, int count) : bench_(bench), identifiers_(static_cast<std::size_t>(count)) {}
+  Each(Acting &bench, bool rests, int count)
+      : bench_(bench), rests_(rests), identifiers_(static_cast<std::size_t>(count)) {}
 
   void run() {
     prepare();
     creating();
+    calls();
     placing();
     noting();
     trashing();
@@ -156,6 +75,38 @@ class Each {
  private:
   using Plain = std::function<void(const std::string &number)>;
   using Fill = std::function<void(FPDActionRequest &request, const std::string &number)>;
+
+  // What an action is made of, beside a system call without any work.
+  void measureCall(const std::string &what, const std::function<void()> &call) {
+    Times times;
+    for (std::size_t i = 0; i < identifiers_.size(); ++i) {
+      if (rests_) bench_.settle();
+      times.plain.push_back(microseconds([] { getppid(); }));
+      times.through.push_back(microseconds(call));
+    }
+    print(what, times);
+  }
+
+  void calls() {
+    RunningDrive &drive = bench_.drive();
+    const std::string &identifier = identifiers_.front();
+    const auto checked = [](const auto &, const NSError &error) { check(!error, error.description()); };
+    NSURL url;
+    drive.keld().getURLForItemIdentifier(identifier,
+                                         [&](const NSURL &found, const NSError &) { url = found; });
+    check(!url.path().empty(), "keld doesn't know what was imported");
+    measureCall("empty call, fileproviderd", [&] { drive.emptyCall(); });
+    measureCall("empty call, keld", [&] { drive.emptyKeldCall(); });
+    measureCall("keld: where an item is", [&] { drive.keld().getURLForItemIdentifier(identifier, checked); });
+    measureCall("keld: what is known of it", [&] { drive.keld().getQueryItemForURL(url, false, checked); });
+    measureCall("keld: a look at it", [&] { drive.keld().getQueryItemForURL(url, true, checked); });
+    int changes = 0;
+    measureCall("keld: of what changed", [&] {
+      note(url.path(), "user.xdg.tags", std::to_string(++changes));
+      drive.keld().getQueryItemForURL(url, true, checked);
+    });
+    measureCall("the item, through all", [&] { drive.itemForIdentifier(identifier); });
+  }
 
   void prepare() {
     for (const char *name : {"source", "in", "out", "trash"}) fs::create_directory(bench_.plain(name));
@@ -175,6 +126,7 @@ class Each {
     Times times;
     for (std::size_t i = 0; i < identifiers_.size(); ++i) {
       const std::string number = std::to_string(i);
+      if (rests_) bench_.settle();
       FPDActionRequest request;
       request.kind = kind;
       request.identifier = identifiers_[i];
@@ -246,7 +198,8 @@ class Each {
         [&](const std::string &number) { check(unlink(out(number).c_str()) == 0, "unlink"); }, nothing);
   }
 
-  Bench &bench_;
+  Acting &bench_;
+  const bool rests_;  // until the cloud has the action before
   std::vector<std::string> identifiers_;
   std::string in_, out_;
 };
@@ -265,7 +218,7 @@ void runCommand(const std::vector<std::string> &words) {
 }
 
 // The fastest of each: a folder that is imported again and again, under names of its own.
-void importFolder(Bench &bench, int count) {
+void importFolder(Acting &bench, int count) {
   Times times;
   for (int round = 0; round < kRepetitions; ++round) {
     const std::string name = "imported " + std::to_string(round);
@@ -277,7 +230,7 @@ void importFolder(Bench &bench, int count) {
     FPDActionRequest request;
     request.kind = Kind::importDocument;
     request.url = NSURL::fileURLWithPath(source);
-    request.parentIdentifier = Bench::root();
+    request.parentIdentifier = Acting::root();
     times.through.push_back(microseconds([&] { bench.act(request); }));
   }
   const double plain = share(times.plain, 0), through = share(times.through, 0);
@@ -287,7 +240,7 @@ void importFolder(Bench &bench, int count) {
 
 // To another folder and back, the folders by turns. The plain ones are beside the drive, under the same
 // names.
-void moveFolders(Bench &bench, const std::vector<std::string> &names) {
+void moveFolders(Acting &bench, const std::vector<std::string> &names) {
   const std::string to = bench.makeFolder("moved");
   fs::create_directory(bench.plain("moved"));
   std::vector<Times> times(names.size());
@@ -301,7 +254,7 @@ void moveFolders(Bench &bench, const std::vector<std::string> &names) {
       FPDActionRequest request;
       request.kind = Kind::reparent;
       request.identifier = identifiers[i];
-      request.parentIdentifier = isThere ? Bench::root() : to;
+      request.parentIdentifier = isThere ? Acting::root() : to;
       times[i].through.push_back(microseconds([&] { bench.act(request); }));
     }
   }
@@ -313,14 +266,11 @@ void moveFolders(Bench &bench, const std::vector<std::string> &names) {
 
 int run(const std::vector<std::string> &words) {
   if (words.size() < 4) fail("HOME, FOLDER, a command and its argument are needed");
-  Bench bench(DroxaHome(words[0]).root(), words[1]);
+  Acting bench(DroxaHome(words[0]).root(), words[1]);
   const std::string &command = words[2];
-  if (command != "import") {
-    std::printf("%-26s %9s %9s %10s %10s %10s %8s\n", "us", "plain", "99%", "through", "99%", "added",
-                "ratio");
-  }
-  if (command == "each")
-    Each(bench, std::atoi(words[3].c_str())).run();
+  if (command != "import") printHead();
+  if (command == "each" || command == "row")
+    Each(bench, command == "each", std::atoi(words[3].c_str())).run();
   else if (command == "import")
     importFolder(bench, std::atoi(words[3].c_str()));
   else if (command == "move")

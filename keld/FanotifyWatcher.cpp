@@ -25,6 +25,8 @@ namespace {
 
 constexpr std::uint64_t kEvents = FAN_CREATE | FAN_DELETE | FAN_MOVED_FROM | FAN_MOVED_TO | FAN_MODIFY |
                                   FAN_ATTRIB | FAN_CLOSE_WRITE | FAN_ONDIR;
+// What is frequent, and is told even of files that nobody here asks about: of every write to a database, too.
+constexpr std::uint64_t kIgnoredElsewhere = FAN_MODIFY | FAN_CLOSE_WRITE | FAN_EVENT_ON_CHILD;
 constexpr std::size_t kMostKnownFolders = 8192;
 
 // Thread contract: the watcher's thread reads; nothing else touches the members after start.
@@ -56,6 +58,8 @@ class FanotifyWatcher final : public ReplicaWatcher {
   void handle(const fanotify_event_metadata &event, const char *bytes);  // `bytes`: the whole event
   std::optional<std::uint64_t> folderInode(const file_handle &handle);   // nullopt: not of the replica
   std::optional<std::uint64_t> resolve(const file_handle &handle);
+  void ignoreFilesIn(const std::string &folder);
+  void forgetFolders();
 
   const OwnedDescriptor events_, replica_, stop_;
   const std::string realPath_;
@@ -89,7 +93,7 @@ void FanotifyWatcher::handle(const fanotify_event_metadata &event, const char *b
   if (event.mask & FAN_Q_OVERFLOW)
     return sink_.replicaChangesLost("the queue of file-system events ran over");
   // A folder that moved may have come into the replica, or left it, with all that is below.
-  if ((event.mask & FAN_ONDIR) && (event.mask & (FAN_MOVED_FROM | FAN_MOVED_TO))) known_.clear();
+  if ((event.mask & FAN_ONDIR) && (event.mask & (FAN_MOVED_FROM | FAN_MOVED_TO))) forgetFolders();
   const char *at = bytes + event.metadata_len;
   const char *const end = bytes + event.event_len;
   while (at + sizeof(fanotify_event_info_header) <= end) {
@@ -134,7 +138,22 @@ std::optional<std::uint64_t> FanotifyWatcher::resolve(const file_handle &handle)
   const std::string_view told(path, static_cast<std::size_t>(length));
   const bool isInside = told.substr(0, realPath_.size()) == realPath_ &&
                         (told.size() == realPath_.size() || told[realPath_.size()] == '/');
-  return isInside ? std::optional<std::uint64_t>(status.st_ino) : std::nullopt;
+  if (isInside) return status.st_ino;
+  ignoreFilesIn(link);
+  return std::nullopt;
+}
+
+// Each event wakes this thread, also those of keld's own writes. Where the kernel doesn't know such marks,
+// all events go on coming. The kernel drops a mark with its folder when it is short of memory.
+void FanotifyWatcher::ignoreFilesIn(const std::string &folder) {
+  (void)::fanotify_mark(events_.get(), FAN_MARK_ADD | FAN_MARK_IGNORE_SURV | FAN_MARK_EVICTABLE,
+                        kIgnoredElsewhere, AT_FDCWD, folder.c_str());
+}
+
+// Before the move is passed on: whoever looks at the folder then misses nothing that comes later.
+void FanotifyWatcher::forgetFolders() {
+  known_.clear();
+  (void)::fanotify_mark(events_.get(), FAN_MARK_FLUSH, 0, AT_FDCWD, nullptr);
 }
 
 }  // namespace

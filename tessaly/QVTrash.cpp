@@ -110,7 +110,8 @@ int writeNote(int file, const std::string &text) {
   return ::fsync(file) == 0 ? 0 : errno;
 }
 
-// EEXIST when the name is taken by another note, or another item.
+// EEXIST when the name is taken by another note, or another item. The note is durable before the item comes;
+// the move itself is one step, which a power failure leaves done or not, like any other move.
 int moveAs(const Move &move, const std::string &name, const std::string &note) {
   const std::string noteName = name + QVTrashInfoSuffix;
   const Descriptor file(
@@ -161,13 +162,6 @@ NSError moveFailure(int error, const NSURL &url) {
   return QVFileError(error, url.path(), "can't be moved to the trash");
 }
 
-void makeMoveDurable(const Move &move) {
-  ::fsync(move.files);
-  const Descriptor from(::open(move.source.URLByDeletingLastPathComponent().path().c_str(),
-                               O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  if (from) ::fsync(from.get());
-}
-
 NSError moveUnderFreeName(const Move &move, const NSURL &filesURL, NSURL *resultingURL) {
   const std::string note = QVEncodeTrashInfo(noteOf(move.source));
   lockShared(move.info);
@@ -176,7 +170,6 @@ NSError moveUnderFreeName(const Move &move, const NSURL &filesURL, NSURL *result
     const int error = moveAs(move, name, note);
     if (error == EEXIST) continue;
     if (error != 0) return moveFailure(error, move.source);
-    makeMoveDurable(move);
     *resultingURL = filesURL.URLByAppendingPathComponent(name);
     return NSError();
   }

@@ -1,5 +1,9 @@
 // Each way of noticing changes notices the same ones.
 
+#include <fcntl.h>
+#include <unistd.h>
+
+#include "keld/FolderReading.h"
 #include "tests/keld/KeldFixture.h"
 #include "tests/support/LogLines.h"
 
@@ -54,6 +58,24 @@ TEST_P(Watchers, noticeAFolderThatComesWithItsContents) {
   EXPECT_TRUE(eventually([&] { return drive.knows("inside/deep/file"); }));
   drive.write("inside/deep/second");
   EXPECT_TRUE(eventually([&] { return drive.knows("inside/deep/second"); }));
+}
+
+TEST_P(Watchers, noticeWritesInAFolderThatWasWrittenInBeforeItCame) {
+  drive.waitForFirstScan();
+  drive.home().makeFolder("outside");
+  const std::string path = drive.home().root() + "/outside/file";
+  const OwnedDescriptor file(::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600));
+  for (int i = 0; i < 100; ++i) {
+    ASSERT_EQ(::write(file.get(), "x", 1), 1);
+    // So that the watcher has met the folder as one that is none of its own.
+    drive.write("witness " + std::to_string(i));
+  }
+  ASSERT_TRUE(eventually([&] { return drive.knows("witness 99"); }));
+  drive.rename(drive.home().root() + "/outside", "inside");
+  ASSERT_TRUE(eventually([&] { return drive.knows("inside/file"); }));
+  // Without an end of the writing, which is told by itself.
+  ASSERT_EQ(::write(file.get(), "y", 1), 1);
+  EXPECT_TRUE(eventually([&] { return drive.record("inside/file")->facts.size == 101; }));
 }
 
 TEST_P(Watchers, keepUpWithABurst) {
