@@ -23,38 +23,50 @@ class CloudShareProperties : public SharingTest<World> {
   };
 
   int roll(int below) { return static_cast<int>(random() % static_cast<std::uint64_t>(below)); }
-  std::string anyRecord() { return "r" + std::to_string(roll(kRecords)); }
-  std::string anyParent() { return roll(4) == 0 ? std::string() : anyRecord(); }
+  static std::string record(int number) { return "r" + std::to_string(number); }
+  std::string anyRecord() { return record(roll(kRecords)); }
+  // Mostly one with a lower number, so that there are trees; sometimes any, so that there are circles.
+  std::string anyParent(const std::string &name) {
+    const int number = std::stoi(name.substr(1));
+    const int way = roll(12);
+    if (way == 0) return {};
+    if (way == 1) return anyRecord();
+    return number == 0 ? std::string() : record(roll(number));
+  }
+  // Mostly one that few lie below.
+  std::string anyLowRecord() {
+    return roll(4) == 0 ? anyRecord() : record(kRecords - 1 - roll(kRecords / 2));
+  }
   Follower &anyFollower() { return followers[static_cast<std::size_t>(roll(2))]; }
 
   static CKShareMetadataReply accept(Follower &who, const NSURL &url) {
     return who.own->acceptShare(url, patiently());
   }
   static CKRecord unconditional(const std::string &name, const std::string &parent) {
-    CKRecord record = item(name, "saved " + name);
-    record.fields[CKRecordParentKey] = parent;
-    return record;
+    CKRecord saved = item(name, "saved " + name);
+    saved.fields[CKRecordParentKey] = parent;
+    return saved;
   }
 
   void ownerSaves() {
     const std::string name = anyRecord();
-    const std::string parent = anyParent();
+    const std::string parent = anyParent(name);
     save(*this->alice, unconditional(name, parent), CKRecordSavePolicy::allKeys);
     model.parents[name] = parent;
   }
   void ownerDeletes() {
-    const std::string name = anyRecord();
+    const std::string name = anyLowRecord();
     EXPECT_OK(removeError(*this->alice, item(name).recordID));
     model.remove(name);
   }
   void ownerShares() {
-    const std::string root = anyRecord();
+    const std::string root = record(roll(kRecords / 2));
     if (!model.parents.contains(root)) return;
     CKShare share = shareOf(root);
     ShareModel::Parts parts;
     for (const Follower &who : followers) {
-      if (roll(3) == 0) continue;
-      const auto permission = static_cast<Permission>(roll(3));
+      if (roll(5) == 0) continue;
+      const auto permission = roll(3) == 0 ? static_cast<Permission>(roll(3)) : Permission::readWrite;
       share.participants.push_back(named(who.account, permission));
       const auto before = model.shares.find(root);
       const bool had = before != model.shares.end() && before->second.contains(who.account) &&
@@ -93,47 +105,41 @@ class CloudShareProperties : public SharingTest<World> {
   void followerSaves() {
     Follower &who = anyFollower();
     const std::string name = anyRecord();
-    const std::string parent = anyParent();
+    const std::string parent = anyParent(name);
     const bool may = model.maySave(who.account, name, parent);
     const NSError error =
         saveError(*who.shared, atAlices(unconditional(name, parent)), CKRecordSavePolicy::allKeys);
     EXPECT_EQ(!error, may) << who.account << " saves " << name << " below " << parent << ": "
                            << error.description();
-    if (!error) model.parents[name] = parent;
+    if (error) return;
+    if (model.parents.contains(name) && model.parents[name] != parent) ++moves;
+    if (!model.parents.contains(name)) ++creations;
+    model.parents[name] = parent;
   }
   void followerDeletes() {
     Follower &who = anyFollower();
-    const std::string name = anyRecord();
+    const std::string name = anyLowRecord();
     const bool isSeen = model.seenBy(who.account).contains(name);
     const bool may = model.mayDelete(who.account, name);
     const NSError error = removeError(*who.shared, idAtAlices(name));
     const bool isNothing = !isSeen && !model.seenBy(who.account).empty();
     EXPECT_EQ(!error, may || isNothing) << who.account << " deletes " << name;
-    if (may && !error) model.remove(name);
+    if (may && !error) {
+      model.remove(name);
+      ++deletions;
+    }
   }
 
   void step() {
-    switch (roll(12)) {
-      case 0:
-        return ownerDeletes();
-      case 1:
-      case 2:
-        return ownerShares();
-      case 3:
-        return ownerWithdraws();
-      case 4:
-      case 5:
-        return followerAccepts();
-      case 6:
-        return followerLeaves();
-      case 7:
-      case 8:
-        return followerSaves();
-      case 9:
-        return followerDeletes();
-      default:
-        return ownerSaves();
-    }
+    const int kind = roll(40);
+    if (kind < 3) return ownerDeletes();
+    if (kind < 8) return ownerShares();
+    if (kind < 9) return ownerWithdraws();
+    if (kind < 14) return followerAccepts();
+    if (kind < 15) return followerLeaves();
+    if (kind < 25) return followerSaves();
+    if (kind < 28) return followerDeletes();
+    ownerSaves();
   }
 
   void follow(Follower &who) {
@@ -141,10 +147,10 @@ class CloudShareProperties : public SharingTest<World> {
     while (isMore) {
       const CKZoneChanges page = changesAtAlices(*who.shared, who.token, 3);
       ASSERT_FALSE(page.error) << page.error.description();
-      for (const CKRecord &record : page.changedRecords) who.known[record.recordID.recordName] = record;
-      for (const CKDeletedRecord &record : page.deletedRecords) {
-        EXPECT_EQ(who.known.erase(record.recordID.recordName), 1U)
-            << who.account << " never saw " << record.recordID.recordName;
+      for (const CKRecord &changed : page.changedRecords) who.known[changed.recordID.recordName] = changed;
+      for (const CKDeletedRecord &gone : page.deletedRecords) {
+        EXPECT_EQ(who.known.erase(gone.recordID.recordName), 1U)
+            << who.account << " never saw " << gone.recordID.recordName;
       }
       who.token = page.token;
       isMore = page.moreComing;
@@ -161,10 +167,10 @@ class CloudShareProperties : public SharingTest<World> {
     EXPECT_EQ(changedNames(changesAtAlices(*who.shared)), seen);
     follow(who);
     NameSet known;
-    for (const auto &record : who.known) known.insert(record.first);
+    for (const auto &entry : who.known) known.insert(entry.first);
     EXPECT_EQ(known, seen);
     for (int i = 0; i < kRecords; ++i) {
-      const std::string name = "r" + std::to_string(i);
+      const std::string name = record(i);
       const CKRecordResult result = fetch(*who.shared, idAtAlices(name));
       EXPECT_EQ(!result.error, seen.contains(name)) << who.account << " and " << name;
       if (!result.error) {
@@ -175,16 +181,27 @@ class CloudShareProperties : public SharingTest<World> {
 
   void run(std::uint64_t seed) {
     random.seed(seed);
-    for (int i = 0; i < 80 && !this->HasFailure(); ++i) {
+    for (int i = 0; i < kRecords; ++i) {
+      const std::string name = record(i);
+      model.parents[name] = i == 0 ? std::string() : record(roll(i));
+      save(*this->alice, unconditional(name, model.parents[name]));
+    }
+    for (int i = 0; i < 200 && !this->HasFailure(); ++i) {
       step();
       for (Follower &who : followers) check(who);
       if (this->HasFailure()) ADD_FAILURE() << "step " << i << " of seed " << seed;
     }
+    // Otherwise the history was about nothing.
+    EXPECT_GT(creations + deletions, 0);
+    EXPECT_GT(moves, 0);
   }
 
   std::mt19937_64 random;
   ShareModel model;
   std::map<std::string, NSURL> urls;  // by the root
+  int creations = 0;                  // by those with whom something is shared
+  int moves = 0;
+  int deletions = 0;
   std::vector<Follower> followers{{"bob", this->bob, this->bobs, {}, {}},
                                   {"eve", this->eve, this->eves, {}, {}}};
 };
