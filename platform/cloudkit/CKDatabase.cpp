@@ -4,7 +4,8 @@
 
 namespace droxa {
 
-CKDatabase::CKDatabase(std::shared_ptr<CKCloud> cloud) : cloud_(std::move(cloud)) {}
+CKDatabase::CKDatabase(std::shared_ptr<CKCloud> cloud, CKDatabaseScope scope)
+    : cloud_(std::move(cloud)), scope_(scope) {}
 
 void CKDatabase::addOperation(const std::shared_ptr<CKOperation> &operation) {
   if (!operation || !operation->attach(cloud_)) {

@@ -24,7 +24,8 @@ enum class CKErrorCode : std::int64_t {
   serviceUnavailable = 6,    // transient: the cloud is there and can't answer now
   requestRateLimited = 7,    // transient: wait for the retry-after value
   notAuthenticated = 9,      // the account isn't signed in, or not any more
-  unknownItem = 11,          // no such record or asset
+  permissionFailure = 10,    // the account may not do that with what others share with it
+  unknownItem = 11,          // no such record, asset, share or account
   invalidArguments = 12,     // a name, a type or a value that a cloud never takes
   serverRecordChanged = 14,  // a conflict; CKErrorServerRecord() gives the record as the cloud has it
   assetFileNotFound = 16,  // the file to be uploaded isn't there; or a saved reference names unknown contents
@@ -35,8 +36,11 @@ enum class CKErrorCode : std::int64_t {
   zoneBusy = 23,            // transient: another writer holds it
   quotaExceeded = 25,
   zoneNotFound = 26,
-  limitExceeded = 27,      // too many records in a call, or a record that is too large: send less
-  assetNotAvailable = 35,  // the cloud should have these contents and can't give them intact
+  limitExceeded = 27,        // too many records in a call, or a record that is too large: send less
+  tooManyParticipants = 29,  // CKMostShareParticipants
+  alreadyShared = 30,        // another share has that root
+  participantMayNeedVerification = 33,  // the share is for others; perhaps this person by another account
+  assetNotAvailable = 35,               // the cloud should have these contents and can't give them intact
 };
 
 // Makes an error of CKErrorDomain; `underlying` may be nil.

@@ -1,5 +1,7 @@
 #include "platform/cloudkit/CKRecord.h"
 
+#include "platform/cloudkit/CKShare.h"
+
 namespace droxa {
 namespace {
 
@@ -35,6 +37,11 @@ bool CKServerRecordIsOwnSave(const CKRecord &client, const CKRecord &server, con
   if (client.recordID != server.recordID || client.recordType != server.recordType ||
       server.modifiedByDevice != deviceName) {
     return false;
+  }
+  if (client.recordType == CKRecordTypeShare) {
+    const auto clientShare = CKShare::shareWithRecord(client);
+    const auto serverShare = CKShare::shareWithRecord(server);
+    return clientShare && serverShare && CKServerShareIsOwnSave(*clientShare, *serverShare);
   }
   for (const auto &[key, value] : client.fields) {
     const auto found = server.fields.find(key);
