@@ -6,8 +6,7 @@ namespace droxa {
 
 QVCClientPrivilegesDescriptor::QVCClientPrivilegesDescriptor(const NSXPCPeer &auditToken) {
   if (auditToken.processIdentifier == 0) return;
-  const ProcessEntitlements entitlements =
-      EntitlementsOfPeer(auditToken, EntitlementFiles::processFiles());
+  const ProcessEntitlements entitlements = EntitlementsOfPeer(auditToken, EntitlementFiles::processFiles());
   isSharingProxyEntitled_ = entitlements.has(QVSharingProxyEntitlement);
   isSharingPrivateInterfaceEntitled_ = entitlements.has(QVSharingPrivateInterfaceEntitlement);
   isFolderSharingProxyEntitled_ = entitlements.has(QVFolderSharingProxyEntitlement);

@@ -5,8 +5,7 @@
 namespace droxa {
 
 inline constexpr char QVSharingProxyEntitlement[] = "com.quorva.Tessaly.sharing-proxy";
-inline constexpr char QVSharingPrivateInterfaceEntitlement[] =
-    "com.quorva.Tessaly.sharing-private-interface";
+inline constexpr char QVSharingPrivateInterfaceEntitlement[] = "com.quorva.Tessaly.sharing-private-interface";
 inline constexpr char QVFolderSharingProxyEntitlement[] = "com.quorva.Tessaly.folder-sharing-proxy";
 
 // What a connected client may ask of the sharing operations. Its entitlements are read once, when this is

@@ -1,11 +1,11 @@
 #include "platform/entitlements/EntitlementFiles.h"
 
 #include <algorithm>
-#include <iterator>
 #include <cerrno>
 #include <cstring>
 #include <dirent.h>
 #include <fcntl.h>
+#include <iterator>
 #include <nlohmann/json.hpp>
 #include <sys/stat.h>
 #include <unistd.h>

@@ -114,8 +114,7 @@ NSError LookAt(const NSXPCPeer &peer, ProcessApplication *application) {
   const std::int32_t number = peer.processIdentifier;
   if (number <= 0 || peer.processDescriptor < 0)
     return UnknownProcess(number, EINVAL, "the kernel names no process");
-  const Opened process(
-      open(("/proc/" + std::to_string(number)).c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+  const Opened process(open(("/proc/" + std::to_string(number)).c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
   if (process.get() < 0) return UnknownProcess(number, errno, "it can't be looked at");
   // The folder is of one process for good; this one, if its descriptor still finds it alive now.
   if (!IsAlive(peer.processDescriptor)) return UnknownProcess(number, ESRCH, "it has ended");

@@ -46,8 +46,8 @@ class FPXPCAutomaticErrorProxy {
             Arguments &&...arguments) const {
     static_assert(std::is_base_of_v<Class, Protocol>);
     const auto answer = std::make_shared<Answer<Values...>>(reply, sanitizeErrors());
-    const auto remote =
-        connection_([answer, orError = orError_, name = name_, requestPid = requestPid_](const NSError &error) {
+    const auto remote = connection_(
+        [answer, orError = orError_, name = name_, requestPid = requestPid_](const NSError &error) {
           if (!answer->claim()) return;
           FPLogConnectionFailure(name, requestPid, error);
           if (orError) orError(error);

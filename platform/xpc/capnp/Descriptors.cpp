@@ -26,8 +26,10 @@ schema::Descriptor::Client exportDescriptor(int descriptor) {
 
 // The object that brings a descriptor is the sender's own, never a promise of one, so it is here at once.
 int receivedDescriptor(capnp::Capability::Client client) {
-  const auto hook = capnp::ClientHook::from(kj::mv(client));
-  KJ_IF_MAYBE (descriptor, hook->getFd()) { return fcntl(*descriptor, F_DUPFD_CLOEXEC, 0); }
+  auto hook = capnp::ClientHook::from(kj::mv(client));
+  KJ_IF_MAYBE (descriptor, hook->getFd()) {
+    return fcntl(*descriptor, F_DUPFD_CLOEXEC, 0);
+  }
   return -1;
 }
 
