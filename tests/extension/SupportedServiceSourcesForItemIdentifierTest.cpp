@@ -39,7 +39,7 @@ class SupportedServiceSources : public ExtensionTest {
 };
 
 TEST_F(SupportedServiceSources, anyOtherIdentifierHasTheShareOperationsAlone) {
-  for (const std::string identifier :
+  for (const std::string &identifier :
        {std::string(NSFileProviderRootContainerItemIdentifier),
         std::string(NSFileProviderWorkingSetContainerItemIdentifier), std::string("x7"), std::string()}) {
     EXPECT_EQ(names(identifier), Lines{kShareOperations}) << identifier;

@@ -1,8 +1,14 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
+#include <unistd.h>
 
+#include "fileproviderd/HostServices.h"
 #include "fileproviderd/Services.h"
+#include "platform/fileprovider/xpc/FileProviderInterfaces.h"
 #include "tests/fileproviderd/ScriptedExtension.h"
+#include "tests/support/Eventually.h"
+#include "tests/support/Once.h"
+#include "tests/xpc/ConnectedPair.h"
 
 namespace droxa::testing {
 namespace {
@@ -99,6 +105,39 @@ TEST_F(ServicesTest, aFailureIsToldAndCountsForNothing) {
 TEST_F(ServicesTest, anExtensionThatEndsInTheMiddleIsAskedOnceMore) {
   connecting->transportFailures = 1;
   EXPECT_TRUE(open(1).service);
+}
+
+// From the extension to the client, over the host's connection; the client is counted by its process.
+TEST_F(ServicesTest, aClientsDeathReleasesItsServicesOfTheExtension) {
+  const auto calls = std::make_shared<ExtensionCalls>(connecting);
+  const auto control = std::make_shared<ControlService>(calls, std::make_shared<FollowedContainers>(calls),
+                                                        std::make_shared<OpenListings>(), "/replica",
+                                                        [] { return FPDStatus(); });
+  const std::weak_ptr<FPDService> real = extension->services["s d1"];
+  {
+    ConnectedPair pair;
+    pair.serve<FPDControlProtocol>(FPDControlInterface(), control);
+    const auto remote = pair.client->remoteObjectProxyWithErrorHandler<FPDControlProtocol>(
+        [](const NSError &error) { ADD_FAILURE() << error.description(); });
+    std::vector<std::shared_ptr<FPDService>> kept;
+    for (std::size_t index = 0; index <= Services::kMostOfOneClient; ++index) {
+      Once<std::shared_ptr<FPDService>, NSError> answer("the service");
+      remote->listenerEndpointForServiceName("s", "d1", answer.completion());
+      ASSERT_TRUE(eventually([&answer] { return answer.calls() == 1; }));
+      if (index == Services::kMostOfOneClient) {
+        EXPECT_TRUE(answer.value<1>().is(NSPOSIXErrorDomain, EMFILE));
+        EXPECT_NE(answer.value<1>().description().find("process " + std::to_string(getpid()) + " holds"),
+                  std::string::npos);
+        continue;
+      }
+      ASSERT_TRUE(answer.value<0>()) << answer.value<1>().description();
+      EXPECT_GE(answer.value<0>()->endpoint().descriptor(), 0);
+      kept.push_back(answer.value<0>());
+    }
+    extension->services.clear();
+    EXPECT_FALSE(real.expired());
+  }
+  EXPECT_TRUE(eventually([&real] { return real.expired(); }));
 }
 
 }  // namespace

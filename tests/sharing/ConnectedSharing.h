@@ -71,23 +71,29 @@ class ConnectedSharing : public SharingTest {
     daemonListener->resume();
     QVDaemonConnection::setDefaultConnection(
         std::make_shared<QVDaemonConnectionOverXPC>(DroxaProcessHome().daemonSocket()));
-    listener = NSXPCListener::anonymousListener(&error);
-    EXPECT_TRUE(listener) << error.description();
-    listener->setDelegate(delegate);
-    listener->resume();
     entitleThisProcess(kAllEntitlements);
   }
   ~ConnectedSharing() override {
     if (client_) client_->invalidate();
-    listener->invalidate();
+    for (const auto &listener : listeners_) listener->invalidate();
     daemonListener->invalidate();
     QVDaemonConnection::setDefaultConnection(nullptr);
     daemonDelegate->endConnections();
   }
 
+  // Of a listener of its own, which ends with the first connection that it accepted.
+  NSXPCListenerEndpoint endpoint() {
+    NSError error;
+    const auto listener = NSXPCListener::anonymousListener(&error);
+    EXPECT_TRUE(listener) << error.description();
+    listener->setDelegate(delegate);
+    listener->resume();
+    listeners_.push_back(listener);
+    return listener->endpoint();
+  }
   // The test's own connection to the service.
   const std::shared_ptr<NSXPCConnection> &client() {
-    if (!client_) client_ = connect(listener->endpoint());
+    if (!client_) client_ = connect(endpoint());
     return client_;
   }
 
@@ -95,9 +101,9 @@ class ConnectedSharing : public SharingTest {
   std::shared_ptr<NSXPCListener> daemonListener;
   const std::shared_ptr<QVFileProviderShareOperationServiceSource> source = makeSource();
   const std::shared_ptr<KeepingDelegate> delegate = std::make_shared<KeepingDelegate>(source);
-  std::shared_ptr<NSXPCListener> listener;
 
  private:
+  std::vector<std::shared_ptr<NSXPCListener>> listeners_;
   std::shared_ptr<NSXPCConnection> client_;
 };
 

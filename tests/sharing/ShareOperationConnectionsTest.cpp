@@ -155,7 +155,7 @@ TEST_F(ShareOperationConnections, aClientThatIsKilledLeavesNothingBehind) {
   const std::string name = "startOperation_toCopySharingInfoAtURL";
   daemon.replies().hold(name);
   entitled.grant(SHARING_TEST_CLIENT, kAllEntitlements);
-  ClientProcess process(listener->endpoint(), "hang");
+  ClientProcess process(endpoint(), "hang");
   ASSERT_TRUE(eventually([this] { return daemon.sharing().lastOperation() != nullptr; }));
   const auto remote = std::make_shared<RecordingCancellable>();
   daemon.sharing().lastOperation()->setRemoteOperationProxy(remote, {});
@@ -171,10 +171,10 @@ TEST_F(ShareOperationConnections, aClientThatIsKilledLeavesNothingBehind) {
 }
 
 TEST_F(ShareOperationConnections, aProcessHasItsOwnPrivilegesAndNotThoseOfTheOneThatGaveItTheEndpoint) {
-  ClientProcess refused(listener->endpoint(), "privilege");
+  ClientProcess refused(endpoint(), "privilege");
   EXPECT_EQ(refused.waitForEnd(), 26);
   entitled.grant(SHARING_TEST_CLIENT, {QVSharingProxyEntitlement});
-  ClientProcess served(listener->endpoint(), "privilege");
+  ClientProcess served(endpoint(), "privilege");
   EXPECT_EQ(served.waitForEnd(), 0);
   EXPECT_EQ(finish(*proxyOf(client()), "createSharingInfoForURL").code(), 26) << "it is another program";
 }
@@ -187,7 +187,7 @@ TEST_F(ShareOperationConnections, aDocumentIsOpenedThroughItsWrapperWhereItsPath
   daemon.sharing().setAnswers(answers);
   std::filesystem::remove(path);  // the descriptor is the only way left
   entitled.grant(SHARING_TEST_CLIENT, {QVSharingPrivateInterfaceEntitlement});
-  ClientProcess reader(listener->endpoint(), "read");
+  ClientProcess reader(endpoint(), "read");
   EXPECT_EQ(reader.read(false), "what is in it");
   EXPECT_EQ(reader.waitForEnd(), 0);
 }
