@@ -36,7 +36,7 @@ class EntitledScope {
     folder_.write(name, text);
     chmod((folder_.path() + "/" + name).c_str(), 0644);
   }
-  static std::string ownProgram() { return std::filesystem::read_symlink("/proc/self/exe").string(); }
+  static std::string ownProgram() { return std::filesystem::read_symlink("/proc/thread-self/exe").string(); }
 
  private:
   const TemporaryFolder folder_;
