@@ -3,6 +3,7 @@
 #include <CLI/CLI.hpp>
 #include <cmath>
 #include <iostream>
+#include <limits>
 #include <signal.h>
 #include <unistd.h>
 
@@ -39,6 +40,7 @@ struct Words {
   std::string name;
   std::vector<std::string> items;
   std::string folder, cloud, device;
+  std::int32_t process = 0;
   bool json = false;
 };
 
@@ -71,6 +73,7 @@ class CommandLine {
   bool has(const char *command) const { return app_.got_subcommand(command); }
   bool hasAccount(const char *command) const { return account_->got_subcommand(command); }
   bool hasDepth() const { return depth_->count() > 0; }
+  bool hasProcess() const { return process_->count() > 0; }
 
  private:
   void addLs() {
@@ -122,6 +125,14 @@ class CommandLine {
             "that is named, where its contents are and whether the cloud has them");
     status->add_flag("--json", words_.json, "One JSON object, and one for each item");
     status->add_option("item", words_.items, kItemArgumentHelp);
+    CLI::App *entitlements =
+        add("entitlements",
+            "Shows what a running process is entitled to, and which file says so; or, without one,\n"
+            "what the files of /etc/droxa/entitlements.d grant");
+    process_ = entitlements->add_option("pid", words_.process, "The process's number")
+                   ->type_name("PID")
+                   ->check(CLI::Range(1, std::numeric_limits<std::int32_t>::max()));
+    entitlements->add_flag("--json", words_.json, "One JSON object");
     account_ = add("account", "Shows, signs in or signs out the account");
     account_->add_subcommand("show", "Shows who is signed in")
         ->fallthrough()
@@ -170,6 +181,7 @@ class CommandLine {
   std::optional<ActionCommands> actions_;
   CLI::App *account_ = nullptr;
   CLI::Option *depth_ = nullptr;
+  CLI::Option *process_ = nullptr;
 };
 
 // Waits for Ctrl-C or SIGTERM, which are blocked from then on.
@@ -220,6 +232,9 @@ int runCommand(const CommandLine &line, const Words &words, std::ostream &out, s
   if (line.has("status"))
     return words.items.empty() ? runStatus(context, words.json)
                                : runItemStatus(context, words.items, words.json);
+  if (line.has("entitlements"))
+    return runEntitlements(context, line.hasProcess() ? std::optional(words.process) : std::nullopt,
+                           words.json);
   if (line.hasAccount("sign-in")) return runAccountSignIn(context, words.name);
   if (line.hasAccount("sign-out")) return runAccountSignOut(context);
   return runAccountShow(context, words.json);

@@ -2,6 +2,7 @@
 
 #include <chrono>
 #include <cstddef>
+#include <cstdint>
 #include <optional>
 #include <string>
 #include <vector>
@@ -56,6 +57,9 @@ int runWait(CommandContext &context, const WaitOptions &options);
 
 enum class DeletionsAnswer { none, carryOut, restore };
 int runDeletions(CommandContext &context, DeletionsAnswer answer, bool json);
+
+// What the process would be granted when it connects; without one, all that the files grant.
+int runEntitlements(CommandContext &context, std::optional<std::int32_t> process, bool json);
 
 int runAccountShow(CommandContext &context, bool json);
 int runAccountSignIn(CommandContext &context, const std::string &name);

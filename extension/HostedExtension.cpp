@@ -5,7 +5,9 @@
 #include "extension/HostedAction.h"
 #include "extension/HostedEnumerator.h"
 #include "extension/HostedProviding.h"
+#include "extension/HostedService.h"
 #include "platform/fileprovider/NSFileProviderError.h"
+#include "platform/foundation/NSFileManager.h"
 
 namespace droxa {
 namespace {
@@ -13,6 +15,11 @@ namespace {
 // A lookup may come back with neither a result nor an error; the host is told what that means.
 NSError ErrorOrNoSuchItem(const NSError &error, const std::string &identifier) {
   return error ? error : fileProviderErrorForNonExistentItemWithIdentifier(identifier);
+}
+
+NSError NoSuchService(const std::string &name, const std::string &identifier) {
+  return NSError(NSCocoaErrorDomain, NSFeatureUnsupportedError,
+                 {{NSLocalizedDescriptionKey, "there is no service " + name + " on the item " + identifier}});
 }
 
 }  // namespace
@@ -72,6 +79,19 @@ void HostedExtension::movingItemAtURL(const NSURL &url, const NSURL &destination
 void HostedExtension::performAction(const FPDActionRequest &request, FPDActionCompletion completion) {
   if (const NSError error = FPDActionRequestError(request)) return completion(nullptr, error);
   completion(std::make_shared<HostedAction>(principal_, request), {});
+}
+
+void HostedExtension::listenerEndpointForServiceName(const std::string &name,
+                                                     const std::string &itemIdentifier,
+                                                     FPDServiceCompletion completion) {
+  NSError error;
+  for (const auto &source : principal_->supportedServiceSourcesForItemIdentifier(itemIdentifier, &error)) {
+    if (source->serviceName() != name) continue;
+    const auto endpoint = source->makeListenerEndpointAndReturnError(&error);
+    if (!endpoint) return completion(nullptr, error);
+    return completion(std::make_shared<HostedService>(source, *endpoint), {});
+  }
+  completion(nullptr, error ? error : NoSuchService(name, itemIdentifier));
 }
 
 }  // namespace droxa

@@ -34,6 +34,9 @@ class HostedExtension final : public NSFileProviderExtensionProtocol {
                        NSFileProviderMovingCompletion completion) override;
   // With an action, which the first wait begins (HostedAction), or with what is wrong with the request.
   void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
+  // With what holds the source of the service (HostedService).
+  void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
+                                      FPDServiceCompletion completion) override;
 
  private:
   const std::shared_ptr<NSFileProviderExtension> principal_;

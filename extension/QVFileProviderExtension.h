@@ -73,6 +73,11 @@ class QVFileProviderExtension final : public NSFileProviderExtension {
   std::shared_ptr<NSFileProviderEnumerator> enumeratorForContainerItemIdentifier(
       const std::string &identifier, NSError *error) override;
 
+  // The services on an item, never none: the sharing operations are offered on every identifier, whatever it
+  // names. `error` isn't written. May wait for the daemon.
+  NSFileProviderServiceSources supportedServiceSourcesForItemIdentifier(const std::string &identifier,
+                                                                        NSError *error) override;
+
   // Contents. A read of what is outside the synced locations, and of a file or package that is here, is
   // granted at once; else the completion tells the end of the download, of which each path has one. Stopping
   // cancels the download under way, else evicts; it does neither where a move needs the contents.

@@ -190,4 +190,17 @@ void ExtensionCalls::performAction(const FPDActionRequest &request, FPDActionCom
       ->attempt(1);
 }
 
+void ExtensionCalls::listenerEndpointForServiceName(const std::string &name,
+                                                    const std::string &itemIdentifier,
+                                                    FPDServiceCompletion completion) {
+  using ServiceCall = Call<std::shared_ptr<FPDService>, NSError>;
+  std::make_shared<ServiceCall>(
+      connecting_,
+      [name, itemIdentifier](NSFileProviderExtensionProtocol &extension, ServiceCall::Reply reply) {
+        extension.listenerEndpointForServiceName(name, itemIdentifier, std::move(reply));
+      },
+      completion, [completion](const NSError &error) { completion(nullptr, error); })
+      ->attempt(1);
+}
+
 }  // namespace droxa

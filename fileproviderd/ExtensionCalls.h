@@ -38,6 +38,10 @@ class ExtensionCalls {
   // The action hasn't begun; it ends with the extension that gave it.
   void performAction(const FPDActionRequest &request, FPDActionCompletion completion);
 
+  // The service's connections end with the extension that gave it, and it takes no new ones then.
+  void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
+                                      FPDServiceCompletion completion);
+
   // What to tell when the extension's end cut off what `error` says.
   NSError cutOffError(const NSError &error) const;
 

@@ -49,7 +49,8 @@ void Host::stop() {
   launcher_->stop();
 }
 
-bool Host::listenerShouldAcceptNewConnection(const std::shared_ptr<NSXPCConnection> &connection) {
+bool Host::listenerShouldAcceptNewConnection(const std::shared_ptr<NSXPCListener> & /*listener*/,
+                                             const std::shared_ptr<NSXPCConnection> &connection) {
   if (connection->peer().userIdentifier != getuid()) return false;
   const NSXPCConnection *key = connection.get();
   connection->setExportedObject(FPDControlInterface(), std::shared_ptr<FPDControlProtocol>(control_));

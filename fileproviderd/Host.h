@@ -24,7 +24,8 @@ class Host final : public NSXPCListenerDelegate, public std::enable_shared_from_
   // Ends the listener, the clients' connections and the extension.
   void stop();
 
-  bool listenerShouldAcceptNewConnection(const std::shared_ptr<NSXPCConnection> &connection) override;
+  bool listenerShouldAcceptNewConnection(const std::shared_ptr<NSXPCListener> &listener,
+                                         const std::shared_ptr<NSXPCConnection> &connection) override;
   FPDStatus status() const;
   const std::shared_ptr<ControlService> &control() const { return control_; }
 

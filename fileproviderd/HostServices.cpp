@@ -24,6 +24,7 @@ ControlService::ControlService(std::shared_ptr<ExtensionCalls> calls,
       paths_(std::make_shared<PathResolver>(calls_, std::move(replica))),
       providings_(std::make_shared<Providings>(calls_)),
       actions_(calls_, followed_, listings_),
+      services_(std::make_shared<Services>(calls_)),
       status_(std::move(status)) {}
 
 void ControlService::getStatus(FPDStatusCompletion completion) {
@@ -115,6 +116,13 @@ void ControlService::movingItemAtURL(const NSURL &url, const NSURL &destination,
 
 void ControlService::performAction(const FPDActionRequest &request, FPDActionCompletion completion) {
   actions_.perform(request, completion);
+}
+
+void ControlService::listenerEndpointForServiceName(const std::string &name,
+                                                    const std::string &itemIdentifier,
+                                                    FPDServiceCompletion completion) {
+  const auto client = NSXPCConnection::currentConnection();
+  services_->open(name, itemIdentifier, client ? client->peer().processIdentifier : 0, completion);
 }
 
 }  // namespace droxa

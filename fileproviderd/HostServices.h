@@ -10,6 +10,7 @@
 #include "fileproviderd/OpenListings.h"
 #include "fileproviderd/PathResolver.h"
 #include "fileproviderd/Providings.h"
+#include "fileproviderd/Services.h"
 
 namespace droxa {
 
@@ -56,6 +57,8 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   void movingItemAtURL(const NSURL &url, const NSURL &destination,
                        NSFileProviderMovingCompletion completion) override;
   void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
+  void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
+                                      FPDServiceCompletion completion) override;
 
  private:
   const std::shared_ptr<ExtensionCalls> calls_;
@@ -64,6 +67,7 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   const std::shared_ptr<PathResolver> paths_;
   const std::shared_ptr<Providings> providings_;
   const Actions actions_;
+  const std::shared_ptr<Services> services_;
   const StatusSource status_;
 };
 

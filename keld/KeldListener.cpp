@@ -29,7 +29,8 @@ void KeldListener::invalidate() {
   listener_->invalidate();
 }
 
-bool KeldListener::listenerShouldAcceptNewConnection(const std::shared_ptr<NSXPCConnection> &connection) {
+bool KeldListener::listenerShouldAcceptNewConnection(const std::shared_ptr<NSXPCListener> & /*listener*/,
+                                                     const std::shared_ptr<NSXPCConnection> &connection) {
   const auto daemon = daemon_.lock();
   if (!daemon) return false;
   // The replica is one user's; the socket's mode says the same.

@@ -19,7 +19,8 @@ class KeldListener final : public NSXPCListenerDelegate {
   // Accepts nobody any more.
   void invalidate();
 
-  bool listenerShouldAcceptNewConnection(const std::shared_ptr<NSXPCConnection> &connection) override;
+  bool listenerShouldAcceptNewConnection(const std::shared_ptr<NSXPCListener> &listener,
+                                         const std::shared_ptr<NSXPCConnection> &connection) override;
 
  private:
   KeldListener(std::weak_ptr<Keld> daemon, std::shared_ptr<NSXPCListener> listener);

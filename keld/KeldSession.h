@@ -54,6 +54,36 @@ class KeldSession final : public QVProtocol, public std::enable_shared_from_this
   void allowDeletionAtURL(const NSURL &url, QVContentsErrorReply reply) override;
   void confirmDeletions(bool carryOut, QVContentsErrorReply reply) override;
 
+  void startOperation_toCopySharingInfoAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                             QVShareAndURLReply reply) override;
+  void startOperation_toCopyShareURLForShare(std::shared_ptr<QVOperationClient> op,
+                                             const std::optional<CKShare> &share,
+                                             const std::optional<std::string> &appName,
+                                             QVShareAndURLReply reply) override;
+  void startOperation_toSaveSharingInfo(std::shared_ptr<QVOperationClient> op,
+                                        const std::optional<CKShare> &share, QVShareReply reply) override;
+  void createSharingInfoForURL(const NSURL &url, QVShareReply reply) override;
+  void startOperation_toUnshareShare(std::shared_ptr<QVOperationClient> op,
+                                     const std::optional<CKShare> &share, bool forceDelete,
+                                     QVShareOutcomeReply reply) override;
+  void startOperation_toModifyRecordAccessAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                                bool allowAccess, QVRecordAccessReply reply) override;
+  void startOperation_toCopyParticipantTokenAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                                  QVParticipantTokenReply reply) override;
+  void startOperation_toPrepFolderForSharingAt(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                               QVShareOutcomeReply reply) override;
+  void copyCurrentUserNameAndDisplayHandleWithReply(QVCurrentUserReply reply) override;
+  void startOperation_toProcessSubitemsAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                             std::uint64_t maxSubsharesFailures, std::uint64_t processType,
+                                             QVShareOutcomeReply reply) override;
+  void startOperation_toLookupShareParticipants(std::shared_ptr<QVOperationClient> op,
+                                                const QVShareParticipants &participants,
+                                                QVParticipantsReply reply) override;
+  void startOperation_toCopyDocumentURLForRecordID(std::shared_ptr<QVOperationClient> op,
+                                                   const std::optional<CKRecordID> &recordID,
+                                                   bool syncIfNeeded, QVSandboxingURLReply reply) override;
+  void checkIfItemIsShareableWithInode(std::uint64_t inode, QVBoolReply reply) override;
+
  private:
   struct Found {
     std::shared_ptr<const QVQueryItem> item;

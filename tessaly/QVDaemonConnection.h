@@ -3,6 +3,7 @@
 #include <any>
 #include <functional>
 #include <memory>
+#include <utility>
 
 #include "platform/xpc/NSXPCProxyCreating.h"
 #include "tessaly/QVProtocol.h"
@@ -18,6 +19,7 @@ class QVSyncProxy {
   virtual QVProtocol *operator->() = 0;
 
   void setObjResult(std::any result, NSError error);
+  void setBoolResult(bool result, NSError error) { setObjResult(result, std::move(error)); }
   // The stored result, or a default-constructed (nil) T.
   template <class T>
   T result() const {

@@ -16,6 +16,7 @@
 #include "tessaly/QVFileObjectID.h"
 #include "tessaly/QVItemMetadata.h"
 #include "tessaly/QVQueryItem.h"
+#include "tessaly/QVShareOperationProtocol.h"
 
 // The daemon's protocol. The same abstract classes are called in process (the fake daemon of the tests,
 // keld's own object) and through a connection. Every completion and reply is called exactly once, on any
@@ -114,10 +115,11 @@ using QVContainersReply =
     std::function<void(const std::vector<QVContainerDescription> &containers, const NSError &error)>;
 using QVAccountReply =
     std::function<void(const std::optional<QVAccountDescription> &account, const NSError &error)>;
+using QVBoolReply = std::function<void(bool result, const NSError &error)>;
 using QVStatusReply = std::function<void(const QVDaemonStatus &status, const NSError &error)>;
 
 // What the daemon offers. Errors are QVTessalyErrorDomain (tessaly/QVErrors.h) unless said otherwise.
-class QVProtocol : public QVContentsProtocol {
+class QVProtocol : public QVContentsProtocol, public QVShareOperationProtocol {
  public:
   // The root is the documents folder of the default container. Besides its entries it lists a folder for
   // every other container but the trash, which stands for that container's documents folder: "Documents",
@@ -168,6 +170,10 @@ class QVProtocol : public QVContentsProtocol {
   virtual void signOut(QVErrorReply reply) = 0;
 
   virtual void getStatus(QVStatusReply reply) = 0;
+
+  // Whether the folder or alias of that number (QVFileObjectID::number()) may be shared; the error, when
+  // there is one, tells why not.
+  virtual void checkIfItemIsShareableWithInode(std::uint64_t inode, QVBoolReply reply) = 0;
 };
 
 }  // namespace droxa

@@ -167,6 +167,89 @@ class BlockingProxy final : public QVSyncProxy, public QVProtocol {
       daemon.confirmDeletions(carryOut, std::move(answer));
     });
   }
+  void startOperation_toCopySharingInfoAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                             QVShareAndURLReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVShareAndURLReply answer) {
+      daemon.startOperation_toCopySharingInfoAtURL(std::move(op), url, std::move(answer));
+    });
+  }
+  void startOperation_toCopyShareURLForShare(std::shared_ptr<QVOperationClient> op,
+                                             const std::optional<CKShare> &share,
+                                             const std::optional<std::string> &appName,
+                                             QVShareAndURLReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVShareAndURLReply answer) {
+      daemon.startOperation_toCopyShareURLForShare(std::move(op), share, appName, std::move(answer));
+    });
+  }
+  void startOperation_toSaveSharingInfo(std::shared_ptr<QVOperationClient> op,
+                                        const std::optional<CKShare> &share, QVShareReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVShareReply answer) {
+      daemon.startOperation_toSaveSharingInfo(std::move(op), share, std::move(answer));
+    });
+  }
+  void createSharingInfoForURL(const NSURL &url, QVShareReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVShareReply answer) {
+      daemon.createSharingInfoForURL(url, std::move(answer));
+    });
+  }
+  void startOperation_toUnshareShare(std::shared_ptr<QVOperationClient> op,
+                                     const std::optional<CKShare> &share, bool forceDelete,
+                                     QVShareOutcomeReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVShareOutcomeReply answer) {
+      daemon.startOperation_toUnshareShare(std::move(op), share, forceDelete, std::move(answer));
+    });
+  }
+  void startOperation_toModifyRecordAccessAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                                bool allowAccess, QVRecordAccessReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVRecordAccessReply answer) {
+      daemon.startOperation_toModifyRecordAccessAtURL(std::move(op), url, allowAccess, std::move(answer));
+    });
+  }
+  void startOperation_toCopyParticipantTokenAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                                  QVParticipantTokenReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVParticipantTokenReply answer) {
+      daemon.startOperation_toCopyParticipantTokenAtURL(std::move(op), url, std::move(answer));
+    });
+  }
+  void startOperation_toPrepFolderForSharingAt(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                               QVShareOutcomeReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVShareOutcomeReply answer) {
+      daemon.startOperation_toPrepFolderForSharingAt(std::move(op), url, std::move(answer));
+    });
+  }
+  void copyCurrentUserNameAndDisplayHandleWithReply(QVCurrentUserReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVCurrentUserReply answer) {
+      daemon.copyCurrentUserNameAndDisplayHandleWithReply(std::move(answer));
+    });
+  }
+  void startOperation_toProcessSubitemsAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                             std::uint64_t maxSubsharesFailures, std::uint64_t processType,
+                                             QVShareOutcomeReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVShareOutcomeReply answer) {
+      daemon.startOperation_toProcessSubitemsAtURL(std::move(op), url, maxSubsharesFailures, processType,
+                                                   std::move(answer));
+    });
+  }
+  void startOperation_toLookupShareParticipants(std::shared_ptr<QVOperationClient> op,
+                                                const QVShareParticipants &participants,
+                                                QVParticipantsReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVParticipantsReply answer) {
+      daemon.startOperation_toLookupShareParticipants(std::move(op), participants, std::move(answer));
+    });
+  }
+  void startOperation_toCopyDocumentURLForRecordID(std::shared_ptr<QVOperationClient> op,
+                                                   const std::optional<CKRecordID> &recordID,
+                                                   bool syncIfNeeded, QVSandboxingURLReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVSandboxingURLReply answer) {
+      daemon.startOperation_toCopyDocumentURLForRecordID(std::move(op), recordID, syncIfNeeded,
+                                                         std::move(answer));
+    });
+  }
+  void checkIfItemIsShareableWithInode(std::uint64_t inode, QVBoolReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVBoolReply answer) {
+      daemon.checkIfItemIsShareableWithInode(inode, std::move(answer));
+    });
+  }
 
  private:
   template <class... Args, class Call>

@@ -71,6 +71,61 @@ class UnreachableDaemon final : public QVProtocol {
   }
   void allowDeletionAtURL(const NSURL & /*url*/, QVContentsErrorReply /*reply*/) override { failed_(); }
   void confirmDeletions(bool /*carryOut*/, QVContentsErrorReply /*reply*/) override { failed_(); }
+  void startOperation_toCopySharingInfoAtURL(std::shared_ptr<QVOperationClient> /*op*/, const NSURL & /*url*/,
+                                             QVShareAndURLReply /*reply*/) override {
+    failed_();
+  }
+  void startOperation_toCopyShareURLForShare(std::shared_ptr<QVOperationClient> /*op*/,
+                                             const std::optional<CKShare> & /*share*/,
+                                             const std::optional<std::string> & /*appName*/,
+                                             QVShareAndURLReply /*reply*/) override {
+    failed_();
+  }
+  void startOperation_toSaveSharingInfo(std::shared_ptr<QVOperationClient> /*op*/,
+                                        const std::optional<CKShare> & /*share*/,
+                                        QVShareReply /*reply*/) override {
+    failed_();
+  }
+  void createSharingInfoForURL(const NSURL & /*url*/, QVShareReply /*reply*/) override { failed_(); }
+  void startOperation_toUnshareShare(std::shared_ptr<QVOperationClient> /*op*/,
+                                     const std::optional<CKShare> & /*share*/, bool /*forceDelete*/,
+                                     QVShareOutcomeReply /*reply*/) override {
+    failed_();
+  }
+  void startOperation_toModifyRecordAccessAtURL(std::shared_ptr<QVOperationClient> /*op*/,
+                                                const NSURL & /*url*/, bool /*allowAccess*/,
+                                                QVRecordAccessReply /*reply*/) override {
+    failed_();
+  }
+  void startOperation_toCopyParticipantTokenAtURL(std::shared_ptr<QVOperationClient> /*op*/,
+                                                  const NSURL & /*url*/,
+                                                  QVParticipantTokenReply /*reply*/) override {
+    failed_();
+  }
+  void startOperation_toPrepFolderForSharingAt(std::shared_ptr<QVOperationClient> /*op*/,
+                                               const NSURL & /*url*/,
+                                               QVShareOutcomeReply /*reply*/) override {
+    failed_();
+  }
+  void copyCurrentUserNameAndDisplayHandleWithReply(QVCurrentUserReply /*reply*/) override { failed_(); }
+  void startOperation_toProcessSubitemsAtURL(std::shared_ptr<QVOperationClient> /*op*/, const NSURL & /*url*/,
+                                             std::uint64_t /*maxSubsharesFailures*/,
+                                             std::uint64_t /*processType*/,
+                                             QVShareOutcomeReply /*reply*/) override {
+    failed_();
+  }
+  void startOperation_toLookupShareParticipants(std::shared_ptr<QVOperationClient> /*op*/,
+                                                const QVShareParticipants & /*participants*/,
+                                                QVParticipantsReply /*reply*/) override {
+    failed_();
+  }
+  void startOperation_toCopyDocumentURLForRecordID(std::shared_ptr<QVOperationClient> /*op*/,
+                                                   const std::optional<CKRecordID> & /*recordID*/,
+                                                   bool /*syncIfNeeded*/,
+                                                   QVSandboxingURLReply /*reply*/) override {
+    failed_();
+  }
+  void checkIfItemIsShareableWithInode(std::uint64_t /*inode*/, QVBoolReply /*reply*/) override { failed_(); }
 
  private:
   const std::function<void()> failed_;

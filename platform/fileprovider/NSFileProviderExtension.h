@@ -5,8 +5,10 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "platform/fileprovider/NSFileProviderEnumerating.h"
+#include "platform/fileprovider/NSFileProviderServiceSource.h"
 #include "platform/foundation/NSData.h"
 #include "platform/foundation/NSDate.h"
 #include "platform/foundation/NSError.h"
@@ -18,6 +20,7 @@ namespace droxa {
 using NSFileProviderItemCompletion =
     std::function<void(const std::shared_ptr<const NSFileProviderItem> &item, const NSError &error)>;
 using NSFileProviderErrorCompletion = std::function<void(const NSError &error)>;
+using NSFileProviderServiceSources = std::vector<std::shared_ptr<NSFileProviderServiceSource>>;
 using NSFileProviderMovingCompletion = std::function<void(bool requiresProviding, const NSError &error)>;
 
 // The extension protocol: what the framework asks a file provider.
@@ -36,6 +39,10 @@ class NSFileProviderExtension : public NSObject,
   // The enumerator, or null with `error` (may be null) set.
   virtual std::shared_ptr<NSFileProviderEnumerator> enumeratorForContainerItemIdentifier(
       const std::string &identifier, NSError *error) = 0;
+
+  // The services that are offered on the item; none with `error` (may be null) set.
+  virtual NSFileProviderServiceSources supportedServiceSourcesForItemIdentifier(const std::string &identifier,
+                                                                                NSError *error) = 0;
 
   // Each completion below is called exactly once, on any thread, also before the call returns.
   //

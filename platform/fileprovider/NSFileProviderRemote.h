@@ -12,6 +12,7 @@
 #include "platform/foundation/NSData.h"
 #include "platform/foundation/NSError.h"
 #include "platform/foundation/NSURL.h"
+#include "platform/xpc/NSXPCListener.h"
 
 // The protocols between the framework's daemon, the extension and the framework's clients, as they cross a
 // connection. Every completion is called exactly once, on any thread, unless the call fails in transport:
@@ -88,6 +89,21 @@ class FPDAction {
 using FPDActionCompletion =
     std::function<void(const std::shared_ptr<FPDAction> &action, const NSError &error)>;
 
+// A service on an item, as whoever asked for it holds it: clients connect to its endpoint, straight to the
+// process that offers it. Its listener takes connections for as long as this is held, here or by whoever it
+// was passed on to: hold it until the first reply over the connection has come. Accepted connections don't
+// need it any more.
+class FPDService {
+ public:
+  virtual ~FPDService() = default;
+  virtual NSXPCListenerEndpoint endpoint() const = 0;
+};
+
+// Without a service there is an error: NSCocoaErrorDomain NSFeatureUnsupportedError when the item has no
+// service of that name.
+using FPDServiceCompletion =
+    std::function<void(const std::shared_ptr<FPDService> &service, const NSError &error)>;
+
 // What the extension's process exports to the host.
 class NSFileProviderExtensionProtocol {
  public:
@@ -110,6 +126,9 @@ class NSFileProviderExtensionProtocol {
                                NSFileProviderMovingCompletion completion) = 0;
 
   virtual void performAction(const FPDActionRequest &request, FPDActionCompletion completion) = 0;
+
+  virtual void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
+                                              FPDServiceCompletion completion) = 0;
 };
 
 // What the host exports to the extension's process.
@@ -191,6 +210,10 @@ class FPDControlProtocol {
   // The host has the extension do it, once. When the extension ends in the middle, so does the action, with
   // NSFileProviderErrorServerUnreachable: nobody knows then whether it was done.
   virtual void performAction(const FPDActionRequest &request, FPDActionCompletion completion) = 0;
+
+  // NSPOSIXErrorDomain EMFILE for a client that holds too many.
+  virtual void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
+                                              FPDServiceCompletion completion) = 0;
 };
 
 }  // namespace droxa

@@ -101,11 +101,28 @@ bool getResourceValue(const NSURL &url, bool *value, const std::string &key, NSE
     *value = isDirectory;
   } else if (key == NSURLIsPackageKey) {
     *value = isDirectory && (hasPackageAttribute(url.path()) || hasPackageName(url.lastPathComponent()));
+  } else if (key == NSURLIsAliasFileKey) {
+    *value = S_ISLNK(status.st_mode);
   } else {
     if (error) *error = NSError::errorWithPOSIXCode(EINVAL, "there is no resource value " + key);
     return false;
   }
   return true;
+}
+
+// Most dataless documents have their own file; what a promise stands for is a plain document.
+bool getPromisedItemResourceValue(const NSURL &url, bool *value, const std::string &key, NSError *error) {
+  NSError problem;
+  if (getResourceValue(url, value, key, &problem)) return true;
+  const auto provider = NSFileManager::defaultManager()->ubiquitousItemProvider();
+  const bool isKnown = key == NSURLIsDirectoryKey || key == NSURLIsPackageKey || key == NSURLIsAliasFileKey;
+  struct stat status {};
+  if (isKnown && provider && look(provider->physicalURLForURL(url), &status, nullptr)) {
+    *value = false;
+    return true;
+  }
+  if (error) *error = problem;
+  return false;
 }
 
 void NSURLForgetPackageExtensions() {

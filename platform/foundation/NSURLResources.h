@@ -21,9 +21,15 @@ inline constexpr char NSURLIsDirectoryKey[] = "NSURLIsDirectoryKey";
 // a comment; read once). Without that file: bundle, odpkg, rtfd, sparsebundle.
 inline constexpr char NSURLIsPackageKey[] = "NSURLIsPackageKey";
 
+// A symbolic link: what stands for another item.
+inline constexpr char NSURLIsAliasFileKey[] = "NSURLIsAliasFileKey";
+
 // Whether `key` is known and there is a file; `value` is its resource value then. Otherwise `value` stays,
 // and `error` (may be null) is set.
 bool getResourceValue(const NSURL &url, bool *value, const std::string &key, NSError *error);
+
+// The same of an item whose contents may still be to come: what can be told without them.
+bool getPromisedItemResourceValue(const NSURL &url, bool *value, const std::string &key, NSError *error);
 
 // For tests: the next question reads the extensions again.
 void NSURLForgetPackageExtensions();

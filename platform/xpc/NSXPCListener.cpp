@@ -53,7 +53,8 @@ class Listener final : public NSXPCListener, public std::enable_shared_from_this
       delegate = delegate_.lock();
     }
     const auto connection = XPCConnection::create(socket);
-    if (!delegate || !delegate->listenerShouldAcceptNewConnection(connection)) connection->invalidate();
+    if (!delegate || !delegate->listenerShouldAcceptNewConnection(shared_from_this(), connection))
+      connection->invalidate();
   }
 
   // The socket in the file system goes with its listener, unless another one has taken its place.

@@ -23,12 +23,15 @@ class NSXPCListenerEndpoint {
   const int descriptor_;
 };
 
+class NSXPCListener;
+
 class NSXPCListenerDelegate {
  public:
   virtual ~NSXPCListenerDelegate() = default;
   // Called on the pool for each peer that connects. Sets the connection up and resumes it and returns true,
   // or returns false: then the connection is closed.
-  virtual bool listenerShouldAcceptNewConnection(const std::shared_ptr<NSXPCConnection> &connection) = 0;
+  virtual bool listenerShouldAcceptNewConnection(const std::shared_ptr<NSXPCListener> &listener,
+                                                 const std::shared_ptr<NSXPCConnection> &connection) = 0;
 };
 
 // Accepts connections. The delegate is held weakly; without one every peer is refused.

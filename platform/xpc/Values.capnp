@@ -4,6 +4,9 @@
 using Cxx = import "/capnp/c++.capnp";
 $Cxx.namespace("droxa::schema");
 
+# An object whose descriptor crosses with it (platform/xpc/capnp/Descriptors.h).
+interface Descriptor {}
+
 struct Url {
   union {
     path @0 :Data;  # of a file URL

@@ -6,12 +6,13 @@ using DaemonNotifications = import "/tessaly/xpc/QVDaemonNotificationReceiving.c
 using Item = import "/tessaly/xpc/QVQueryItem.capnp";
 using Receiving = import "/tessaly/xpc/QVItemNotificationReceiving.capnp";
 using Sending = import "/tessaly/xpc/QVItemNotificationSending.capnp";
+using Sharing = import "/tessaly/xpc/QVShareOperation.capnp";
 using Transfer = import "/tessaly/xpc/QVTransfer.capnp";
 using Values = import "/platform/xpc/Values.capnp";
 $Cxx.namespace("droxa::schema");
 
 # File object identifiers cross in their string form.
-interface QVProtocol {
+interface QVProtocol extends(Sharing.QVShareOperationProtocol) {
   enumerateItemsInFolder @0 (folder :Data, sortOrder :Int64, offset :UInt64, limit :UInt64)
       -> (items :List(Item.QVQueryItem), nextOffset :UInt64, error :Values.Error);
   enumerateAllFoldersWithSortOrder @1 (sortOrder :Int64, offset :UInt64, limit :UInt64)
@@ -45,6 +46,7 @@ interface QVProtocol {
   confirmDeletions @22 (carryOut :Bool) -> (error :Values.Error);
   setMetadataAtURL @23 (url :Values.Url, change :MetadataChange) -> (error :Values.Error);
   allowDeletionAtURL @24 (url :Values.Url) -> (error :Values.Error);
+  checkIfItemIsShareableWithInode @25 (inode :UInt64) -> (isShareable :Bool, error :Values.Error);
 
   struct Information {
     key @0 :Data;

@@ -3,14 +3,15 @@
 #include "platform/xpc/capnp/Proxy.h"
 #include "tessaly/QVProtocol.h"
 #include "tessaly/xpc/QVProtocol.capnp.h"
+#include "tessaly/xpc/QVShareOperationCalls.h"
 
 namespace droxa {
 
 // Stands in for the daemon's object in another process.
 // Thread contract: any thread, never the loop.
-class QVProtocolProxy final : public XPCProxy<schema::QVProtocol, QVProtocol, QVProtocolProxy> {
+class QVProtocolProxy final : public QVShareOperationCalls<schema::QVProtocol, QVProtocol, QVProtocolProxy> {
  public:
-  using XPCProxy::XPCProxy;
+  using QVShareOperationCalls::QVShareOperationCalls;
 
   void enumerateItemsInFolder(const std::optional<QVFileObjectID> &folder, std::int64_t sortOrder,
                               std::uint64_t offset, std::uint64_t limit,
@@ -44,6 +45,8 @@ class QVProtocolProxy final : public XPCProxy<schema::QVProtocol, QVProtocol, QV
   void getMoveCapability(const NSURL &source, const NSURL &destination, QVMoveCapabilityReply reply) override;
   void allowDeletionAtURL(const NSURL &url, QVContentsErrorReply reply) override;
   void confirmDeletions(bool carryOut, QVContentsErrorReply reply) override;
+
+  void checkIfItemIsShareableWithInode(std::uint64_t inode, QVBoolReply reply) override;
 };
 
 }  // namespace droxa

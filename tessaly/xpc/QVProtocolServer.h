@@ -5,15 +5,16 @@
 #include "platform/xpc/capnp/Exported.h"
 #include "tessaly/QVProtocol.h"
 #include "tessaly/xpc/QVProtocol.capnp.h"
+#include "tessaly/xpc/QVShareOperationServer.h"
 
 namespace droxa {
 
 // The daemon's object as its clients call it.
 // Thread contract: the loop; the object is called on the pool, several calls at a time.
-class QVProtocolServer final : public schema::QVProtocol::Server {
+class QVProtocolServer final : public schema::QVProtocol::Server, public QVShareOperationServer {
  public:
   QVProtocolServer(Session &session, std::shared_ptr<QVProtocol> object)
-      : exported_(session, std::move(object)) {}
+      : QVShareOperationServer(session, object), exported_(session, std::move(object)) {}
 
   kj::Promise<void> enumerateItemsInFolder(EnumerateItemsInFolderContext context) override;
   kj::Promise<void> enumerateAllFoldersWithSortOrder(
@@ -43,6 +44,8 @@ class QVProtocolServer final : public schema::QVProtocol::Server {
   kj::Promise<void> getMoveCapability(GetMoveCapabilityContext context) override;
   kj::Promise<void> allowDeletionAtURL(AllowDeletionAtURLContext context) override;
   kj::Promise<void> confirmDeletions(ConfirmDeletionsContext context) override;
+
+  kj::Promise<void> checkIfItemIsShareableWithInode(CheckIfItemIsShareableWithInodeContext context) override;
 
  private:
   Exported<QVProtocol> exported_;

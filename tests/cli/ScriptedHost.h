@@ -50,6 +50,10 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
   }
   // Done by `act`, as the extension would.
   void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
+  void listenerEndpointForServiceName(const std::string &, const std::string &,
+                                      FPDServiceCompletion completion) override {
+    completion(nullptr, NSError(NSPOSIXErrorDomain, ENOSYS));
+  }
 
   std::map<std::string, NSFileProviderItemFields> items;  // by identifier
   std::map<std::string, std::string> paths;               // to identifiers

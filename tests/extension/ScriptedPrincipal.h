@@ -35,6 +35,13 @@ class ScriptedPrincipal final : public NSFileProviderExtension {
     return enumerator;
   }
 
+  NSFileProviderServiceSources supportedServiceSourcesForItemIdentifier(const std::string &identifier,
+                                                                        NSError *error) override {
+    log.add("services " + identifier);
+    *error = failure;
+    return sources;
+  }
+
   // Kept for the test to answer.
   void startProvidingItemAtURL(const NSURL &asked, std::uint64_t readingOptions,
                                NSFileProviderErrorCompletion completion) override {
@@ -136,6 +143,7 @@ class ScriptedPrincipal final : public NSFileProviderExtension {
   const NSURL url = NSURL::fileURLWithPath("/replica/a");
   std::shared_ptr<const NSFileProviderItem> item;
   std::shared_ptr<NSFileProviderEnumerator> enumerator;
+  NSFileProviderServiceSources sources;
   NSError failure;
   std::function<void(const std::string &identifier)> hook;
 };

@@ -32,6 +32,10 @@ class FailingProxy final : public NSFileProviderExtensionProtocol {
   void providePlaceholderAtURL(const NSURL &, NSFileProviderErrorCompletion) override { fail(); }
   void movingItemAtURL(const NSURL &, const NSURL &, NSFileProviderMovingCompletion) override { fail(); }
   void performAction(const FPDActionRequest &, FPDActionCompletion) override { fail(); }
+  void listenerEndpointForServiceName(const std::string &, const std::string &,
+                                      FPDServiceCompletion) override {
+    fail();
+  }
 
  private:
   void fail() { handler_(connectionInterrupted()); }
@@ -174,6 +178,15 @@ void ScriptedExtension::performAction(const FPDActionRequest &request, FPDAction
   auto action = std::make_shared<ScriptedAction>();
   actions.push_back(action);
   completion(action, NSError());
+}
+
+void ScriptedExtension::listenerEndpointForServiceName(const std::string &name,
+                                                       const std::string &itemIdentifier,
+                                                       FPDServiceCompletion completion) {
+  asked.put("service " + name + " " + itemIdentifier);
+  const auto found = services.find(name + " " + itemIdentifier);
+  if (found == services.end()) return completion(nullptr, failure);
+  completion(found->second, NSError());
 }
 
 void ScriptedExtension::add(const std::string &identifier, const std::string &path,

@@ -191,6 +191,9 @@ class ScriptedExtension final : public NSFileProviderExtensionProtocol {
   void movingItemAtURL(const NSURL &url, const NSURL &destination,
                        NSFileProviderMovingCompletion completion) override;
   void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
+  // Gives what `services` has for "NAME IDENTIFIER", and its failure otherwise.
+  void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
+                                      FPDServiceCompletion completion) override;
 
   // An item at a path of the disk.
   void add(const std::string &identifier, const std::string &path, const NSFileProviderItemFields &fields);
@@ -198,7 +201,8 @@ class ScriptedExtension final : public NSFileProviderExtensionProtocol {
   std::map<std::string, NSFileProviderItemFields> items;
   std::map<std::string, std::string> paths;        // by identifier
   std::map<std::string, std::string> identifiers;  // by path
-  NSError failure;                                 // of items and enumerators, when set
+  std::map<std::string, std::shared_ptr<FPDService>> services;
+  NSError failure;  // of items and enumerators, when set
   Arrivals<std::string> asked;
   Arrivals<std::shared_ptr<ScriptedEnumerator>> enumerators;  // handed out, in order
   Arrivals<std::string> opened;

@@ -13,6 +13,7 @@
 #include <vector>
 
 #include "platform/fileprovider/NSFileProviderRemote.h"
+#include "platform/foundation/NSFileManager.h"
 #include "platform/fileprovider/xpc/FileProviderInterfaces.h"
 #include "platform/oslog/os_log.h"
 #include "platform/xpc/NSXPCConnection.h"
@@ -78,6 +79,10 @@ class Extension final : public NSFileProviderExtensionProtocol {
   void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override {
     if (const NSError error = FPDActionRequestError(request)) return completion(nullptr, error);
     completion(std::make_shared<Action>(), NSError());
+  }
+  void listenerEndpointForServiceName(const std::string &, const std::string &,
+                                      FPDServiceCompletion completion) override {
+    completion(nullptr, NSError(NSCocoaErrorDomain, NSFeatureUnsupportedError));
   }
 };
 

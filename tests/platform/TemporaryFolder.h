@@ -12,9 +12,9 @@ namespace droxa {
 class TemporaryFolder {
  public:
   TemporaryFolder() {
-    std::string name = std::filesystem::path(testing::TempDir()) / "droxa-XXXXXX";
+    std::string name = std::filesystem::path(::testing::TempDir()) / "droxa-XXXXXX";
     path_ = mkdtemp(name.data()) ? name : "";
-    EXPECT_FALSE(path_.empty()) << "no temporary folder in " << testing::TempDir();
+    EXPECT_FALSE(path_.empty()) << "no temporary folder in " << ::testing::TempDir();
   }
   ~TemporaryFolder() {
     std::error_code ignored;

@@ -17,6 +17,7 @@
 #include "tests/support/FakeDrive.h"
 #include "tests/support/FakeItemNotificationSender.h"
 #include "tests/support/FakeReplies.h"
+#include "tests/support/FakeSharing.h"
 #include "tests/support/FakeTransfer.h"
 
 namespace droxa {
@@ -35,6 +36,8 @@ class FakeDaemon final : public QVProtocol, public std::enable_shared_from_this<
   CallLog &log() { return *log_; }
   // How it is answered.
   FakeReplies &replies() { return *replies_; }
+  // What the sharing operations are answered with.
+  FakeSharing &sharing() { return *sharing_; }
 
   // Changes of the drive; a path that doesn't fit fails the test.
   QVFileObjectID addDocument(const std::string &path, std::uint64_t size = 0);
@@ -119,6 +122,36 @@ class FakeDaemon final : public QVProtocol, public std::enable_shared_from_this<
   void allowDeletionAtURL(const NSURL &url, QVContentsErrorReply reply) override;
   void confirmDeletions(bool carryOut, QVContentsErrorReply reply) override;
 
+  void startOperation_toCopySharingInfoAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                             QVShareAndURLReply reply) override;
+  void startOperation_toCopyShareURLForShare(std::shared_ptr<QVOperationClient> op,
+                                             const std::optional<CKShare> &share,
+                                             const std::optional<std::string> &appName,
+                                             QVShareAndURLReply reply) override;
+  void startOperation_toSaveSharingInfo(std::shared_ptr<QVOperationClient> op,
+                                        const std::optional<CKShare> &share, QVShareReply reply) override;
+  void createSharingInfoForURL(const NSURL &url, QVShareReply reply) override;
+  void startOperation_toUnshareShare(std::shared_ptr<QVOperationClient> op,
+                                     const std::optional<CKShare> &share, bool forceDelete,
+                                     QVShareOutcomeReply reply) override;
+  void startOperation_toModifyRecordAccessAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                                bool allowAccess, QVRecordAccessReply reply) override;
+  void startOperation_toCopyParticipantTokenAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                                  QVParticipantTokenReply reply) override;
+  void startOperation_toPrepFolderForSharingAt(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                               QVShareOutcomeReply reply) override;
+  void copyCurrentUserNameAndDisplayHandleWithReply(QVCurrentUserReply reply) override;
+  void startOperation_toProcessSubitemsAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                             std::uint64_t maxSubsharesFailures, std::uint64_t processType,
+                                             QVShareOutcomeReply reply) override;
+  void startOperation_toLookupShareParticipants(std::shared_ptr<QVOperationClient> op,
+                                                const QVShareParticipants &participants,
+                                                QVParticipantsReply reply) override;
+  void startOperation_toCopyDocumentURLForRecordID(std::shared_ptr<QVOperationClient> op,
+                                                   const std::optional<CKRecordID> &recordID,
+                                                   bool syncIfNeeded, QVSandboxingURLReply reply) override;
+  void checkIfItemIsShareableWithInode(std::uint64_t inode, QVBoolReply reply) override;
+
  private:
   friend class FakeTransfer;
   // One document on its way.
@@ -153,6 +186,7 @@ class FakeDaemon final : public QVProtocol, public std::enable_shared_from_this<
 
   const std::shared_ptr<CallLog> log_ = std::make_shared<CallLog>();
   const std::shared_ptr<FakeReplies> replies_ = std::make_shared<FakeReplies>();
+  const std::shared_ptr<FakeSharing> sharing_ = std::make_shared<FakeSharing>();
   const std::shared_ptr<std::atomic<std::size_t>> notificationsReplied_ =
       std::make_shared<std::atomic<std::size_t>>(0);
   mutable Mutex mutex_;

@@ -205,6 +205,77 @@ class FakeDaemonProxy final : public QVProtocol {
     if (failed("confirmDeletions")) return;
     daemon_->confirmDeletions(carryOut, tracked(std::move(reply)));
   }
+  void startOperation_toCopySharingInfoAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                             QVShareAndURLReply reply) override {
+    if (failed("startOperation_toCopySharingInfoAtURL")) return;
+    daemon_->startOperation_toCopySharingInfoAtURL(std::move(op), url, tracked(std::move(reply)));
+  }
+  void startOperation_toCopyShareURLForShare(std::shared_ptr<QVOperationClient> op,
+                                             const std::optional<CKShare> &share,
+                                             const std::optional<std::string> &appName,
+                                             QVShareAndURLReply reply) override {
+    if (failed("startOperation_toCopyShareURLForShare")) return;
+    daemon_->startOperation_toCopyShareURLForShare(std::move(op), share, appName, tracked(std::move(reply)));
+  }
+  void startOperation_toSaveSharingInfo(std::shared_ptr<QVOperationClient> op,
+                                        const std::optional<CKShare> &share, QVShareReply reply) override {
+    if (failed("startOperation_toSaveSharingInfo")) return;
+    daemon_->startOperation_toSaveSharingInfo(std::move(op), share, tracked(std::move(reply)));
+  }
+  void createSharingInfoForURL(const NSURL &url, QVShareReply reply) override {
+    if (failed("createSharingInfoForURL")) return;
+    daemon_->createSharingInfoForURL(url, tracked(std::move(reply)));
+  }
+  void startOperation_toUnshareShare(std::shared_ptr<QVOperationClient> op,
+                                     const std::optional<CKShare> &share, bool forceDelete,
+                                     QVShareOutcomeReply reply) override {
+    if (failed("startOperation_toUnshareShare")) return;
+    daemon_->startOperation_toUnshareShare(std::move(op), share, forceDelete, tracked(std::move(reply)));
+  }
+  void startOperation_toModifyRecordAccessAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                                bool allowAccess, QVRecordAccessReply reply) override {
+    if (failed("startOperation_toModifyRecordAccessAtURL")) return;
+    daemon_->startOperation_toModifyRecordAccessAtURL(std::move(op), url, allowAccess,
+                                                      tracked(std::move(reply)));
+  }
+  void startOperation_toCopyParticipantTokenAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                                  QVParticipantTokenReply reply) override {
+    if (failed("startOperation_toCopyParticipantTokenAtURL")) return;
+    daemon_->startOperation_toCopyParticipantTokenAtURL(std::move(op), url, tracked(std::move(reply)));
+  }
+  void startOperation_toPrepFolderForSharingAt(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                               QVShareOutcomeReply reply) override {
+    if (failed("startOperation_toPrepFolderForSharingAt")) return;
+    daemon_->startOperation_toPrepFolderForSharingAt(std::move(op), url, tracked(std::move(reply)));
+  }
+  void copyCurrentUserNameAndDisplayHandleWithReply(QVCurrentUserReply reply) override {
+    if (failed("copyCurrentUserNameAndDisplayHandleWithReply")) return;
+    daemon_->copyCurrentUserNameAndDisplayHandleWithReply(tracked(std::move(reply)));
+  }
+  void startOperation_toProcessSubitemsAtURL(std::shared_ptr<QVOperationClient> op, const NSURL &url,
+                                             std::uint64_t maxSubsharesFailures, std::uint64_t processType,
+                                             QVShareOutcomeReply reply) override {
+    if (failed("startOperation_toProcessSubitemsAtURL")) return;
+    daemon_->startOperation_toProcessSubitemsAtURL(std::move(op), url, maxSubsharesFailures, processType,
+                                                   tracked(std::move(reply)));
+  }
+  void startOperation_toLookupShareParticipants(std::shared_ptr<QVOperationClient> op,
+                                                const QVShareParticipants &participants,
+                                                QVParticipantsReply reply) override {
+    if (failed("startOperation_toLookupShareParticipants")) return;
+    daemon_->startOperation_toLookupShareParticipants(std::move(op), participants, tracked(std::move(reply)));
+  }
+  void startOperation_toCopyDocumentURLForRecordID(std::shared_ptr<QVOperationClient> op,
+                                                   const std::optional<CKRecordID> &recordID,
+                                                   bool syncIfNeeded, QVSandboxingURLReply reply) override {
+    if (failed("startOperation_toCopyDocumentURLForRecordID")) return;
+    daemon_->startOperation_toCopyDocumentURLForRecordID(std::move(op), recordID, syncIfNeeded,
+                                                         tracked(std::move(reply)));
+  }
+  void checkIfItemIsShareableWithInode(std::uint64_t inode, QVBoolReply reply) override {
+    if (failed("checkIfItemIsShareableWithInode")) return;
+    daemon_->checkIfItemIsShareableWithInode(inode, tracked(std::move(reply)));
+  }
 
  private:
   bool failed(const char *operation) {

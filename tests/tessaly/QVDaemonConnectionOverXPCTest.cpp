@@ -52,7 +52,8 @@ class ListeningDaemon final : public NSXPCListenerDelegate {
     return accepted_;
   }
 
-  bool listenerShouldAcceptNewConnection(const std::shared_ptr<NSXPCConnection> &connection) override {
+  bool listenerShouldAcceptNewConnection(const std::shared_ptr<NSXPCListener> &,
+                                         const std::shared_ptr<NSXPCConnection> &connection) override {
     connection->setExportedObject<QVProtocol>(QVProtocolInterface(), daemon_);
     {
       const Lock lock(mutex_);

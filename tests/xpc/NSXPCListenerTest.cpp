@@ -27,7 +27,8 @@ using Host = NSFileProviderHostProtocol;
 class Acceptor final : public NSXPCListenerDelegate {
  public:
   explicit Acceptor(bool accepts = true) : accepts_(accepts) {}
-  bool listenerShouldAcceptNewConnection(const std::shared_ptr<NSXPCConnection> &connection) override {
+  bool listenerShouldAcceptNewConnection(const std::shared_ptr<NSXPCListener> &,
+                                         const std::shared_ptr<NSXPCConnection> &connection) override {
     lastPeer_ = connection->peer().processIdentifier;
     ++asked_;
     if (!accepts_) return false;

@@ -4,6 +4,7 @@ using Cxx = import "/capnp/c++.capnp";
 using Action = import "/platform/fileprovider/xpc/FPDAction.capnp";
 using Enumerator = import "/platform/fileprovider/xpc/NSFileProviderRemoteEnumerator.capnp";
 using Providing = import "/platform/fileprovider/xpc/FPDProviding.capnp";
+using Service = import "/platform/fileprovider/xpc/FPDService.capnp";
 using Values = import "/platform/xpc/Values.capnp";
 $Cxx.namespace("droxa::schema");
 
@@ -24,6 +25,8 @@ interface FPDControlProtocol {
   movingItemAtURL @10 (url :Values.Url, destination :Values.Url)
       -> (requiresProviding :Bool, error :Values.Error);
   performAction @11 (request :Action.FPDActionRequest) -> (action :Action.FPDAction, error :Values.Error);
+  listenerEndpointForServiceName @12 (name :Data, identifier :Data)
+      -> (service :Service.FPDService, error :Values.Error);
 }
 
 interface FPDWatch {

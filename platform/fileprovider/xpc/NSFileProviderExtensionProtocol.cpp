@@ -3,6 +3,7 @@
 #include "platform/fileprovider/NSFileProviderRemote.h"
 #include "platform/fileprovider/xpc/FPDActionAdapter.h"
 #include "platform/fileprovider/xpc/FPDProvidingAdapter.h"
+#include "platform/fileprovider/xpc/FPDServiceAdapter.h"
 #include "platform/fileprovider/xpc/FileProviderInterfaces.h"
 #include "platform/fileprovider/xpc/NSFileProviderExtensionProtocol.capnp.h"
 #include "platform/fileprovider/xpc/RemoteEnumeratorAdapter.h"
@@ -116,6 +117,15 @@ class ExtensionServer final : public Schema::Server {
         });
   }
 
+  kj::Promise<void> listenerEndpointForServiceName(ListenerEndpointForServiceNameContext context) override {
+    const auto params = context.getParams();
+    return exported_.serve(
+        context, [name = xpcString(params.getName()), identifier = xpcString(params.getIdentifier())](
+                     auto &object, auto reply) {
+          object.listenerEndpointForServiceName(name, identifier, reply(xpcWriteService));
+        });
+  }
+
  private:
   Exported<NSFileProviderExtensionProtocol> exported_;
 };
@@ -206,6 +216,17 @@ class ExtensionProxy final : public XPCProxy<Schema, NSFileProviderExtensionProt
         &Client::performActionRequest,
         [request](auto params, Session &) { writeActionRequest(params.initRequest(), request); },
         std::move(completion), xpcReadAction);
+  }
+
+  void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
+                                      FPDServiceCompletion completion) override {
+    call(
+        &Client::listenerEndpointForServiceNameRequest,
+        [name, itemIdentifier](auto params, Session &) {
+          params.setName(xpcBytes(name));
+          params.setIdentifier(xpcBytes(itemIdentifier));
+        },
+        std::move(completion), xpcReadService);
   }
 };
 

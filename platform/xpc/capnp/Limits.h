@@ -13,6 +13,6 @@ inline constexpr std::size_t XPCMaximumUnansweredWords = 8U << 20;  // of calls;
 inline constexpr std::size_t XPCMaximumUnansweredCalls = 16384;
 inline constexpr std::size_t XPCMaximumConcurrentCalls = 64;  // running at once; the others wait
 inline constexpr unsigned XPCMaximumDescriptorsInMessage = 2;
-inline constexpr std::size_t XPCMaximumDescriptorsOfPeer = 64;  // in a connection's whole life
+inline constexpr std::size_t XPCMaximumDescriptorsOfPeer = 64;  // unasked for, in a connection's whole life
 
 }  // namespace droxa

@@ -73,11 +73,13 @@ class XPCProxy : public std::conditional_t<std::is_base_of_v<NSXPCProxyCreating<
   using Client = typename Schema::Client;
 
   // Makes a call. On the loop, `fill(params, session)` writes the request and `decode(results, remote)` gives
-  // the tuple of the completion's arguments, or throws when the reply makes no sense.
-  template <class Params, class Results, class Fill, class Completion, class Decode,
+  // the tuple of the completion's arguments, or throws when the reply makes no sense. The method may be one
+  // of an interface that the schema extends.
+  template <class Called, class Params, class Results, class Fill, class Completion, class Decode,
             class Failure = XPCNoFailure>
-  void call(capnp::Request<Params, Results> (Client::*method)(kj::Maybe<capnp::MessageSize>), Fill fill,
+  void call(capnp::Request<Params, Results> (Called::*method)(kj::Maybe<capnp::MessageSize>), Fill fill,
             Completion completion, Decode decode, XPCCallOptions<Failure> options = {}) const {
+    static_assert(std::is_base_of_v<Called, Client>);
     using Record = TypedCallRecord<Fill, Completion, Failure>;
     auto record =
         std::make_unique<Record>(remote_, std::move(fill), std::move(completion), std::move(options.failure));
@@ -106,19 +108,19 @@ class XPCProxy : public std::conditional_t<std::is_base_of_v<NSXPCProxyCreating<
   }
 
   // A call without a reply: only its failure is told.
-  template <class Params, class Results, class Fill>
-  void tell(capnp::Request<Params, Results> (Client::*method)(kj::Maybe<capnp::MessageSize>),
+  template <class Called, class Params, class Results, class Fill>
+  void tell(capnp::Request<Params, Results> (Called::*method)(kj::Maybe<capnp::MessageSize>),
             Fill fill) const {
     call(
         method, std::move(fill), [] {}, [](auto, const RemoteObject &) { return std::tuple(); });
   }
 
  private:
-  template <class Record, class Params, class Results, class Decode>
+  template <class Called, class Record, class Params, class Results, class Decode>
   static kj::Promise<ReplyBlock> send(
-      capnp::Request<Params, Results> (Client::*method)(kj::Maybe<capnp::MessageSize>), Record &record,
+      capnp::Request<Params, Results> (Called::*method)(kj::Maybe<capnp::MessageSize>), Record &record,
       std::uint64_t number, Decode decode) {
-    Client client = record.remote.template as<Schema>();
+    Called client = record.remote.template as<typename Called::Calls>();
     auto request = (client.*method)(nullptr);
     record.fill(typename Params::Builder(request), *record.remote.session);
     Session &session = *record.remote.session;

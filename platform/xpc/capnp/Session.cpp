@@ -93,6 +93,7 @@ void Session::startOnLoop(std::shared_ptr<XPCConnection> connection, Exporter ex
   stream_ =
       kj::heap<SessionStream>(XPCLoop::shared().io().wrapUnixSocketFd(socket_.release(), flags),
                               XPCMaximumDescriptorsOfPeer, [this](const std::string &why) { drop(why); });
+  stream_->allowDescriptors(lastCall_ * XPCMaximumDescriptorsInMessage);
   // Both ends say that they are the client: it makes each of them ask for the other's object, and nothing
   // else depends on it.
   network_ = kj::heap<capnp::TwoPartyVatNetwork>(*stream_, XPCMaximumDescriptorsInMessage,
@@ -171,6 +172,11 @@ void Session::track(std::uint64_t number, std::optional<std::chrono::millisecond
   }
   tasks_->add(work.catch_([this, number](kj::Exception &&problem) { fail(number, kj::mv(problem)); }));
   watchQueueSoon();
+}
+
+// Calls made before the start count in startOnLoop().
+void Session::allowDescriptors() {
+  if (stream_) stream_->allowDescriptors(XPCMaximumDescriptorsInMessage);
 }
 
 void Session::refuse(std::unique_ptr<CallRecord> record) {

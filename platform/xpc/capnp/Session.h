@@ -61,6 +61,7 @@ class Session final : public std::enable_shared_from_this<Session>,
   template <class Record, class Send>
   void call(std::unique_ptr<Record> record, std::optional<std::chrono::milliseconds> deadline, Send send) {
     if (over_ || isEnding_) return refuse(std::move(record));
+    allowDescriptors();
     const std::uint64_t number = ++lastCall_;
     Record &kept = *record;
     calls_.emplace(number, std::move(record));
@@ -89,6 +90,7 @@ class Session final : public std::enable_shared_from_this<Session>,
   Session(int socket, std::int32_t peer);
   void prepare();
   void startOnLoop(std::shared_ptr<XPCConnection> connection, Exporter exporter);
+  void allowDescriptors();
   void drop(const std::string &why);  // ends the session because of what the peer did, and logs it
   void endWhenWritten();
   void endOnLoop(bool byPeer);
@@ -117,7 +119,7 @@ class Session final : public std::enable_shared_from_this<Session>,
   kj::Own<kj::TaskSet> tasks_;
   std::unordered_map<std::uint64_t, std::unique_ptr<CallRecord>> calls_;
   std::unordered_map<std::uint64_t, UnansweredCall *> unanswered_;
-  std::uint64_t lastCall_ = 0;
+  std::uint64_t lastCall_ = 0;  // how many there were
   std::uint64_t lastUnanswered_ = 0;
   bool isEnding_ = false;  // by this side's wish; over as soon as what waits is written
   kj::TimePoint writingEnds_ = kj::origin<kj::TimePoint>();

@@ -14,6 +14,9 @@ class SessionStream final : public kj::AsyncCapabilityStream {
   SessionStream(kj::Own<kj::AsyncCapabilityStream> inner, std::size_t maximumDescriptors,
                 kj::Function<void(const std::string &why)> gaveUp);
 
+  // This side has made a call: its reply may bring as many descriptors as a message can.
+  void allowDescriptors(std::size_t count) { maximumDescriptors_ += count; }
+
   // What follows is this side's own doing: nothing more is written, and nobody is told.
   void closing() { ended_ = isClosing_ = true; }
 
@@ -41,7 +44,7 @@ class SessionStream final : public kj::AsyncCapabilityStream {
   kj::Promise<void> noted(kj::Promise<void> writing);
 
   kj::Own<kj::AsyncCapabilityStream> inner_;
-  const std::size_t maximumDescriptors_;
+  std::size_t maximumDescriptors_;
   kj::Function<void(const std::string &)> gaveUp_;
   std::size_t descriptors_ = 0;
   bool ended_ = false;

@@ -39,19 +39,31 @@ bool crosses(const NSUserInfoValue &value, unsigned depth) {
   return true;
 }
 
+using UserInfoList = capnp::List<schema::Error::UserInfo>;
+
+unsigned sizeAtDepth(const NSUserInfo &userInfo, unsigned depth) {
+  unsigned size = 0;
+  for (const auto &entry : userInfo)
+    if (crosses(entry.second, depth) && size < MaximumUserInfoEntries) ++size;
+  return size;
+}
+
+// `list` has the size that sizeAtDepth() gives.
+void writeUserInfoAtDepth(UserInfoList::Builder list, const NSUserInfo &userInfo, unsigned depth) {
+  unsigned index = 0;
+  for (const auto &[key, value] : userInfo) {
+    if (!crosses(value, depth) || index == list.size()) continue;
+    auto entry = list[index++];
+    entry.setKey(xpcBytes(key));
+    std::visit(UserInfoWriter{entry, depth}, value);
+  }
+}
+
 void writeErrorAtDepth(schema::Error::Builder builder, const NSError &error, unsigned depth) {
   builder.setDomain(xpcBytes(error.domain()));
   builder.setCode(error.code());
-  std::vector<const NSUserInfo::value_type *> entries;
-  for (const auto &entry : error.userInfo()) {
-    if (crosses(entry.second, depth) && entries.size() < MaximumUserInfoEntries) entries.push_back(&entry);
-  }
-  if (entries.empty()) return;
-  auto list = builder.initUserInfo(xpcCount(entries));
-  for (unsigned index = 0; index < list.size(); ++index) {
-    list[index].setKey(xpcBytes(entries[index]->first));
-    std::visit(UserInfoWriter{list[index], depth}, entries[index]->second);
-  }
+  const unsigned size = sizeAtDepth(error.userInfo(), depth);
+  if (size != 0) writeUserInfoAtDepth(builder.initUserInfo(size), error.userInfo(), depth);
 }
 
 NSUserInfoValue readValue(schema::Error::UserInfo::Reader entry, unsigned depth) {
@@ -74,12 +86,16 @@ NSUserInfoValue readValue(schema::Error::UserInfo::Reader entry, unsigned depth)
   KJ_FAIL_REQUIRE("an error's user info of an unknown kind");
 }
 
+NSUserInfo readUserInfoAtDepth(UserInfoList::Reader list, unsigned depth) {
+  KJ_REQUIRE(list.size() <= MaximumUserInfoEntries, "a user info is too long");
+  NSUserInfo info;
+  for (const auto entry : list) info[xpcString(entry.getKey())] = readValue(entry, depth);
+  return info;
+}
+
 NSError readErrorAtDepth(schema::Error::Reader reader, unsigned depth) {
   KJ_REQUIRE(depth < MaximumErrorDepth, "an error with too many errors beneath");
-  KJ_REQUIRE(reader.getUserInfo().size() <= MaximumUserInfoEntries, "an error's user info is too long");
-  NSUserInfo info;
-  for (const auto entry : reader.getUserInfo()) info[xpcString(entry.getKey())] = readValue(entry, depth);
-  return {xpcString(reader.getDomain()), reader.getCode(), std::move(info)};
+  return {xpcString(reader.getDomain()), reader.getCode(), readUserInfoAtDepth(reader.getUserInfo(), depth)};
 }
 
 NSDate dateIf(bool exists, std::int64_t nanoseconds) {
@@ -110,6 +126,18 @@ void writeError(schema::Error::Builder builder, const NSError &error) {
 
 NSError readError(schema::Error::Reader reader) {
   return readErrorAtDepth(reader, 0);
+}
+
+unsigned userInfoSize(const NSUserInfo &userInfo) {
+  return sizeAtDepth(userInfo, 0);
+}
+
+void writeUserInfo(UserInfoList::Builder list, const NSUserInfo &userInfo) {
+  writeUserInfoAtDepth(list, userInfo, 0);
+}
+
+NSUserInfo readUserInfo(UserInfoList::Reader list) {
+  return readUserInfoAtDepth(list, 0);
 }
 
 void writeItem(schema::Item::Builder builder, const NSFileProviderItemFields &fields) {

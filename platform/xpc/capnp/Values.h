@@ -36,6 +36,10 @@ NSURL readURL(schema::Url::Reader reader);
 // Underlying errors beyond a depth, and entries beyond a number, are left out.
 void writeError(schema::Error::Builder builder, const NSError &error);
 NSError readError(schema::Error::Reader reader);
+// Beyond a number of entries, the others are left out; what makes no sense, or too deep errors, are refused.
+unsigned userInfoSize(const NSUserInfo &userInfo);
+void writeUserInfo(capnp::List<schema::Error::UserInfo>::Builder list, const NSUserInfo &userInfo);
+NSUserInfo readUserInfo(capnp::List<schema::Error::UserInfo>::Reader list);
 void writeItem(schema::Item::Builder builder, const NSFileProviderItemFields &fields);
 NSFileProviderItemFields readItem(schema::Item::Reader reader);
 

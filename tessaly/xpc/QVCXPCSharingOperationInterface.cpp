@@ -1,0 +1,26 @@
+#include "tessaly/xpc/QVCXPCSharingOperationInterface.h"
+
+#include "platform/xpc/capnp/Interface.h"
+#include "tessaly/xpc/QVShareOperationCalls.h"
+#include "tessaly/xpc/QVShareOperationServer.h"
+
+namespace droxa {
+namespace {
+
+class ShareOperationProxy final
+    : public QVShareOperationCalls<schema::QVShareOperationProtocol, QVShareOperationProtocol,
+                                   ShareOperationProxy> {
+ public:
+  using QVShareOperationCalls::QVShareOperationCalls;
+};
+
+}  // namespace
+
+const NSXPCInterface &QVCXPCSharingOperationInterface() {
+  static const auto interface =
+      makeXPCInterface<QVShareOperationProtocol, QVShareOperationServer, ShareOperationProxy>(
+          "QVShareOperationProtocol");
+  return interface;
+}
+
+}  // namespace droxa

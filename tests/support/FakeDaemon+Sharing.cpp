@@ -1,0 +1,149 @@
+// The sharing operations: each is recorded with its arguments, keeps the operation that came along, and is
+// answered with what the test put into sharing(), next to the failure that the test asked for.
+
+#include <utility>
+
+#include "tests/support/FakeDaemon.h"
+
+namespace droxa {
+namespace {
+
+template <class Value>
+std::string told(const Value &value) {
+  if constexpr (std::is_same_v<Value, bool>) {
+    return value ? "yes" : "no";
+  } else if constexpr (std::is_integral_v<Value>) {
+    return std::to_string(value);
+  } else {
+    return LogDescription(value);
+  }
+}
+
+template <class... Values>
+std::string list(const Values &...values) {
+  std::string text;
+  ((text += (text.empty() ? "" : ", ") + told(values)), ...);
+  return text;
+}
+
+}  // namespace
+
+void FakeDaemon::startOperation_toCopySharingInfoAtURL(std::shared_ptr<QVOperationClient> op,
+                                                       const NSURL &url, QVShareAndURLReply reply) {
+  const NSError error = begin("startOperation_toCopySharingInfoAtURL", list(url));
+  sharing_->keepOperation(std::move(op));
+  const FakeSharing::Answers answers = sharing_->answers();
+  replies_->give("startOperation_toCopySharingInfoAtURL",
+                 [=, reply = std::move(reply)] { reply(answers.share, answers.url, error); });
+}
+
+void FakeDaemon::startOperation_toCopyShareURLForShare(std::shared_ptr<QVOperationClient> op,
+                                                       const std::optional<CKShare> &share,
+                                                       const std::optional<std::string> &appName,
+                                                       QVShareAndURLReply reply) {
+  const NSError error = begin("startOperation_toCopyShareURLForShare", list(share, appName));
+  sharing_->keepOperation(std::move(op));
+  sharing_->keepShare(share);
+  const FakeSharing::Answers answers = sharing_->answers();
+  replies_->give("startOperation_toCopyShareURLForShare",
+                 [=, reply = std::move(reply)] { reply(answers.share, answers.url, error); });
+}
+
+void FakeDaemon::startOperation_toSaveSharingInfo(std::shared_ptr<QVOperationClient> op,
+                                                  const std::optional<CKShare> &share, QVShareReply reply) {
+  const NSError error = begin("startOperation_toSaveSharingInfo", list(share));
+  sharing_->keepOperation(std::move(op));
+  sharing_->keepShare(share);
+  const FakeSharing::Answers answers = sharing_->answers();
+  replies_->give("startOperation_toSaveSharingInfo",
+                 [=, reply = std::move(reply)] { reply(answers.share, error); });
+}
+
+void FakeDaemon::createSharingInfoForURL(const NSURL &url, QVShareReply reply) {
+  const NSError error = begin("createSharingInfoForURL", list(url));
+  const FakeSharing::Answers answers = sharing_->answers();
+  replies_->give("createSharingInfoForURL", [=, reply = std::move(reply)] { reply(answers.share, error); });
+}
+
+void FakeDaemon::startOperation_toUnshareShare(std::shared_ptr<QVOperationClient> op,
+                                               const std::optional<CKShare> &share, bool forceDelete,
+                                               QVShareOutcomeReply reply) {
+  const NSError error = begin("startOperation_toUnshareShare", list(share, forceDelete));
+  sharing_->keepOperation(std::move(op));
+  sharing_->keepShare(share);
+  replies_->give("startOperation_toUnshareShare", [=, reply = std::move(reply)] { reply(error); });
+}
+
+void FakeDaemon::startOperation_toModifyRecordAccessAtURL(std::shared_ptr<QVOperationClient> op,
+                                                          const NSURL &url, bool allowAccess,
+                                                          QVRecordAccessReply reply) {
+  const NSError error = begin("startOperation_toModifyRecordAccessAtURL", list(url, allowAccess));
+  sharing_->keepOperation(std::move(op));
+  const FakeSharing::Answers answers = sharing_->answers();
+  replies_->give("startOperation_toModifyRecordAccessAtURL",
+                 [=, reply = std::move(reply)] { reply(answers.data, answers.first, error); });
+}
+
+void FakeDaemon::startOperation_toCopyParticipantTokenAtURL(std::shared_ptr<QVOperationClient> op,
+                                                            const NSURL &url, QVParticipantTokenReply reply) {
+  const NSError error = begin("startOperation_toCopyParticipantTokenAtURL", list(url));
+  sharing_->keepOperation(std::move(op));
+  const FakeSharing::Answers answers = sharing_->answers();
+  replies_->give("startOperation_toCopyParticipantTokenAtURL",
+                 [=, reply = std::move(reply)] { reply(answers.first, answers.second, error); });
+}
+
+void FakeDaemon::startOperation_toPrepFolderForSharingAt(std::shared_ptr<QVOperationClient> op,
+                                                         const NSURL &url, QVShareOutcomeReply reply) {
+  const NSError error = begin("startOperation_toPrepFolderForSharingAt", list(url));
+  sharing_->keepOperation(std::move(op));
+  replies_->give("startOperation_toPrepFolderForSharingAt", [=, reply = std::move(reply)] { reply(error); });
+}
+
+void FakeDaemon::copyCurrentUserNameAndDisplayHandleWithReply(QVCurrentUserReply reply) {
+  const NSError error = begin("copyCurrentUserNameAndDisplayHandleWithReply", list());
+  const FakeSharing::Answers answers = sharing_->answers();
+  replies_->give("copyCurrentUserNameAndDisplayHandleWithReply", [=, reply = std::move(reply)] {
+    reply(answers.name, answers.first, answers.second, answers.third, error);
+  });
+}
+
+void FakeDaemon::startOperation_toProcessSubitemsAtURL(std::shared_ptr<QVOperationClient> op,
+                                                       const NSURL &url, std::uint64_t maxSubsharesFailures,
+                                                       std::uint64_t processType, QVShareOutcomeReply reply) {
+  const NSError error =
+      begin("startOperation_toProcessSubitemsAtURL", list(url, maxSubsharesFailures, processType));
+  sharing_->keepOperation(std::move(op));
+  replies_->give("startOperation_toProcessSubitemsAtURL", [=, reply = std::move(reply)] { reply(error); });
+}
+
+void FakeDaemon::startOperation_toLookupShareParticipants(std::shared_ptr<QVOperationClient> op,
+                                                          const QVShareParticipants &participants,
+                                                          QVParticipantsReply reply) {
+  const NSError error = begin("startOperation_toLookupShareParticipants", list(participants));
+  sharing_->keepOperation(std::move(op));
+  const FakeSharing::Answers answers = sharing_->answers();
+  replies_->give("startOperation_toLookupShareParticipants",
+                 [=, reply = std::move(reply)] { reply(answers.participants, error); });
+}
+
+void FakeDaemon::startOperation_toCopyDocumentURLForRecordID(std::shared_ptr<QVOperationClient> op,
+                                                             const std::optional<CKRecordID> &recordID,
+                                                             bool syncIfNeeded, QVSandboxingURLReply reply) {
+  const NSError error = begin("startOperation_toCopyDocumentURLForRecordID", list(recordID, syncIfNeeded));
+  sharing_->keepOperation(std::move(op));
+  const FakeSharing::Answers answers = sharing_->answers();
+  replies_->give("startOperation_toCopyDocumentURLForRecordID",
+                 [=, reply = std::move(reply)] { reply(answers.urlWrapper, error); });
+}
+
+void FakeDaemon::checkIfItemIsShareableWithInode(std::uint64_t inode, QVBoolReply reply) {
+  NSError error = begin("checkIfItemIsShareableWithInode", list(inode));
+  const FakeSharing::Answers answers = sharing_->answers();
+  const bool isShareable = !error && answers.isShareable;
+  if (!error && !isShareable) error = answers.notShareable;
+  replies_->give("checkIfItemIsShareableWithInode",
+                 [=, reply = std::move(reply)] { reply(isShareable, error); });
+}
+
+}  // namespace droxa
