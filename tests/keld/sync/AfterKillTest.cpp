@@ -48,6 +48,37 @@ TEST_F(AfterKill, whatTheTableDoesNotSayIsWorkedOutAnew) {
       eventually([&] { return ben.keld.record("notes.txt")->flags == (kDatalessFlag | kUploadedFlag); }));
 }
 
+TEST_F(AfterKill, anEvictionThatWasCutShortIsEnded) {
+  share("notes.txt", "hello");
+  const std::string path = ben.keld.at("notes.txt");
+  for (const bool isMarkedOnly : {false, true}) {
+    ASSERT_EQ(ben.contents("notes.txt"), "hello");
+    ASSERT_FALSE(ben.evict("notes.txt"));
+    ben.keld.stop();
+    std::string mark(1000, '\0');
+    const ssize_t length = ::getxattr(path.c_str(), kMarkerAttribute, mark.data(), mark.size());
+    ASSERT_GT(length, 0);
+    mark.resize(static_cast<std::size_t>(length));
+    if (isMarkedOnly) mark.replace(mark.find(" d "), 3, " e ");
+    ASSERT_EQ(::setxattr(path.c_str(), kMarkerAttribute, mark.data(), mark.size(), 0), 0);
+    change(ben, "keld.sqlite",
+           ("UPDATE items SET flags = " + std::to_string(kUploadedFlag) +
+            " WHERE name = CAST('notes.txt' AS BLOB)")
+               .c_str());
+    change(
+        ben, "sync.sqlite",
+        "UPDATE rows SET dataless = 0, localChanged = 1; UPDATE meta SET value = 0 WHERE key = 'endedWell'");
+    ben.keld.start();
+    ben.keld.waitForFirstScan();
+    EXPECT_TRUE(eventually([&] {
+      return ben.keld.record("notes.txt")->flags == (kDatalessFlag | kUploadedFlag);
+    })) << isMarkedOnly;
+    EXPECT_TRUE(ben.isDataless("notes.txt"));
+  }
+  EXPECT_EQ(ben.contents("notes.txt"), "hello");
+  EXPECT_EQ(anna.read("notes.txt"), "hello");
+}
+
 TEST_F(AfterKill, aSecondNameIsWrittenDownBeforeItIsGiven) {
   share("notes.txt", "hello");
   ASSERT_EQ(ben.contents("notes.txt"), "hello");
