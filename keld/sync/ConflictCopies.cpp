@@ -14,6 +14,8 @@ namespace droxa::keld {
 
 namespace {
 constexpr unsigned kMostNumbers = 10000;
+// What nameAside() has begun: the item, its inode and the new name.
+constexpr char kAsideItem[] = "asideItem", kAsideInode[] = "asideInode", kAsideName[] = "asideName";
 }  // namespace
 
 // A document of its own doesn't bear another one's mark.
@@ -50,6 +52,13 @@ NSError ConflictCopies::nameAside(const FileLocation &location, std::string *new
   const int folder = location.folder.get();
   for (unsigned number = 1; number < kMostNumbers; ++number) {
     *newName = ConflictName(location.name, context_.device, now, number);
+    if (::faccessat(folder, newName->c_str(), F_OK, AT_SYMLINK_NOFOLLOW) == 0) continue;
+    const auto facts = ReadFileFacts(folder, location.name, 0);
+    context_.store.transaction([&] {
+      context_.store.setNumber(kAsideItem, location.item.id);
+      context_.store.setNumber(kAsideInode, facts ? facts->inode : 0);
+      context_.store.setText(kAsideName, *newName);
+    });
     if (::linkat(folder, location.name.c_str(), folder, newName->c_str(), 0) == 0) return NSError();
     if (errno != EEXIST) break;
   }
@@ -62,6 +71,24 @@ void ConflictCopies::nameAsideOver(const FileLocation &location, const std::stri
     becomeOwnDocument(location, newName);
   else
     ::unlinkat(location.folder.get(), newName.c_str(), 0);
+  context_.store.setNumber(kAsideItem, 0);
+}
+
+void ConflictCopies::undoNameAside(bool isLast) {
+  const ItemNumber item = context_.store.number(kAsideItem);
+  if (item == 0) return;
+  const std::uint64_t inode = context_.store.number(kAsideInode);
+  const std::string name = context_.store.text(kAsideName);
+  const auto location = context_.files.locate(item, nullptr);
+  const auto own = location ? ReadFileFacts(location->folder.get(), location->name, 0) : std::nullopt;
+  const auto other = location ? ReadFileFacts(location->folder.get(), name, 0) : std::nullopt;
+  const bool isLeftBehind =
+      own && other && location->name != name && own->inode == inode && other->inode == inode && inode != 0;
+  if (isLeftBehind && ::unlinkat(location->folder.get(), name.c_str(), 0) == 0) {
+    const std::string folder = location->path.substr(0, location->path.size() - location->name.size());
+    context_.states.lookAt({location->path, folder + name});
+  }
+  if (own || isLast) context_.store.setNumber(kAsideItem, 0);
 }
 
 void ConflictCopies::placeRescuedFiles() {

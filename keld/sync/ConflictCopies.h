@@ -22,6 +22,9 @@ class ConflictCopies {
   // The file has that name alone now, and is a document of its own; or, when that wasn't to be, its own
   // again.
   void nameAsideOver(const FileLocation &location, const std::string &newName, bool hasHappened);
+  // A process that ended between the two has left both names, which are one file: the new one goes. To be
+  // asked when the sync begins, and once more, `isLast`, when the whole replica was seen.
+  void undoNameAside(bool isLast);
   // Finds places for what interrupted exchanges left in the storage.
   void placeRescuedFiles();
   std::uint64_t made() const { return made_; }

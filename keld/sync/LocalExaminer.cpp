@@ -219,7 +219,10 @@ bool LocalExaminer::isClean(const ItemRecord &item, SyncRow &row, const std::str
 // what materialising and evicting leave behind.
 bool LocalExaminer::hasSyncedContents(const ItemRecord &item, SyncRow &row) {
   const LocalFile file = LocalFileOf(item.facts);
-  if (IsSameContents(file, row.local)) return true;
+  if (IsSameContents(file, row.local)) {
+    if (!row.isDataless && file.changed != row.local.changed) noticeEviction(item, row);
+    return true;
+  }
   const auto location = files_.locate(item.id, nullptr);
   if (!location) return false;
   const DocumentLook look = storage_.classify(location->folder.get(), location->name);
@@ -231,6 +234,25 @@ bool LocalExaminer::hasSyncedContents(const ItemRecord &item, SyncRow &row) {
   row.isDataless = look.kind == DocumentClass::dataless;
   store_.put(row);
   return true;
+}
+
+// An eviction keeps the file and its dates. Where the process ended in the middle of one, the mark alone
+// tells.
+void LocalExaminer::noticeEviction(const ItemRecord &item, SyncRow &row) {
+  const auto location = files_.locate(item.id, nullptr);
+  if (!location) return;
+  DocumentLook look = storage_.classify(location->folder.get(), location->name);
+  if (look.kind == DocumentClass::evicting &&
+      storage_.finishEviction(location->folder.get(), location->name).isDone())
+    look = storage_.classify(location->folder.get(), location->name);
+  const bool isIts = look.marker && look.marker->recordName == row.record &&
+                     look.marker->digest == row.content.digest &&
+                     IsSameContents(LocalFileOf(look.facts), row.local);
+  const bool isDataless = look.kind == DocumentClass::dataless;
+  if (!isIts || (!isDataless && look.kind != DocumentClass::present)) return;
+  row.local = LocalFileOf(look.facts);
+  row.isDataless = isDataless;
+  store_.put(row);
 }
 
 // --- Files that stand for records already.

@@ -73,6 +73,7 @@ class LocalExaminer {
   bool isAllowed(ItemNumber item);
   bool bindLink(const ItemRecord &item, SyncRow row);
   bool hasSyncedContents(const ItemRecord &item, SyncRow &row);
+  void noticeEviction(const ItemRecord &item, SyncRow &row);
   std::optional<SyncRow> findUnmarked(const ItemRecord &item, const std::string &parent);
   void guardAgainstSpree(const std::vector<Change> &changes);
   std::uint64_t recentDeaths(std::uint64_t more);

@@ -29,6 +29,11 @@ CKCallContext SyncEngine::call(std::chrono::milliseconds timeout) const {
 }
 
 void SyncEngine::run() {
+  try {
+    conflicts_.undoNameAside(false);
+  } catch (const SqlError &error) {
+    os_log_fault(qvc_default_log(), "[CRIT] the sync's database failed: %s", error.what());
+  }
   conflicts_.placeRescuedFiles();
   for (;;) {
     {
@@ -99,6 +104,7 @@ void SyncEngine::send() {
 // is held because of a replaced folder is all there is.
 void SyncEngine::afterFirstScan() {
   hasSeenReplica_ = true;
+  conflicts_.undoNameAside(true);
   applier_.replicaWasSeen();
   for (const SyncRow &row : store_.datalessRows())
     if (isPinnedOrBelowPin(row.item)) downloads_->fetchInBackground(row.item, row.content.size);

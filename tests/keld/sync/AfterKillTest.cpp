@@ -1,5 +1,6 @@
 // What a kill leaves behind, made by hand: the files, the databases and the cloud as they are then.
 
+#include <sys/stat.h>
 #include <sys/xattr.h>
 
 #include "keld/Sql.h"
@@ -45,6 +46,107 @@ TEST_F(AfterKill, whatTheTableDoesNotSayIsWorkedOutAnew) {
   ben.keld.waitForFirstScan();
   EXPECT_TRUE(
       eventually([&] { return ben.keld.record("notes.txt")->flags == (kDatalessFlag | kUploadedFlag); }));
+}
+
+TEST_F(AfterKill, anEvictionThatWasCutShortIsEnded) {
+  share("notes.txt", "hello");
+  const std::string path = ben.keld.at("notes.txt");
+  for (const bool isMarkedOnly : {false, true}) {
+    ASSERT_EQ(ben.contents("notes.txt"), "hello");
+    ASSERT_FALSE(ben.evict("notes.txt"));
+    ben.keld.stop();
+    std::string mark(1000, '\0');
+    const ssize_t length = ::getxattr(path.c_str(), kMarkerAttribute, mark.data(), mark.size());
+    ASSERT_GT(length, 0);
+    mark.resize(static_cast<std::size_t>(length));
+    if (isMarkedOnly) mark.replace(mark.find(" d "), 3, " e ");
+    ASSERT_EQ(::setxattr(path.c_str(), kMarkerAttribute, mark.data(), mark.size(), 0), 0);
+    change(ben, "keld.sqlite",
+           ("UPDATE items SET flags = " + std::to_string(kUploadedFlag) +
+            " WHERE name = CAST('notes.txt' AS BLOB)")
+               .c_str());
+    change(
+        ben, "sync.sqlite",
+        "UPDATE rows SET dataless = 0, localChanged = 1; UPDATE meta SET value = 0 WHERE key = 'endedWell'");
+    ben.keld.start();
+    ben.keld.waitForFirstScan();
+    EXPECT_TRUE(eventually([&] {
+      return ben.keld.record("notes.txt")->flags == (kDatalessFlag | kUploadedFlag);
+    })) << isMarkedOnly;
+    EXPECT_TRUE(ben.isDataless("notes.txt"));
+  }
+  EXPECT_EQ(ben.contents("notes.txt"), "hello");
+  EXPECT_EQ(anna.read("notes.txt"), "hello");
+}
+
+TEST_F(AfterKill, aSecondNameIsWrittenDownBeforeItIsGiven) {
+  share("notes.txt", "hello");
+  ASSERT_EQ(ben.contents("notes.txt"), "hello");
+  ben.keld.stop();
+  change(ben, "sync.sqlite",
+         "CREATE TABLE noted(name); CREATE TRIGGER notes AFTER INSERT ON meta WHEN NEW.key = 'asideName'"
+         " BEGIN INSERT INTO noted VALUES (CAST(NEW.value AS TEXT)); END");
+  anna.keld.write("notes.txt", "written by anna");
+  ASSERT_FALSE(anna.waitForUploads());
+  ben.keld.write("notes.txt", "and by ben");
+  ben.keld.start();
+  ASSERT_TRUE(
+      eventually([&] { return ben.names().size() == 2 && ben.read("notes.txt") == "written by anna"; }));
+  ASSERT_FALSE(ben.waitForUploads());
+  ben.keld.stop();
+  SqlDatabase opened(DroxaHome(ben.keld.home().root()).state() + "/sync.sqlite",
+                     SqlDatabase::Access::readWrite, 100);
+  EXPECT_EQ(opened.integer(("SELECT count(*) FROM noted WHERE name = '" + ben.names().front() + "'").c_str()),
+            1)
+      << ben.names().front();
+  EXPECT_EQ(opened.integer("SELECT value FROM meta WHERE key = 'asideItem'"), 0) << "it is over";
+}
+
+// Ben's daemon ends while it gives a document that both changed a second name.
+class WhileNamingAside : public AfterKill {
+ protected:
+  static constexpr char kCopy[] = "notes (conflict, ben 2026-11-21).txt";
+  void SetUp() override {
+    share("notes.txt", "hello");
+    ASSERT_EQ(ben.contents("notes.txt"), "hello");
+    ben.keld.stop();
+    struct stat status = {};
+    ASSERT_EQ(::stat(ben.keld.at("notes.txt").c_str(), &status), 0);
+    std::filesystem::create_hard_link(ben.keld.at("notes.txt"), ben.keld.at(kCopy));
+    const std::string note =
+        "INSERT OR REPLACE INTO meta VALUES ('asideItem', (SELECT item FROM rows)), ('asideInode', " +
+        std::to_string(status.st_ino) + "), ('asideName', CAST('" + kCopy + "' AS BLOB))";
+    change(ben, "sync.sqlite", note.c_str());
+  }
+  void expectNames(const std::vector<std::string> &names) {
+    ben.keld.start();
+    ben.keld.waitForFirstScan();
+    EXPECT_TRUE(eventually([&] { return ben.names() == names; })) << testing::PrintToString(ben.names());
+    const NSError error = ben.waitForUploads();
+    EXPECT_FALSE(error) << error.description();
+    EXPECT_TRUE(eventually([&] { return anna.names() == names; })) << testing::PrintToString(anna.names());
+    EXPECT_EQ(ben.names(), names);
+    EXPECT_EQ(ben.read("notes.txt"), "hello");
+  }
+};
+
+TEST_F(WhileNamingAside, theSecondNameGoes) {
+  expectNames({"notes.txt"});
+}
+
+TEST_F(WhileNamingAside, whatAPersonHasPutThereSinceStays) {
+  std::filesystem::remove(ben.keld.at(kCopy));
+  ben.keld.write(kCopy, "of a person");
+  expectNames({kCopy, "notes.txt"});
+  EXPECT_EQ(ben.read(kCopy), "of a person");
+}
+
+TEST_F(WhileNamingAside, theSecondNameStaysWhereItIsTheOnlyOne) {
+  std::filesystem::remove(ben.keld.at("notes.txt"));
+  ben.keld.start();
+  ben.keld.waitForFirstScan();
+  (void)ben.waitForUploads();
+  EXPECT_EQ(ben.read(kCopy), "hello");
 }
 
 // Ben's device makes what the cloud tells of, and never gets to write down that it did.
