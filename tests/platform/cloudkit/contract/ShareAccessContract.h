@@ -193,6 +193,14 @@ TYPED_TEST_P(CloudShareAccess, theMostPermissiveOfSeveralSharesCounts) {
   EXPECT_CODE(this->bobSaves(child("new 3", "sub")), permissionFailure);
 }
 
+TYPED_TEST_P(CloudShareAccess, aRecordStaysInEveryShareThatItsMoverSees) {
+  this->shareFolderWithBob();
+  const CKShare other = saveShare(*this->alice, shareOf("outside", {named("bob")}));
+  EXPECT_OK(this->bob->acceptShare(other.URL, patiently()).error);
+  EXPECT_CODE(this->bobMoves("a", "outside"), permissionFailure);
+  EXPECT_OK(this->bobMoves("a", "sub"));
+}
+
 TYPED_TEST_P(CloudShareAccess, theZonesOwnerPaysForAllThatIsInIt) {
   this->shareFolderWithBob();
   this->world.setQuotaOf("alice", 10);
@@ -227,13 +235,16 @@ TYPED_TEST_P(CloudShareAccess, participantsWriteFromTheirOwnProcesses) {
   EXPECT_EQ(changes(*this->alice).changedRecords.size(), 6U + 2 * kCount);
 }
 
-REGISTER_TYPED_TEST_SUITE_P(
-    CloudShareAccess, whoIsNoParticipantSeesNothingByAnyCall, knowingWhatContentsAreCalledGivesNoneOfThem,
-    aParticipantSeesTheSharedHierarchyAndNothingElseOfTheZone, aPendingParticipantSeesNothing,
-    whoMayWriteChangesMakesMovesAndDeletesWithinTheShare, aFolderAndItsDocumentsAreMadeAndDeletedInOneCall,
-    whoMayReadOnlyWritesNothing, aParticipantTakesNothingOutOfTheShare,
-    aParticipantBringsNothingInFromElsewhere, aRecordCantBeMadeUnderTheNameThatOthersHangFrom,
-    aParticipantsRecordRefersOnlyToContentsThatItMaySee, theMostPermissiveOfSeveralSharesCounts,
-    theZonesOwnerPaysForAllThatIsInIt, participantsWriteFromTheirOwnProcesses);
+REGISTER_TYPED_TEST_SUITE_P(CloudShareAccess, whoIsNoParticipantSeesNothingByAnyCall,
+                            knowingWhatContentsAreCalledGivesNoneOfThem,
+                            aParticipantSeesTheSharedHierarchyAndNothingElseOfTheZone,
+                            aPendingParticipantSeesNothing,
+                            whoMayWriteChangesMakesMovesAndDeletesWithinTheShare,
+                            aFolderAndItsDocumentsAreMadeAndDeletedInOneCall, whoMayReadOnlyWritesNothing,
+                            aParticipantTakesNothingOutOfTheShare, aParticipantBringsNothingInFromElsewhere,
+                            aRecordCantBeMadeUnderTheNameThatOthersHangFrom,
+                            aParticipantsRecordRefersOnlyToContentsThatItMaySee,
+                            theMostPermissiveOfSeveralSharesCounts, aRecordStaysInEveryShareThatItsMoverSees,
+                            theZonesOwnerPaysForAllThatIsInIt, participantsWriteFromTheirOwnProcesses);
 
 }  // namespace droxa::contract
