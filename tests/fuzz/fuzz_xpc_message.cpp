@@ -13,8 +13,8 @@
 #include <vector>
 
 #include "platform/fileprovider/NSFileProviderRemote.h"
-#include "platform/foundation/NSFileManager.h"
 #include "platform/fileprovider/xpc/FileProviderInterfaces.h"
+#include "platform/foundation/NSFileManager.h"
 #include "platform/oslog/os_log.h"
 #include "platform/xpc/NSXPCConnection.h"
 
