@@ -360,12 +360,18 @@ QVMove ContentsService::describeMove(const ItemRecord &item, const NSURL &destin
   move.isOfContainer = item.zone() == Zone::structure;
   move.isOfAlias = item.facts.kind == NSFileProviderItemKind::alias;
   move.isOfFolder = item.isFolder();
-  move.isDataless = !documentsBelow(item, [](const ItemRecord &document) {
-                       return (document.flags & kDatalessFlag) != 0;
-                     }).empty();
+  // Looks at everything below, so only where it makes a difference.
+  const auto hasDataless = [&] {
+    return !documentsBelow(item, [](const ItemRecord &document) {
+              return (document.flags & kDatalessFlag) != 0;
+            }).empty();
+  };
   move.leavesDrive = !target;
   move.isToReadOnlyPlace = ::access(targetFolder.c_str(), W_OK) != 0;
-  if (!target) return move;
+  if (!target) {
+    move.isDataless = hasDataless();
+    return move;
+  }
   move.isIntoItself = item.isFolder() && target->compare(0, source.size() + 1, source + "/") == 0;
   move.leavesContainer = container(*target) != container(source);
   move.isIntoTrash = container(*target) == QVUbiquitousTrashContainerID;
