@@ -10,6 +10,7 @@
 #include <unistd.h>
 
 #include "platform/cloudkit/CKDigest.h"
+#include "platform/cloudkit/CKShare.h"
 #include "tessaly/QVContainer.h"
 #include "tessaly/QVLog.h"
 
@@ -94,6 +95,7 @@ NSError CloudApplier::fetchPages(const CKCallContext &call) {
 NSError CloudApplier::applyPage(const CKZoneChanges &page) {
   std::vector<DocumentRecord> documents;
   for (const CKRecord &record : page.changedRecords) {
+    if (record.recordType == CKRecordTypeShare) continue;  // is no item
     // One that makes no sense isn't one that was deleted.
     if (fetchesAll_) seen_.insert(record.recordID.recordName);
     auto document = ReadRecord(record);

@@ -98,6 +98,47 @@ class ScriptedDaemon final : public QVDaemonConnection {
     void getMoveCapability(const NSURL &, const NSURL &, QVMoveCapabilityReply) override { unexpected(); }
     void allowDeletionAtURL(const NSURL &, QVContentsErrorReply) override { unexpected(); }
     void confirmDeletions(bool, QVContentsErrorReply) override { unexpected(); }
+    void startOperation_toCopySharingInfoAtURL(Operation, const NSURL &, QVShareAndURLReply) override {
+      unexpected();
+    }
+    void startOperation_toCopyShareURLForShare(Operation, const std::optional<CKShare> &,
+                                               const std::optional<std::string> &,
+                                               QVShareAndURLReply) override {
+      unexpected();
+    }
+    void startOperation_toSaveSharingInfo(Operation, const std::optional<CKShare> &, QVShareReply) override {
+      unexpected();
+    }
+    void createSharingInfoForURL(const NSURL &, QVShareReply) override { unexpected(); }
+    void startOperation_toUnshareShare(Operation, const std::optional<CKShare> &, bool,
+                                       QVShareOutcomeReply) override {
+      unexpected();
+    }
+    void startOperation_toModifyRecordAccessAtURL(Operation, const NSURL &, bool,
+                                                  QVRecordAccessReply) override {
+      unexpected();
+    }
+    void startOperation_toCopyParticipantTokenAtURL(Operation, const NSURL &,
+                                                    QVParticipantTokenReply) override {
+      unexpected();
+    }
+    void startOperation_toPrepFolderForSharingAt(Operation, const NSURL &, QVShareOutcomeReply) override {
+      unexpected();
+    }
+    void copyCurrentUserNameAndDisplayHandleWithReply(QVCurrentUserReply) override { unexpected(); }
+    void startOperation_toProcessSubitemsAtURL(Operation, const NSURL &, std::uint64_t, std::uint64_t,
+                                               QVShareOutcomeReply) override {
+      unexpected();
+    }
+    void startOperation_toLookupShareParticipants(Operation, const QVShareParticipants &,
+                                                  QVParticipantsReply) override {
+      unexpected();
+    }
+    void startOperation_toCopyDocumentURLForRecordID(Operation, const std::optional<CKRecordID> &, bool,
+                                                     QVSandboxingURLReply) override {
+      unexpected();
+    }
+    void checkIfItemIsShareableWithInode(std::uint64_t, QVBoolReply) override { unexpected(); }
     static void unexpected() { ADD_FAILURE() << "a call that this test doesn't expect"; }
   };
 
