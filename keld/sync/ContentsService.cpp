@@ -377,6 +377,7 @@ QVMove ContentsService::describeMove(const ItemRecord &item, const NSURL &destin
   move.isIntoTrash = container(*target) == QVUbiquitousTrashContainerID;
   move.isIntoLocalPlace =
       qv_isInTessalyPrivateStorages(destination) || qv_wouldBeExcludedFromSync(destination);
+  if (move.leavesContainer || move.isIntoLocalPlace) move.isDataless = hasDataless();
   return move;
 }
 

@@ -44,6 +44,9 @@ void Downloads::run(std::uint64_t number, ItemNumber item,
     }
     if (outcome != Try::again) cancellation->waitUntil(std::chrono::steady_clock::now() + kPause);
   }
+  // What the daemon's end makes impossible was given up, and didn't fail.
+  if (error.is(QVTessalyErrorDomain, QVErrorShuttingDown))
+    error = qvc_error(QVErrorCancelled, "the daemon is shutting down");
   if (error && !error.is(QVTessalyErrorDomain, QVErrorCancelled))
     os_log_error(qvc_default_log(), "[ERROR] can't download %s: %@", files_.pathOf(item), error);
   // Told when whoever lists the document sees it as it is now.

@@ -14,11 +14,17 @@ class ShareOperationProxy final
   using QVShareOperationCalls::QVShareOperationCalls;
 };
 
+// The sharing operations alone, without the rest of the daemon's protocol.
+class ShareOperationServer final : public QVShareOperationServer {
+ public:
+  using QVShareOperationServer::QVShareOperationServer;
+};
+
 }  // namespace
 
 const NSXPCInterface &QVCXPCSharingOperationInterface() {
   static const auto interface =
-      makeXPCInterface<QVShareOperationProtocol, QVShareOperationServer, ShareOperationProxy>(
+      makeXPCInterface<QVShareOperationProtocol, ShareOperationServer, ShareOperationProxy>(
           "QVShareOperationProtocol");
   return interface;
 }
