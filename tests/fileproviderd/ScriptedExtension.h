@@ -147,21 +147,23 @@ class ScriptedAction final : public FPDAction,
   }
   void end(const std::shared_ptr<const NSFileProviderItem> &item, const NSError &error) {
     NSFileProviderItemCompletion reply;
-    NSXPCErrorHandler dropped;
+    NSXPCErrorHandler dropped, last;
     {
       const Lock held(lock_);
       reply.swap(reply_);
       dropped.swap(waitHandler_);
+      last.swap(handler_);
     }
     reply(item, error);
   }
   void cutOff(const NSError &error) {
     NSFileProviderItemCompletion dropped;
-    NSXPCErrorHandler handler;
+    NSXPCErrorHandler handler, last;
     {
       const Lock held(lock_);
       dropped.swap(reply_);
       handler.swap(waitHandler_);
+      last.swap(handler_);
     }
     handler(error);
   }

@@ -2,11 +2,13 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <chrono>
 #include <cstring>
 #include <fcntl.h>
 #include <filesystem>
 #include <random>
 #include <sys/stat.h>
+#include <thread>
 #include <unistd.h>
 
 #include "platform/cloudkit/embedded/Schema.h"
@@ -16,6 +18,8 @@ namespace droxa::embedded {
 namespace {
 
 constexpr std::size_t kMostIdleConnections = 8;
+constexpr std::chrono::seconds kLongestMaking{10};
+constexpr std::chrono::milliseconds kBetweenTries{5};
 
 std::int64_t randomNumber() {
   std::random_device source;
@@ -104,6 +108,20 @@ FileIdentity Home::currentIdentity() const {
   return {status.st_dev, status.st_ino};
 }
 
+// A file that several processes make at once gets its journal's mode from one of them, and the library
+// doesn't wait for that one: the others are told that it is busy.
+std::unique_ptr<Connection> Home::connectAndMake() const {
+  const auto until = std::chrono::steady_clock::now() + kLongestMaking;
+  for (;;) {
+    try {
+      return connect(true);
+    } catch (const SqlError &refused) {
+      if (!refused.isBusy() || std::chrono::steady_clock::now() >= until) throw;
+    }
+    std::this_thread::sleep_for(kBetweenTries);
+  }
+}
+
 std::unique_ptr<Connection> Home::connect(bool mayCreate) const {
   auto connection = std::make_unique<Connection>();
   if (!mayCreate) connection->identity = currentIdentity();
@@ -140,7 +158,7 @@ NSError Home::create() {
   if (watched < 0) return unusable(watchedFile(), errno).error;
   close(watched);
   try {
-    checkIn(connect(true));
+    checkIn(connectAndMake());
   } catch (const SqlError &refused) {
     return refused.cloudError({});
   } catch (const CallFailed &failed) {

@@ -68,6 +68,7 @@ class Home {
   void transact(Access access, const CKCallContext &context, const Connection &connection,
                 const std::function<void(const Connection &)> &body) const;
   std::unique_ptr<Connection> connect(bool mayCreate) const;
+  std::unique_ptr<Connection> connectAndMake() const;
   std::unique_ptr<Connection> checkOut() EXCLUDES(mutex_);
   void checkIn(std::unique_ptr<Connection> connection) EXCLUDES(mutex_);
   FileIdentity currentIdentity() const;  // throws CallFailed while it is gone

@@ -19,6 +19,10 @@ constexpr int kInstructionsBetweenChecks = 20000;
 
 }  // namespace
 
+bool SqlError::isBusy() const {
+  return (code_ & 0xff) == SQLITE_BUSY;
+}
+
 NSError SqlError::cloudError(const CKCallContext &context) const {
   if (NSError stopped = context.check()) return stopped;
   const std::string text = "The cloud's database: " + std::string(what());

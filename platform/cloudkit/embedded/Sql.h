@@ -20,6 +20,7 @@ class SqlError : public std::runtime_error {
   SqlError(int code, const std::string &message) : std::runtime_error(message), code_(code) {}
   // The error that a call answers: damage, a full disk, a lock that wasn't to be had.
   NSError cloudError(const CKCallContext &context) const;
+  bool isBusy() const;  // another connection has the lock
 
  private:
   int code_;

@@ -1,4 +1,5 @@
 #include <csignal>
+#include <cstdio>
 #include <filesystem>
 #include <fstream>
 #include <sqlite3.h>
@@ -206,8 +207,11 @@ TEST(EmbeddedCloud, manyProcessesMayMakeOneCloudAtOnce) {
   for (int i = 0; i < 6; ++i) {
     const pid_t child = fork();
     if (child == 0) {
-      const auto device = EmbeddedCloud::open(world.folder(), "account", "child", nullptr);
-      _exit(device && !device->saveZone({std::to_string(i)}, patiently()) ? 0 : 1);
+      NSError error;
+      const auto device = EmbeddedCloud::open(world.folder(), "account", "child", &error);
+      if (device) error = device->saveZone({std::to_string(i)}, patiently());
+      if (error) std::fprintf(stderr, "%s\n", error.description().c_str());
+      _exit(error ? 1 : 0);
     }
     children.push_back(child);
   }
