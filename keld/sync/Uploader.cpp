@@ -179,7 +179,11 @@ Uploader::Prepared Uploader::laterWith(Plan *plan, const NSError &error) {
 Uploader::Prepared Uploader::prepareSave(const ItemRecord &item, Plan *plan, const CKCallContext &call) {
   NSError problem;
   const auto location = context_.files.locate(item.id, &problem);
-  if (!location) return laterWith(plan, problem);
+  if (!location) {
+    // A folder that isn't where it was has been moved; where to, the keeper is about to find out.
+    const bool wasMoved = problem.is(NSPOSIXErrorDomain, ENOENT) || problem.is(NSPOSIXErrorDomain, ENOTDIR);
+    return laterWith(plan, wasMoved ? NSError() : problem);
+  }
   const std::string parent = context_.files.parentRecord(location->item);
   if (parent.empty()) {
     // The folder has to be known first.
