@@ -44,6 +44,12 @@ std::shared_ptr<Keld> Keld::start(const DroxaHome &home, KeldOptions options, st
   if (!problem->empty()) return nullptr;
   daemon->removeAbandonedActions();
   try {
+    daemon->driveAccount_ = DriveAccount(home, daemon->options_.sync.account);
+  } catch (const std::exception &refused) {
+    *problem = refused.what();
+    return nullptr;
+  }
+  try {
     daemon->open();
   } catch (const std::exception &error) {
     *problem = error.what();
@@ -92,20 +98,19 @@ void Keld::openSync() {
   SyncOptions options = options_.sync;
   if (options.device.empty()) options.device = DeviceName(home_);
   std::shared_ptr<CKCloud> cloud = options.cloud;
-  const std::string drive = DriveAccount(home_, options.account);
   if (!cloud) {
     const std::string folder = options.cloudFolder.empty() ? home_.root() + "/cloud" : options.cloudFolder;
     NSError error;
-    cloud = EmbeddedCloud::open(folder, drive, options.device, &error);
+    cloud = EmbeddedCloud::open(folder, driveAccount_, options.device, &error);
     if (!cloud) throw std::runtime_error(error.localizedDescription());
   }
   const auto readItems = [this](const std::function<void(ItemQueries &)> &work) {
     return read([&](ItemQueries &queries, const ItemPresenter &) { work(queries); });
   };
   sync_ = std::make_shared<SyncEngine>(
-      replicaPath_, home_.state() + "/sync.sqlite", cloud, [this] { return keeper_.get(); },
-      readItems, options);
-  RememberDriveAccount(sync_->store(), drive);
+      replicaPath_, home_.state() + "/sync.sqlite", cloud, [this] { return keeper_.get(); }, readItems,
+      options);
+  RememberDriveAccount(sync_->store(), driveAccount_);
   ContentsServiceHost host;
   host.replicaPath = replicaPath_;
   host.keeper = [this]() -> Keeper & { return *keeper_; };
@@ -113,13 +118,13 @@ void Keld::openSync() {
   host.pathBelowReplica = [this](const NSURL &url) { return pathBelowReplica(url); };
   host.isSignedIn = [this] { return account_->isSignedIn(); };
   contents_ = std::make_shared<ContentsService>(std::move(host), sync_);
-  openSharing(cloud, drive);
+  openSharing(cloud);
   std::string itemDatabase;
   (void)readItems([&](ItemQueries &queries) { itemDatabase = queries.metaText("uuid"); });
   sync_->start(itemDatabase);
 }
 
-void Keld::openSharing(const std::shared_ptr<CKCloud> &cloud, const std::string &accountName) {
+void Keld::openSharing(const std::shared_ptr<CKCloud> &cloud) {
   SharingHost host;
   host.replicaPath = replicaPath_;
   host.keeper = [this]() -> Keeper & { return *keeper_; };
@@ -128,7 +133,7 @@ void Keld::openSharing(const std::shared_ptr<CKCloud> &cloud, const std::string 
   };
   host.pathBelowReplica = [this](const NSURL &url) { return pathBelowReplica(url); };
   host.isSignedIn = [this] { return account_->isSignedIn(); };
-  sharing_ = std::make_shared<SharingService>(std::move(host), sync_, SharingPlaces(cloud, accountName),
+  sharing_ = std::make_shared<SharingService>(std::move(host), sync_, SharingPlaces(cloud, driveAccount_),
                                               options_.sharing);
 }
 
@@ -145,7 +150,7 @@ void Keld::offerAccount(bool mayOffer) {
   });
   if (wasOffered) return;
   if (mayOffer && !account_->isSignedIn()) {
-    const NSError error = account_->signIn(DriveAccount(home_, options_.sync.account));
+    const NSError error = account_->signIn(driveAccount_);
     if (error) os_log_error(qvc_default_log(), "[ERROR] can't sign the drive's account in: %@", error);
   }
   performAndWait([](ItemEdits &edits) { edits.setMeta("accountOffered", 1); });
@@ -187,7 +192,8 @@ std::shared_ptr<QVProtocol> Keld::newSession() {
 NSError Keld::read(const Read &work) {
   if (stopped_) return qvc_error(QVErrorShuttingDown, "the daemon is shutting down");
   try {
-    readers_->read([&](ItemQueries &queries) { work(queries, ItemPresenter(containers_.current(), queries)); });
+    readers_->read(
+        [&](ItemQueries &queries) { work(queries, ItemPresenter(containers_.current(), queries)); });
     return NSError();
   } catch (const SqlError &error) {
     os_log_error(qvc_default_log(), "[ERROR] the item database can't be read: %s", error.what());

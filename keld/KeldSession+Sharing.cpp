@@ -119,9 +119,8 @@ std::optional<ItemRecord> KeldSession::itemWithIdentifier(const std::string &ide
     return std::nullopt;
   }
   std::optional<ItemRecord> found;
-  *error = daemon_->read([&](ItemQueries &queries, const ItemPresenter &) {
-    found = RecordOf(queries, *asked);
-  });
+  *error =
+      daemon_->read([&](ItemQueries &queries, const ItemPresenter &) { found = RecordOf(queries, *asked); });
   if (!found && !*error) *error = qvc_errorNoSuchItem(identifier);
   return found;
 }
@@ -135,7 +134,8 @@ void KeldSession::getShareOptionsOfItemIdentifier(const std::string &identifier,
   } catch (const SqlError &problem) {
     error = databaseFailed(problem);
   }
-  reply(options.isShared, options.isSharedByOthers, options.isSharedByItself, options.sharedFolderName, error);
+  reply(options.isShared, options.isSharedByOthers, options.isSharedByItself, options.sharedFolderName,
+        error);
 }
 
 void KeldSession::refreshSharingStateForItemIdentifier(const std::string &identifier, QVErrorReply reply) {

@@ -20,7 +20,8 @@ class KeldSession final : public QVProtocol, public std::enable_shared_from_this
   explicit KeldSession(std::shared_ptr<Keld> daemon) : daemon_(std::move(daemon)) {}
   ~KeldSession() override { end(); }
 
-  // Ends the client's senders and subscriptions, and cancels its sharing operations: its connection has ended.
+  // Ends the client's senders and subscriptions, and cancels its sharing operations: its connection has
+  // ended.
   void end();
 
   void enumerateItemsInFolder(const std::optional<QVFileObjectID> &folder, std::int64_t sortOrder,

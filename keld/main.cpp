@@ -124,8 +124,9 @@ int run(int argc, char **argv) {
       ->option_text("DIR");
   app.add_option("--device", arguments.device, "What this device is called (default: the machine's name)")
       ->option_text("NAME");
-  app.add_option("--account", arguments.account,
-                 "The account in the cloud that the drive belongs to (default: as before, else who runs this)")
+  app.add_option(
+         "--account", arguments.account,
+         "The account in the cloud that the drive belongs to (default: as before, else who runs this)")
       ->option_text("NAME");
   app.add_option("--import", arguments.importFrom,
                  "Put the documents of a folder into the cloud, and end; the folder is only read")

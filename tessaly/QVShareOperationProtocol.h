@@ -47,8 +47,8 @@ inline constexpr std::uint64_t QVProcessWithdrawSubshares = 1;  // withdraws the
 // that isn't there is nil, the error is the last one.
 //
 // Errors of every call: 2 when nobody is signed in; 22 for a URL, share or record that is nil; 14 when there
-// is nothing at the URL in the drive; 41 for what isn't shared: aliases, containers' own folders, what lies in
-// the trash or in private storage, or is kept local; 34 when it was cancelled, also by the end of the
+// is nothing at the URL in the drive; 41 for what isn't shared: aliases, containers' own folders, what lies
+// in the trash or in private storage, or is kept local; 34 when it was cancelled, also by the end of the
 // connection; 40 when too many calls wait already; 33 when the daemon ends. The cloud's errors
 // (CKErrorDomain) come as they are; what doesn't move for a minute ends with CKErrorIsTimeout.
 class QVShareOperationProtocol {

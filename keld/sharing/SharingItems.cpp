@@ -146,8 +146,7 @@ NSError SharingItems::upload(SharingOperation &operation, const SharingItem &ite
     return error;
   }
   engine_->itemsChanged();  // lets go of the wait
-  if (CKErrorIsTimeout(error))
-    return CKErrorMakeTimeout(error.localizedDescription() + problemOfCloud());
+  if (CKErrorIsTimeout(error)) return CKErrorMakeTimeout(error.localizedDescription() + problemOfCloud());
   return error;
 }
 

@@ -39,10 +39,10 @@ class SharingOperation final : public std::enable_shared_from_this<SharingOperat
   const std::shared_ptr<CKCancellation> &cancellation() const { return cancellation_; }
   void progress(const char *topic, std::uint64_t done, std::uint64_t total) EXCLUDES(mutex_);
 
-  // Calls `begin` with what is to be called (once, on any thread) when it is done, and waits for that: answers
-  // what it was called with, why the operation was cancelled, or a timeout (CKErrorIsTimeout) that says `what`
-  // was waited for. `position` (may be null) is asked several times a second: the timeout counts from its last
-  // change.
+  // Calls `begin` with what is to be called (once, on any thread) when it is done, and waits for that:
+  // answers what it was called with, why the operation was cancelled, or a timeout (CKErrorIsTimeout) that
+  // says `what` was waited for. `position` (may be null) is asked several times a second: the timeout counts
+  // from its last change.
   NSError await(const std::string &what, const std::function<void(Done)> &begin,
                 const std::function<std::uint64_t()> &position = nullptr) EXCLUDES(mutex_);
 

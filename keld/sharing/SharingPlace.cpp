@@ -14,8 +14,8 @@ SharingPlace SharingPlaces::ofRow(const SyncRow & /*row*/) const {
 }
 
 SharingPlace SharingPlaces::ofZone(const CKRecordZoneID &zone) const {
-  const bool isOwn = zone.ownerName == CKCurrentUserDefaultName ||
-                     (!accountName_.empty() && zone.ownerName == accountName_);
+  const bool isOwn =
+      zone.ownerName == CKCurrentUserDefaultName || (!accountName_.empty() && zone.ownerName == accountName_);
   if (isOwn) return {own_, {zone.zoneName}, true};
   return {others_, zone, false};
 }

@@ -15,7 +15,8 @@ constexpr int kMostTries = 4;  // of opening what is let go of at the same time
 
 NSError unknownRecord(const CKRecordID &record) {
   return CKErrorMake(CKErrorCode::unknownItem, "no document of this drive is the record " +
-                                                   record.description() + "; fetch its changes, and ask again");
+                                                   record.description() +
+                                                   "; fetch its changes, and ask again");
 }
 
 }  // namespace
@@ -34,8 +35,8 @@ void SharingService::prepFolder(const SharingCaller &caller, const NSURL &url, Q
 NSError SharingService::withdrawOne(SharingOperation &operation, const KnownShare &known, bool onlyChecks) {
   const SharingPlace place = places_.ofZone(known.record.zoneID);
   if (!place.isOwn)
-    return CKErrorMake(CKErrorCode::permissionFailure, "it is " + known.record.zoneID.ownerName +
-                                                           "'s share, who alone can withdraw it");
+    return CKErrorMake(CKErrorCode::permissionFailure,
+                       "it is " + known.record.zoneID.ownerName + "'s share, who alone can withdraw it");
   if (onlyChecks) return NSError();
   CKShare share;
   share.recordID = known.record;
@@ -70,8 +71,8 @@ NSError SharingService::withdrawBelow(SharingOperation &operation, const NSURL &
   }
   if (failures <= mostFailures) return NSError();
   return CKErrorMake(CKErrorCode::partialFailure,
-                     std::to_string(failures) + " of the " + std::to_string(below.size()) +
-                         " shares below " + item.path + " can't be withdrawn, first that of " + first + ": " +
+                     std::to_string(failures) + " of the " + std::to_string(below.size()) + " shares below " +
+                         item.path + " can't be withdrawn, first that of " + first + ": " +
                          why.localizedDescription(),
                      why);
 }
@@ -103,14 +104,13 @@ NSError SharingService::materialise(SharingOperation &operation, const SharingIt
     return done;
   };
   const NSError error = operation.await(
-      "fetching " + item.path,
-      [&](SharingOperation::Done done) { interest->whenEnded(std::move(done)); }, position);
+      "fetching " + item.path, [&](SharingOperation::Done done) { interest->whenEnded(std::move(done)); },
+      position);
   if (error) interest->cancel();
   return error;
 }
 
-NSError SharingService::openDocument(SharingOperation &operation, const CKRecordID &record,
-                                     bool syncIfNeeded,
+NSError SharingService::openDocument(SharingOperation &operation, const CKRecordID &record, bool syncIfNeeded,
                                      std::shared_ptr<const FPSandboxingURLWrapper> *opened) {
   if (syncIfNeeded) {
     const NSError error = refresh(operation);

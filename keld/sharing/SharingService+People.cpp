@@ -46,8 +46,8 @@ void SharingService::copyCurrentUser(const SharingCaller &caller, QVCurrentUserR
   };
   start(caller, perform, [user, reply = std::move(reply)](const NSError &error) {
     if (error) return reply(std::nullopt, std::nullopt, std::nullopt, std::nullopt, error);
-    reply(nameOf(user->displayName), orNil(user->accountName), orNil(user->handle),
-          orNil(user->displayName), error);
+    reply(nameOf(user->displayName), orNil(user->accountName), orNil(user->handle), orNil(user->displayName),
+          error);
   });
 }
 
@@ -58,8 +58,7 @@ NSError SharingService::lookUp(SharingOperation &operation, std::vector<CKShareP
   std::vector<std::string> names;
   for (const CKShareParticipant &each : asked) names.push_back(lookupName(each));
   const CKShareParticipantsReply reply =
-      places_.ofZone({"", CKCurrentUserDefaultName})
-          .cloud->lookUpShareParticipants(names, operation.call());
+      places_.ofZone({"", CKCurrentUserDefaultName}).cloud->lookUpShareParticipants(names, operation.call());
   if (reply.error && !CKErrorIs(reply.error, CKErrorCode::partialFailure)) return reply.error;
   std::string missing;
   NSError why;
@@ -133,8 +132,7 @@ NSError SharingService::sharesOf(SharingOperation &operation, ItemNumber number)
   return error.is(QVTessalyErrorDomain, QVErrorNoShare) ? NSError() : error;
 }
 
-void SharingService::refreshSharingState(const SharingCaller &caller, ItemNumber number,
-                                         QVErrorReply reply) {
+void SharingService::refreshSharingState(const SharingCaller &caller, ItemNumber number, QVErrorReply reply) {
   const auto perform = [this, number](SharingOperation &operation) { return sharesOf(operation, number); };
   start(caller, perform, std::move(reply));
 }

@@ -37,7 +37,8 @@ SharingService::SharingService(SharingHost host, std::shared_ptr<SyncEngine> eng
 
 void SharingService::start(const SharingCaller &caller, Perform perform,
                            std::function<void(const NSError &)> answer) {
-  const auto checked = [self = shared_from_this(), perform = std::move(perform)](SharingOperation &operation) {
+  const auto checked = [self = shared_from_this(),
+                        perform = std::move(perform)](SharingOperation &operation) {
     return self->host_.isSignedIn() ? perform(operation) : qvc_errorLoggedOut();
   };
   queue_->start(caller.owner, caller.client, {checked, std::move(answer)});
@@ -121,8 +122,9 @@ void SharingService::copySharingInfo(const SharingCaller &caller, const NSURL &u
 NSError SharingService::save(SharingOperation &operation, const CKShare &share, CKShare *saved,
                              const std::string &appName) {
   if (!share.rootRecordID)
-    return qvc_error(QVErrorInvalidArgument, "the share " + share.recordID.description() +
-                                                 " has no root record; make one with createSharingInfoForURL");
+    return qvc_error(QVErrorInvalidArgument,
+                     "the share " + share.recordID.description() +
+                         " has no root record; make one with createSharingInfoForURL");
   const SharingPlace place = places_.ofZone(share.recordID.zoneID);
   CKModifyRequest request;
   request.recordsToSave.push_back(SharingPlaces::shareInPlace(place, share).record());
@@ -183,12 +185,11 @@ NSError SharingService::makeShare(SharingOperation &operation, const NSURL &url,
   if (const NSError error = items_.findInCloud(operation, url, &item)) return error;
   const SharingPlace place = places_.ofRow(*item.row);
   if (!place.isOwn)
-    return qvc_error(QVErrorNotShareable, item.path + ": belongs to " + place.zone.ownerName +
-                                              ", who alone can share it");
+    return qvc_error(QVErrorNotShareable,
+                     item.path + ": belongs to " + place.zone.ownerName + ", who alone can share it");
   *share = CKShare::shareWithRootRecordID(place.recordID(item.row->record));
   share->fields[CKShareTitleKey] = item.item.name;
-  share->fields[CKShareTypeKey] =
-      std::string(item.item.isFolder() ? QVFolderShareType : QVDocumentShareType);
+  share->fields[CKShareTypeKey] = std::string(item.item.isFolder() ? QVFolderShareType : QVDocumentShareType);
   return NSError();
 }
 

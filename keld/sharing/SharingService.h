@@ -24,9 +24,9 @@ struct ShareOptions {
   std::optional<std::string> sharedFolderName;
 };
 
-// The sharing operations of all connections, as QVShareOperationProtocol.h tells them: against the cloud, with
-// what the sync knows of the items. What changed is known here when the reply comes.
-// Thread contract: any thread. Operations run on the pool (SharingQueue).
+// The sharing operations of all connections, as QVShareOperationProtocol.h tells them: against the cloud,
+// with what the sync knows of the items. What changed is known here when the reply comes. Thread contract:
+// any thread. Operations run on the pool (SharingQueue).
 class SharingService final : public std::enable_shared_from_this<SharingService> {
  public:
   SharingService(SharingHost host, std::shared_ptr<SyncEngine> engine, SharingPlaces places,

@@ -53,7 +53,8 @@ void ItemStates::flush(std::function<void()> done) {
   }
   if (!keeper) return done();
   keeper->perform(
-      [states = std::move(states), shared = std::move(shared)](Reconciler &reconciler, ItemQueries &queries, ItemEdits &) {
+      [states = std::move(states), shared = std::move(shared)](Reconciler &reconciler, ItemQueries &queries,
+                                                               ItemEdits &) {
         // The table has to know the files that the states are of.
         for (const ItemState &state : states) {
           const auto record = state.hasFile ? queries.byID(state.item) : std::nullopt;

@@ -137,7 +137,7 @@ class SyncEngine {
   bool moreIsDue_ = false;
   std::vector<Waiter> waiting_;
   std::vector<std::function<void(const NSError &)>> fetching_;  // who is to be told of the fetch
-  std::set<std::string> unbound_;  // records at the last poll
+  std::set<std::string> unbound_;                               // records at the last poll
   std::chrono::milliseconds retryPause_{0};
   std::chrono::steady_clock::time_point pauseEnd_;  // after the last problem
   std::chrono::milliseconds againPause_{0};         // before what couldn't be applied is fetched again
