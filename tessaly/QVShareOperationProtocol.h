@@ -80,8 +80,8 @@ class QVShareOperationProtocol {
   // when the item has no share of its own.
   virtual void startOperation_toModifyRecordAccessAtURL(Operation op, const NSURL &url, bool allowAccess,
                                                         QVRecordAccessReply reply) = 0;
-  // Tokens by which the account shows others that it may read the item (CKShareTokens): first the share's,
-  // nil when the item is in none, then the item's own.
+  // Tokens by which the account shows others that it may read the item (CKShareTokens): first the share's, by
+  // which it may where the item is in a share, then the item's own.
   virtual void startOperation_toCopyParticipantTokenAtURL(Operation op, const NSURL &url,
                                                           QVParticipantTokenReply reply) = 0;
   // Replies when the item, and everything below it that has changed so far, is safe in the cloud; or with why
