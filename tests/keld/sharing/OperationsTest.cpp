@@ -3,6 +3,8 @@
 #include <atomic>
 #include <future>
 
+#include "keld/KeldListener.h"
+#include "tessaly/QVDaemonConnectionOverXPC.h"
 #include "tests/keld/sharing/SharingDrive.h"
 #include "tests/support/ShareCalls.h"
 
@@ -185,6 +187,36 @@ TEST_F(SharingOperations, moreThanCanWaitAreRefusedAndAThousandDeadClientsLeaveN
   }));
   cloud->clearFaults();
   EXPECT_TRUE(save(made.share).share) << "it goes on for others";
+}
+
+// The same as clients have it: over a connection to the daemon's socket.
+TEST_F(SharingOperations, aLostConnectionCancelsWhatItAskedFor) {
+  sentDocument("letter");
+  const auto made = create(url("letter"));
+  const std::string socket = folder.path() + "/socket";
+  NSError error;
+  const auto listener = KeldListener::listen(device.keld.sharedDaemon(), socket, &error);
+  ASSERT_TRUE(listener) << error.description();
+  auto connection = std::make_shared<QVDaemonConnectionOverXPC>(socket);
+  cloud->onEveryCall(Call::modifyRecords, hanging());
+  std::atomic<int> ended{0};
+  const auto proxy = connection->remoteObjectProxyWithErrorHandler([&](const NSError &) { ++ended; });
+  const auto op = std::make_shared<RecordingOperation>();
+  Once<std::optional<CKShare>, NSError> cancelled("cancelled by its client");
+  proxy->startOperation_toSaveSharingInfo(op, made.share, cancelled.completion());
+  ASSERT_TRUE(op->log.waitFor("remote"));
+  for (int n = 0; n < 50; ++n)
+    proxy->startOperation_toSaveSharingInfo(
+        std::make_shared<RecordingOperation>(), made.share,
+        [&](const std::optional<CKShare> &, const NSError &) { ++ended; });
+  SharingQueue &queue = device.keld.daemon().sharing().queue();
+  ASSERT_TRUE(eventually([&] { return queue.count() == 51; })) << queue.count();
+  op->remote()->invalidate();
+  EXPECT_TESSALY_ERROR(cancelled.value<1>(), QVErrorCancelled);
+  connection.reset();
+  EXPECT_TRUE(eventually([&] { return queue.count() == 0; })) << queue.count();
+  EXPECT_TRUE(eventually([&] { return ended == 50; })) << ended;
+  listener->invalidate();
 }
 
 TEST_F(SharingOperations, waitsForUploadsOfDeadClientsAreLetGoOf) {
