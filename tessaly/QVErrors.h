@@ -9,6 +9,7 @@ inline constexpr char QVTessalyErrorDomain[] = "QVTessalyErrorDomain";
 
 inline constexpr std::int64_t QVErrorLoggedOut = 2;
 inline constexpr std::int64_t QVErrorNoSuchItem = 14;
+inline constexpr std::int64_t QVErrorNoShare = 20;  // there is no share of this item
 inline constexpr std::int64_t QVErrorInvalidArgument = 22;
 inline constexpr std::int64_t QVErrorPrivilegeRequired = 26;  // the client isn't entitled to it
 inline constexpr std::int64_t QVErrorDatabase = 30;
@@ -21,6 +22,9 @@ inline constexpr std::int64_t QVErrorUnsentChanges = 36;     // the cloud doesn'
 inline constexpr std::int64_t QVErrorDocumentInUse = 37;
 inline constexpr std::int64_t QVErrorPinned = 38;
 inline constexpr std::int64_t QVErrorSharingUnavailable = 39;  // this daemon's cloud takes no shares
+inline constexpr std::int64_t QVErrorBusy = 40;  // too much is under way already; to be asked again later
+inline constexpr std::int64_t QVErrorNotShareable =
+    41;  // the item is of a kind, or in a place, that isn't shared
 
 NSError qvc_errorLoggedOut();
 // Describes it by a checked format (platform/oslog/LogFormat.h).
