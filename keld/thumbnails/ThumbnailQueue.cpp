@@ -47,6 +47,7 @@ bool ThumbnailQueue::isFor(const std::string &name) const {
 std::vector<CKRecord> ThumbnailQueue::work(bool isPoll, const CKCallContext &call) {
   std::vector<CKRecord> newer = saveMade(call);
   if (!call.isCancelled()) startMore(isPoll);
+  restIfIdle();
   return newer;
 }
 
@@ -160,39 +161,36 @@ void ThumbnailQueue::startMore(bool isPoll) {
   if (isPoll) context_.store.dropStaleThumbnails();
   const auto due = context_.store.dueThumbnails(known + kAtATime);
   // With all that there was taken, only news are a reason to look again.
-  if (due.size() < known + kAtATime) wantsSeen_ = news;
+  wantsSeen_ = due.size() < known + kAtATime ? news : UINT64_MAX;
   const Lock lock(mutex_);
   for (const WantedThumbnail &wanted : due)
     if (underWay_.insert(wanted.record).second) ready_.push_back(wanted);
-  for (std::size_t jobs = jobs_; jobs < std::min<std::size_t>(mostJobs_, ready_.size() + jobs_); ++jobs) {
+  while (workers_ < mostJobs_ && workers_ < ready_.size()) {
+    ++workers_;
     ++jobs_;
     dispatch_async_global([self = shared_from_this()] { self->runJobs(); });
   }
 }
 
+std::optional<WantedThumbnail> ThumbnailQueue::next(bool *isMuchMade) {
+  const Lock lock(mutex_);
+  *isMuchMade = made_.size() >= kSavedAtATime;
+  if (ready_.empty()) {
+    --workers_;
+    return std::nullopt;
+  }
+  WantedThumbnail wanted = std::move(ready_.front());
+  ready_.pop_front();
+  return wanted;
+}
+
 void ThumbnailQueue::runJobs() {
-  for (;;) {
-    WantedThumbnail wanted;
-    bool isMuchMade = false, isLast = false;
-    {
-      const Lock lock(mutex_);
-      isLast = ready_.empty();
-      isMuchMade = made_.size() >= kSavedAtATime;
-      if (!isLast) {
-        wanted = std::move(ready_.front());
-        ready_.pop_front();
-      }
-    }
-    if (isLast || isMuchMade) wake_();
-    if (isLast) break;
-    runJob(wanted);
+  for (bool isMuchMade = false;;) {
+    const auto wanted = next(&isMuchMade);
+    if (!wanted || isMuchMade) wake_();
+    if (!wanted) break;
+    runJob(*wanted);
   }
-  bool isAtRest = false;
-  {
-    const Lock lock(mutex_);
-    isAtRest = jobs_ == 1;
-  }
-  if (isAtRest) thumbnailer_->rest();
   const Lock lock(mutex_);
   --jobs_;
   idle_.notify_all();
@@ -200,13 +198,27 @@ void ThumbnailQueue::runJobs() {
 
 void ThumbnailQueue::runJob(const WantedThumbnail &wanted) {
   Made made;
-  const End end = stopping_->isCancelled() ? End::later : make(wanted, &made);
-  if (end == End::never) context_.store.thumbnailSettled(wanted.record, wanted.digest);
+  End end = End::later;
+  try {
+    if (!stopping_->isCancelled()) end = make(wanted, &made);
+    if (end == End::never) context_.store.thumbnailSettled(wanted.record, wanted.digest);
+  } catch (const SqlError &error) {
+    os_log_error(qvc_default_log(), "[ERROR] the sync's database failed: %s", error.what());
+    end = End::later;
+  }
   const Lock lock(mutex_);
   if (end == End::made)
     made_.push_back(std::move(made));
   else
     underWay_.erase(wanted.record);
+}
+
+void ThumbnailQueue::restIfIdle() {
+  {
+    const Lock lock(mutex_);
+    if (workers_ > 0 || !ready_.empty()) return;
+  }
+  thumbnailer_->rest();
 }
 
 // The item's own file, or the source; none when neither has these contents any more.
