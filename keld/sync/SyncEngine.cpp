@@ -69,6 +69,7 @@ SyncEngine::SyncEngine(const std::string &replicaPath, const std::string &databa
   downloads_->setRetryHandler([this] { itemsChanged(); });
   examiner_.setBoundHandler([this](ItemNumber item, const SyncRow &row) {
     if (row.isDataless && isPinnedOrBelowPin(item)) downloads_->fetchInBackground(item, row.content.size);
+    if (!row.content.digest.empty()) thumbnails_->lookAgain();
   });
   examiner_.setReplicaCheck([this] { return isReplicaItself(); });
   applier_.setCloudCheck([this] { return isSameCloud(); });

@@ -59,9 +59,17 @@ void ThumbnailQueue::stop() {
   while (jobs_ > 0) idle_.wait(mutex_);
 }
 
-void ThumbnailQueue::forget(const std::string &record) {
+void ThumbnailQueue::lookAgain() {
   const Lock lock(mutex_);
-  underWay_.erase(record);
+  looksAgain_ = true;
+}
+
+// If the record has other contents by now, what is wanted of those was passed over while this was under way.
+void ThumbnailQueue::forget(const WantedThumbnail &wanted) {
+  const auto row = context_.store.byRecord(wanted.record);
+  const Lock lock(mutex_);
+  underWay_.erase(wanted.record);
+  if (row && row->content.digest != wanted.digest) looksAgain_ = true;
 }
 
 // --- Saving. What can't be saved now waits here.
@@ -79,7 +87,7 @@ std::vector<CKRecord> ThumbnailQueue::saveMade(const CKCallContext &call) {
   for (Made &made : std::exchange(unsaved_, {})) {
     const auto row = context_.store.byRecord(made.wanted.record);
     if (!belongsTo(made, row)) {
-      forget(made.wanted.record);
+      forget(made.wanted);
       continue;
     }
     request.recordsToSave.push_back(MakeRecordWithThumbnail(row->record, row->tag, made.asset));
@@ -133,7 +141,7 @@ bool ThumbnailQueue::isSettled(const Made &made, const CKRecord &sent, const CKR
   if (!isGone && !isCollected)
     os_log_error(qvc_default_log(), "[ERROR] can't save the thumbnail of the record %s: %@", record,
                  result.error);
-  forget(record);
+  forget(made.wanted);
   return true;
 }
 
@@ -144,17 +152,17 @@ void ThumbnailQueue::saved(const Made &made, const std::string &sentTag, const C
     context_.store.put(*row);
   }
   context_.store.thumbnailSettled(made.wanted.record, made.wanted.digest);
-  forget(made.wanted.record);
+  forget(made.wanted);
 }
 
 // --- Making.
 
 void ThumbnailQueue::startMore(bool isPoll) {
   const std::uint64_t news = context_.store.thumbnailNews();
-  if (news == wantsSeen_ && !isPoll) return;
   std::size_t known = 0;
   {
     const Lock lock(mutex_);
+    if (news == wantsSeen_ && !isPoll && !std::exchange(looksAgain_, false)) return;
     if (stopped_ || isUnavailable_ || ready_.size() >= kAtATime / 2) return;
     known = underWay_.size();
   }
@@ -202,15 +210,13 @@ void ThumbnailQueue::runJob(const WantedThumbnail &wanted) {
   try {
     if (!stopping_->isCancelled()) end = make(wanted, &made);
     if (end == End::never) context_.store.thumbnailSettled(wanted.record, wanted.digest);
+    if (end != End::made) forget(wanted);
   } catch (const SqlError &error) {
     os_log_error(qvc_default_log(), "[ERROR] the sync's database failed: %s", error.what());
     end = End::later;
   }
   const Lock lock(mutex_);
-  if (end == End::made)
-    made_.push_back(std::move(made));
-  else
-    underWay_.erase(wanted.record);
+  if (end == End::made) made_.push_back(std::move(made));
 }
 
 void ThumbnailQueue::restIfIdle() {

@@ -126,7 +126,7 @@ TEST_F(ThumbnailSync, makesTheOtherDeviceFetchNothing) {
   annas->hold(true);
   sent(anna, "beach.jpg", "sand");
   sent(anna, "read.jpg", "foam");
-  ASSERT_TRUE(ben.knowsSoon("beach.jpg"));
+  ASSERT_TRUE(ben.knowsSoon("beach.jpg") && ben.knowsSoon("read.jpg"));
   ASSERT_EQ(ben.contents("read.jpg"), "foam");
   annas->hold(false);
   ASSERT_TRUE(hasSoon("beach.jpg", "thumbnail of sand"));
