@@ -26,7 +26,7 @@ int main(int argc, char **argv) {
   for (const auto &entry : std::filesystem::directory_iterator(argv[1]))
     files.push_back(entry.path().string());
   SandboxedThumbnailer thumbnailer;
-  const CKCancellation never;
+  const CKCancellation never{};
   std::atomic<std::size_t> next{0};
   std::atomic<std::uint64_t> made{0};
   const auto begin = std::chrono::steady_clock::now();

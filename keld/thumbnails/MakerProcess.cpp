@@ -106,7 +106,7 @@ MakerProcess::~MakerProcess() {
 
 bool MakerProcess::hear(std::string *problem) {
   MakerHello hello;
-  const CKCancellation never;
+  const CKCancellation never{};
   const bool isThere = waitFor(socket_.get(), Clock::now() + kStartTimeout, never) == Wait::ready &&
                        ::recv(socket_.get(), &hello, sizeof hello, MSG_DONTWAIT) == sizeof hello &&
                        hello.version == kMakerVersion;

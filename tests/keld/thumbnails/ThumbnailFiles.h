@@ -107,7 +107,7 @@ class ThumbnailFiles : public testing::Test {
   }
 
   const TemporaryFolder folder;
-  const CKCancellation never;
+  const CKCancellation never{};
 };
 
 }  // namespace droxa::keld
