@@ -159,6 +159,20 @@ TEST_F(ThumbnailSync, isNoConflictWithWhatTheOtherDeviceWrites) {
   EXPECT_EQ(anna.names(), std::vector<std::string>{"beach.jpg"});
 }
 
+TEST_F(ThumbnailSync, bringsNothingBackThatTheOtherDeviceDeleted) {
+  annas->hold(true);
+  sent(anna, "beach.jpg", "sand");
+  ASSERT_TRUE(ben.knowsSoon("beach.jpg"));
+  ben.keld.stop();
+  annas->hold(false);
+  ASSERT_TRUE(hasSoon("beach.jpg", "thumbnail of sand"));
+  std::filesystem::remove(ben.keld.at("beach.jpg"));
+  ben.keld.start();
+  EXPECT_TRUE(eventually([&] { return !hand.at("beach.jpg"); }));
+  EXPECT_TRUE(anna.losesSoon("beach.jpg"));
+  EXPECT_FALSE(ben.exists("beach.jpg"));
+}
+
 TEST_F(ThumbnailSync, isOfTheContentsThatTheOtherDeviceWroteLast) {
   annas->hold(true);
   sent(anna, "beach.jpg", "sand");
