@@ -1,6 +1,7 @@
 // keld, the sync daemon of one home.
 
 #include <CLI/CLI.hpp>
+#include <filesystem>
 #include <iostream>
 #include <malloc.h>
 #include <optional>
@@ -17,6 +18,7 @@
 #include "keld/sync/CloudImport.h"
 #include "keld/sync/DeviceName.h"
 #include "keld/sync/DriveAccount.h"
+#include "keld/sync/SyncStore.h"
 #include "platform/cloudkit/EmbeddedCloud.h"
 #include "platform/foundation/DescriptorLimit.h"
 #include "platform/foundation/Paths.h"
@@ -79,6 +81,26 @@ int serve(const Arguments &arguments, int signals) {
   return wasAsked ? EX_OK : EX_SOFTWARE;
 }
 
+// The daemon makes them, of the files that the documents came from. Without its database there are none.
+ThumbnailsWanted noteThumbnails(const DroxaHome &home) {
+  std::shared_ptr<SyncStore> store;
+  try {
+    store = std::make_shared<SyncStore>(home.state() + "/sync.sqlite");
+  } catch (const SqlError &error) {
+    std::cerr << "keld: thumbnails won't be made: " << error.what() << "\n";
+    return nullptr;
+  }
+  return [store](const std::vector<WantedThumbnail> &wanted) {
+    try {
+      store->transaction([&] {
+        for (const WantedThumbnail &each : wanted) store->wantThumbnail(each);
+      });
+    } catch (const SqlError &error) {
+      std::cerr << "keld: " << wanted.size() << " thumbnails won't be made: " << error.what() << "\n";
+    }
+  };
+}
+
 // Puts a folder's documents into the home's cloud, and says what it did, the last line in full.
 int importFolder(const Arguments &arguments) {
   const DroxaHome home = DroxaHome::resolve(arguments.home);
@@ -95,11 +117,12 @@ int importFolder(const Arguments &arguments) {
   NSError error;
   const auto cloud = EmbeddedCloud::open(folder, account, device, &error);
   if (!cloud) return fail(folder + ": " + error.localizedDescription(), EX_UNAVAILABLE);
+  const auto progress = [](const ImportReport &so) {
+    std::cout << so.documents << " documents, " << so.folders << " folders, " << so.bytes << " bytes"
+              << std::endl;
+  };
   const ImportReport report =
-      ImportIntoCloud(*cloud, arguments.importFrom, {home.root(), folder}, [](const ImportReport &so) {
-        std::cout << so.documents << " documents, " << so.folders << " folders, " << so.bytes << " bytes"
-                  << std::endl;
-      });
+      ImportIntoCloud(*cloud, arguments.importFrom, {home.root(), folder}, progress, noteThumbnails(home));
   for (const std::string &left : report.problems) std::cerr << "keld: left out " << left << "\n";
   if (report.error) return fail(report.error.localizedDescription(), EX_IOERR);
   return EX_OK;
@@ -140,7 +163,10 @@ int run(int argc, char **argv) {
     return app.exit(error) == 0 ? EX_OK : 2;
   }
   if (homeOption->count() > 0) arguments.home = home;
-  if (!arguments.importFrom.empty()) return importFolder(arguments);
+  if (!arguments.importFrom.empty()) {
+    arguments.importFrom = std::filesystem::absolute(arguments.importFrom).lexically_normal().string();
+    return importFolder(arguments);
+  }
 
   // Blocked before the first thread is made, so that they are taken from the descriptor alone.
   sigset_t ending;

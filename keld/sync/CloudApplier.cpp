@@ -292,7 +292,8 @@ void CloudApplier::apply(const DocumentRecord &document) {
   if (row && row->hasNewer() && row->newerTag == document.tag && context_.files.item(row->item) &&
       !context_.store.queued(row->item))
     return;
-  if (row && isOwnSaveOfDead(document, *row)) return followOwnSave(document, std::move(*row));
+  if (row && (isOwnSaveOfDead(document, *row) || isKnownOfDead(document, *row)))
+    return followOwnSave(document, std::move(*row));
   Place place;
   if (!openPlace(document.parent, &place)) {
     waitForPlace(document);
@@ -322,6 +323,15 @@ bool CloudApplier::isOwnSaveOfDead(const DocumentRecord &document, const SyncRow
     return false;
   return document.content.digest == row.content.digest ||
          context_.store.wasSent(document.record, document.content.digest);
+}
+
+// Whether the record says no more of an item that is gone here than was known when it was deleted: it was
+// given a thumbnail.
+bool CloudApplier::isKnownOfDead(const DocumentRecord &document, const SyncRow &row) {
+  return row.item != 0 && !row.tag.empty() && !row.hasNewer() &&
+         document.kind == NSFileProviderItemKind::document && document.parent == row.parent &&
+         document.name == row.name && document.content == row.content && document.metadata == row.metadata &&
+         !context_.files.item(row.item);
 }
 
 // Nobody has changed it elsewhere, so that the deletion is newer and is to be sent. It isn't brought back.

@@ -63,6 +63,7 @@ class CloudApplier {
   void findLink(SyncRow *row);
   void waitForPlace(const DocumentRecord &document);
   bool isOwnSaveOfDead(const DocumentRecord &document, const SyncRow &row);
+  bool isKnownOfDead(const DocumentRecord &document, const SyncRow &row);
   void followOwnSave(const DocumentRecord &document, SyncRow row);
   bool openPlace(const std::string &parentRecord, Place *place);
 

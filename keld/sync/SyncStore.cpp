@@ -98,8 +98,20 @@ CREATE INDEX shares_root ON shares(root);
 DELETE FROM meta WHERE key = 'changeToken';
 )sql";
 
+// Thumbnails that are still to be made.
+constexpr char kThumbnails[] = R"sql(
+CREATE TABLE thumbnails(
+  record TEXT PRIMARY KEY,
+  digest TEXT NOT NULL,
+  source BLOB NOT NULL,
+  inode INTEGER NOT NULL,
+  size INTEGER NOT NULL,
+  modified INTEGER NOT NULL
+) WITHOUT ROWID;
+)sql";
+
 // Each step leads from the version of its place to the next; version 0 is an empty database.
-constexpr const char *kSteps[] = {kTables, kUnfinished, kMeant, kMeantUntil, kShares};
+constexpr const char *kSteps[] = {kTables, kUnfinished, kMeant, kMeantUntil, kShares, kThumbnails};
 
 }  // namespace
 
