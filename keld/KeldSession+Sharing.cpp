@@ -86,4 +86,28 @@ void KeldSession::checkIfItemIsShareableWithInode(std::uint64_t /*inode*/, QVBoo
   reply(false, noSharing());
 }
 
+void KeldSession::getShareOptionsOfItemIdentifier(const std::string & /*identifier*/,
+                                                  QVShareOptionsReply reply) {
+  reply(false, false, false, std::nullopt, noSharing());
+}
+
+void KeldSession::refreshSharingStateForItemIdentifier(const std::string & /*identifier*/,
+                                                       QVErrorReply reply) {
+  reply(noSharing());
+}
+
+void KeldSession::acceptShareWithURL(const NSURL & /*shareURL*/, QVURLReply reply) {
+  reply({}, noSharing());
+}
+
+void KeldSession::resolveFileObjectIDsToContentRecordIDs(const std::vector<QVFileObjectID> & /*identifiers*/,
+                                                         QVRecordIDsReply reply) {
+  reply({}, noSharing());
+}
+
+void KeldSession::getContainerURLForID(const std::string & /*containerID*/,
+                                       bool /*recreateDocumentsIfNeeded*/, QVURLReply reply) {
+  reply({}, noSharing());
+}
+
 }  // namespace droxa::keld

@@ -116,6 +116,11 @@ using QVContainersReply =
 using QVAccountReply =
     std::function<void(const std::optional<QVAccountDescription> &account, const NSError &error)>;
 using QVBoolReply = std::function<void(bool result, const NSError &error)>;
+using QVShareOptionsReply =
+    std::function<void(bool isShared, bool isSharedByOthers, bool isSharedByItself,
+                       const std::optional<std::string> &sharedFolderName, const NSError &error)>;
+using QVRecordIDsReply =
+    std::function<void(const std::map<QVFileObjectID, CKRecordID> &recordIDs, const NSError &error)>;
 using QVStatusReply = std::function<void(const QVDaemonStatus &status, const NSError &error)>;
 
 // What the daemon offers. Errors are QVTessalyErrorDomain (tessaly/QVErrors.h) unless said otherwise.
@@ -174,6 +179,27 @@ class QVProtocol : public QVContentsProtocol, public QVShareOperationProtocol {
   // Whether the folder or alias of that number (QVFileObjectID::number()) may be shared; the error, when
   // there is one, tells why not.
   virtual void checkIfItemIsShareableWithInode(std::uint64_t inode, QVBoolReply reply) = 0;
+  // How an item is shared, as far as it is known here: whether it is shared at all, by itself or with a
+  // folder that it is below; whether by somebody else with this account; whether by itself. And the name of
+  // the uppermost shared folder that it is, or is below; nil when there is none. Errors as
+  // getURLForItemIdentifier's.
+  virtual void getShareOptionsOfItemIdentifier(const std::string &identifier, QVShareOptionsReply reply) = 0;
+  // Asks the cloud how the item is shared, so that what is known of it is as new as can be. The cloud's
+  // errors come as they are.
+  virtual void refreshSharingStateForItemIdentifier(const std::string &identifier, QVErrorReply reply) = 0;
+  // Accepts what somebody shares, by the share's URL. Replies where it is now, when it is there. 22 for what
+  // isn't the URL of a share; the cloud's errors come as they are.
+  virtual void acceptShareWithURL(const NSURL &shareURL, QVURLReply reply) = 0;
+
+  // The cloud's records that hold what these documents are. An identifier whose item isn't in the cloud, or
+  // isn't a document, is left out. Of the call: 2 when nobody is signed in.
+  virtual void resolveFileObjectIDsToContentRecordIDs(const std::vector<QVFileObjectID> &identifiers,
+                                                      QVRecordIDsReply reply) = 0;
+  // The documents folder of a container, that of an application among them; with
+  // `recreateDocumentsIfNeeded` it is made where it is missing, and the container with it. 22 for what can't
+  // be a container's identifier, 14 when there is none, POSIX errors of the file system.
+  virtual void getContainerURLForID(const std::string &containerID, bool recreateDocumentsIfNeeded,
+                                    QVURLReply reply) = 0;
 };
 
 }  // namespace droxa

@@ -250,6 +250,33 @@ class BlockingProxy final : public QVSyncProxy, public QVProtocol {
       daemon.checkIfItemIsShareableWithInode(inode, std::move(answer));
     });
   }
+  void getShareOptionsOfItemIdentifier(const std::string &identifier, QVShareOptionsReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVShareOptionsReply answer) {
+      daemon.getShareOptionsOfItemIdentifier(identifier, std::move(answer));
+    });
+  }
+  void refreshSharingStateForItemIdentifier(const std::string &identifier, QVErrorReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVErrorReply answer) {
+      daemon.refreshSharingStateForItemIdentifier(identifier, std::move(answer));
+    });
+  }
+  void acceptShareWithURL(const NSURL &shareURL, QVURLReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVURLReply answer) {
+      daemon.acceptShareWithURL(shareURL, std::move(answer));
+    });
+  }
+  void resolveFileObjectIDsToContentRecordIDs(const std::vector<QVFileObjectID> &identifiers,
+                                              QVRecordIDsReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVRecordIDsReply answer) {
+      daemon.resolveFileObjectIDsToContentRecordIDs(identifiers, std::move(answer));
+    });
+  }
+  void getContainerURLForID(const std::string &containerID, bool recreateDocumentsIfNeeded,
+                            QVURLReply reply) override {
+    wait(reply, [&](QVProtocol &daemon, QVURLReply answer) {
+      daemon.getContainerURLForID(containerID, recreateDocumentsIfNeeded, std::move(answer));
+    });
+  }
 
  private:
   template <class... Args, class Call>

@@ -126,6 +126,23 @@ class UnreachableDaemon final : public QVProtocol {
     failed_();
   }
   void checkIfItemIsShareableWithInode(std::uint64_t /*inode*/, QVBoolReply /*reply*/) override { failed_(); }
+  void getShareOptionsOfItemIdentifier(const std::string & /*identifier*/,
+                                       QVShareOptionsReply /*reply*/) override {
+    failed_();
+  }
+  void refreshSharingStateForItemIdentifier(const std::string & /*identifier*/,
+                                            QVErrorReply /*reply*/) override {
+    failed_();
+  }
+  void acceptShareWithURL(const NSURL & /*shareURL*/, QVURLReply /*reply*/) override { failed_(); }
+  void resolveFileObjectIDsToContentRecordIDs(const std::vector<QVFileObjectID> & /*identifiers*/,
+                                              QVRecordIDsReply /*reply*/) override {
+    failed_();
+  }
+  void getContainerURLForID(const std::string & /*containerID*/, bool /*recreateDocumentsIfNeeded*/,
+                            QVURLReply /*reply*/) override {
+    failed_();
+  }
 
  private:
   const std::function<void()> failed_;

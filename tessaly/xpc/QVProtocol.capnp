@@ -48,6 +48,20 @@ interface QVProtocol extends(Sharing.QVShareOperationProtocol) {
   allowDeletionAtURL @24 (url :Values.Url) -> (error :Values.Error);
   checkIfItemIsShareableWithInode @25 (inode :UInt64) -> (isShareable :Bool, error :Values.Error);
 
+  getShareOptionsOfItemIdentifier @26 (identifier :Data)
+      -> (isShared :Bool, isSharedByOthers :Bool, isSharedByItself :Bool, sharedFolderName :Data,
+          error :Values.Error);
+  refreshSharingStateForItemIdentifier @27 (identifier :Data) -> (error :Values.Error);
+  acceptShareWithURL @28 (url :Values.Url) -> (url :Values.Url, error :Values.Error);
+  resolveFileObjectIDsToContentRecordIDs @29 (identifiers :List(Data))
+      -> (recordIDs :List(ContentRecord), error :Values.Error);
+  getContainerURLForID @30 (containerID :Data, recreateDocumentsIfNeeded :Bool)
+      -> (url :Values.Url, error :Values.Error);
+
+  struct ContentRecord {
+    identifier @0 :Data;
+    recordID @1 :Sharing.RecordID;
+  }
   struct Information {
     key @0 :Data;
     value @1 :Data;

@@ -175,13 +175,4 @@ void QVProtocolProxy::getStatus(QVStatusReply reply) {
   });
 }
 
-void QVProtocolProxy::checkIfItemIsShareableWithInode(std::uint64_t inode, QVBoolReply reply) {
-  call(
-      &Client::checkIfItemIsShareableWithInodeRequest,
-      [inode](auto params, Session &) { params.setInode(inode); }, std::move(reply),
-      [](auto results, const RemoteObject &) {
-        return std::tuple(static_cast<bool>(results.getIsShareable()), getError(results));
-      });
-}
-
 }  // namespace droxa

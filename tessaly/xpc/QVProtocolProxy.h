@@ -47,6 +47,13 @@ class QVProtocolProxy final : public QVShareOperationCalls<schema::QVProtocol, Q
   void confirmDeletions(bool carryOut, QVContentsErrorReply reply) override;
 
   void checkIfItemIsShareableWithInode(std::uint64_t inode, QVBoolReply reply) override;
+  void getShareOptionsOfItemIdentifier(const std::string &identifier, QVShareOptionsReply reply) override;
+  void refreshSharingStateForItemIdentifier(const std::string &identifier, QVErrorReply reply) override;
+  void acceptShareWithURL(const NSURL &shareURL, QVURLReply reply) override;
+  void resolveFileObjectIDsToContentRecordIDs(const std::vector<QVFileObjectID> &identifiers,
+                                              QVRecordIDsReply reply) override;
+  void getContainerURLForID(const std::string &containerID, bool recreateDocumentsIfNeeded,
+                            QVURLReply reply) override;
 };
 
 }  // namespace droxa

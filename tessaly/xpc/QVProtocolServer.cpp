@@ -184,15 +184,4 @@ kj::Promise<void> QVProtocolServer::getStatus(GetStatusContext context) {
   });
 }
 
-kj::Promise<void> QVProtocolServer::checkIfItemIsShareableWithInode(
-    CheckIfItemIsShareableWithInodeContext context) {
-  return exported_.serve(context, [inode = context.getParams().getInode()](auto &object, auto reply) {
-    object.checkIfItemIsShareableWithInode(
-        inode, reply([](auto results, Session &, bool isShareable, const NSError &error) {
-          results.setIsShareable(isShareable);
-          setError(results, error);
-        }));
-  });
-}
-
 }  // namespace droxa

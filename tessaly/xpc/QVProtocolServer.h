@@ -46,6 +46,13 @@ class QVProtocolServer final : public schema::QVProtocol::Server, public QVShare
   kj::Promise<void> confirmDeletions(ConfirmDeletionsContext context) override;
 
   kj::Promise<void> checkIfItemIsShareableWithInode(CheckIfItemIsShareableWithInodeContext context) override;
+  kj::Promise<void> getShareOptionsOfItemIdentifier(GetShareOptionsOfItemIdentifierContext context) override;
+  kj::Promise<void> refreshSharingStateForItemIdentifier(
+      RefreshSharingStateForItemIdentifierContext context) override;
+  kj::Promise<void> acceptShareWithURL(AcceptShareWithURLContext context) override;
+  kj::Promise<void> resolveFileObjectIDsToContentRecordIDs(
+      ResolveFileObjectIDsToContentRecordIDsContext context) override;
+  kj::Promise<void> getContainerURLForID(GetContainerURLForIDContext context) override;
 
  private:
   Exported<QVProtocol> exported_;

@@ -139,6 +139,14 @@ class ScriptedDaemon final : public QVDaemonConnection {
       unexpected();
     }
     void checkIfItemIsShareableWithInode(std::uint64_t, QVBoolReply) override { unexpected(); }
+    void getShareOptionsOfItemIdentifier(const std::string &, QVShareOptionsReply) override { unexpected(); }
+    void refreshSharingStateForItemIdentifier(const std::string &, QVErrorReply) override { unexpected(); }
+    void acceptShareWithURL(const NSURL &, QVURLReply) override { unexpected(); }
+    void resolveFileObjectIDsToContentRecordIDs(const std::vector<QVFileObjectID> &,
+                                                QVRecordIDsReply) override {
+      unexpected();
+    }
+    void getContainerURLForID(const std::string &, bool, QVURLReply) override { unexpected(); }
     static void unexpected() { ADD_FAILURE() << "a call that this test doesn't expect"; }
   };
 

@@ -146,4 +146,55 @@ void FakeDaemon::checkIfItemIsShareableWithInode(std::uint64_t inode, QVBoolRepl
                  [=, reply = std::move(reply)] { reply(isShareable, error); });
 }
 
+void FakeDaemon::getShareOptionsOfItemIdentifier(const std::string &identifier, QVShareOptionsReply reply) {
+  const NSError error = begin("getShareOptionsOfItemIdentifier", identifier);
+  const FakeSharing::Answers answers = error ? FakeSharing::Answers() : sharing_->answers();
+  replies_->give("getShareOptionsOfItemIdentifier", [=, reply = std::move(reply)] {
+    reply(answers.isShared, answers.isSharedByOthers, answers.isSharedByItself, answers.sharedFolderName,
+          error);
+  });
+}
+
+void FakeDaemon::refreshSharingStateForItemIdentifier(const std::string &identifier, QVErrorReply reply) {
+  const NSError error = begin("refreshSharingStateForItemIdentifier", identifier);
+  replies_->give("refreshSharingStateForItemIdentifier", [=, reply = std::move(reply)] { reply(error); });
+}
+
+void FakeDaemon::acceptShareWithURL(const NSURL &shareURL, QVURLReply reply) {
+  const NSError error = begin("acceptShareWithURL", list(shareURL));
+  const NSURL url = error ? NSURL() : sharing_->answers().url;
+  replies_->give("acceptShareWithURL", [=, reply = std::move(reply)] { reply(url, error); });
+}
+
+void FakeDaemon::resolveFileObjectIDsToContentRecordIDs(const std::vector<QVFileObjectID> &identifiers,
+                                                        QVRecordIDsReply reply) {
+  std::string asked;
+  for (const QVFileObjectID &identifier : identifiers)
+    asked += (asked.empty() ? "" : ", ") + identifier.asString();
+  const NSError error = begin("resolveFileObjectIDsToContentRecordIDs", asked);
+  std::map<QVFileObjectID, CKRecordID> found;
+  const FakeSharing::Answers answers = sharing_->answers();
+  for (const QVFileObjectID &identifier : identifiers) {
+    const auto known = answers.recordIDs.find(identifier);
+    if (!error && known != answers.recordIDs.end()) found.insert(*known);
+  }
+  replies_->give("resolveFileObjectIDsToContentRecordIDs",
+                 [=, reply = std::move(reply)] { reply(found, error); });
+}
+
+void FakeDaemon::getContainerURLForID(const std::string &containerID, bool recreateDocumentsIfNeeded,
+                                      QVURLReply reply) {
+  NSError error =
+      begin("getContainerURLForID", containerID + ", recreate " + (recreateDocumentsIfNeeded ? "1" : "0"));
+  NSURL url;
+  {
+    const Lock lock(mutex_);
+    for (const QVContainerDescription &container : drive_.containers())
+      if (container.containerID == containerID) url = container.documentsURL;
+    if (!error && !url) error = qvc_errorNoSuchItem(containerID);
+    if (error) url = NSURL();
+  }
+  replies_->give("getContainerURLForID", [=, reply = std::move(reply)] { reply(url, error); });
+}
+
 }  // namespace droxa

@@ -151,6 +151,13 @@ class FakeDaemon final : public QVProtocol, public std::enable_shared_from_this<
                                                    const std::optional<CKRecordID> &recordID,
                                                    bool syncIfNeeded, QVSandboxingURLReply reply) override;
   void checkIfItemIsShareableWithInode(std::uint64_t inode, QVBoolReply reply) override;
+  void getShareOptionsOfItemIdentifier(const std::string &identifier, QVShareOptionsReply reply) override;
+  void refreshSharingStateForItemIdentifier(const std::string &identifier, QVErrorReply reply) override;
+  void acceptShareWithURL(const NSURL &shareURL, QVURLReply reply) override;
+  void resolveFileObjectIDsToContentRecordIDs(const std::vector<QVFileObjectID> &identifiers,
+                                              QVRecordIDsReply reply) override;
+  void getContainerURLForID(const std::string &containerID, bool recreateDocumentsIfNeeded,
+                            QVURLReply reply) override;
 
  private:
   friend class FakeTransfer;

@@ -276,6 +276,28 @@ class FakeDaemonProxy final : public QVProtocol {
     if (failed("checkIfItemIsShareableWithInode")) return;
     daemon_->checkIfItemIsShareableWithInode(inode, tracked(std::move(reply)));
   }
+  void getShareOptionsOfItemIdentifier(const std::string &identifier, QVShareOptionsReply reply) override {
+    if (failed("getShareOptionsOfItemIdentifier")) return;
+    daemon_->getShareOptionsOfItemIdentifier(identifier, tracked(std::move(reply)));
+  }
+  void refreshSharingStateForItemIdentifier(const std::string &identifier, QVErrorReply reply) override {
+    if (failed("refreshSharingStateForItemIdentifier")) return;
+    daemon_->refreshSharingStateForItemIdentifier(identifier, tracked(std::move(reply)));
+  }
+  void acceptShareWithURL(const NSURL &shareURL, QVURLReply reply) override {
+    if (failed("acceptShareWithURL")) return;
+    daemon_->acceptShareWithURL(shareURL, tracked(std::move(reply)));
+  }
+  void resolveFileObjectIDsToContentRecordIDs(const std::vector<QVFileObjectID> &identifiers,
+                                              QVRecordIDsReply reply) override {
+    if (failed("resolveFileObjectIDsToContentRecordIDs")) return;
+    daemon_->resolveFileObjectIDsToContentRecordIDs(identifiers, tracked(std::move(reply)));
+  }
+  void getContainerURLForID(const std::string &containerID, bool recreateDocumentsIfNeeded,
+                            QVURLReply reply) override {
+    if (failed("getContainerURLForID")) return;
+    daemon_->getContainerURLForID(containerID, recreateDocumentsIfNeeded, tracked(std::move(reply)));
+  }
 
  private:
   bool failed(const char *operation) {

@@ -1,11 +1,13 @@
 #pragma once
 
+#include <map>
 #include <memory>
 #include <optional>
 #include <string>
 #include <vector>
 
 #include "platform/foundation/ThreadSafety.h"
+#include "tessaly/QVFileObjectID.h"
 #include "tessaly/QVShareOperationProtocol.h"
 
 namespace droxa {
@@ -24,6 +26,9 @@ class FakeSharing {
     std::shared_ptr<const FPSandboxingURLWrapper> urlWrapper;
     bool isShareable = true;
     NSError notShareable;  // told with false
+    bool isShared = false, isSharedByOthers = false, isSharedByItself = false;
+    std::optional<std::string> sharedFolderName;
+    std::map<QVFileObjectID, CKRecordID> recordIDs;  // those that are asked for are told
   };
 
   void setAnswers(Answers answers) {
