@@ -100,9 +100,9 @@ QVFileProviderPlendaCollaboration::Progress
 QVFileProviderPlendaCollaborationProxy::fetchFolderSharingStateWithCompletionHandler(
     QVCollaborationStateHandler handler) {
   Daemon([handler](const NSError &error) { handler(false, error); })
-      ->getShareOptionsOfItemIdentifier(_itemIdentifier,
-                                        [handler](bool a, bool /*b*/, bool c, const Text & /*folder*/,
-                                                  const NSError &error) { handler(a && !c, error); });
+      ->getShareOptionsOfItemIdentifier(
+          _itemIdentifier, [handler](bool isShared, bool /*byOthers*/, bool byItself, const Text & /*folder*/,
+                                     const NSError &error) { handler(isShared && !byItself, error); });
   return nullptr;
 }
 
@@ -111,9 +111,9 @@ QVFileProviderPlendaCollaborationProxy::fetchSharedFolderInfoWithCompletionHandl
     QVCollaborationFolderHandler handler) {
   Daemon([handler](const NSError &error) { handler(false, std::nullopt, error); })
       ->getShareOptionsOfItemIdentifier(
-          _itemIdentifier, [handler](bool a, bool /*b*/, bool c, const Text &folder, const NSError &error) {
-            handler(a && !c, folder, error);
-          });
+          _itemIdentifier,
+          [handler](bool isShared, bool /*byOthers*/, bool byItself, const Text &folder,
+                    const NSError &error) { handler(isShared && !byItself, folder, error); });
   return nullptr;
 }
 

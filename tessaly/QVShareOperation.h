@@ -125,7 +125,7 @@ void QVShareOperation<Values...>::cancel() {
   {
     const Lock lock(mutex_);
     if (outcome_) return;
-    remote = remote_;
+    remote.swap(remote_);
   }
   // On the pool: whoever cancels may hold what the completion needs.
   dispatch_async_global([self = this->shared_from_this(), remote] {
