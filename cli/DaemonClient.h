@@ -29,6 +29,8 @@ class DaemonClient {
   NSError setPinned(const NSURL &url, bool isPinned);
   NSError confirmDeletions(bool carryOut);
 
+  CallResult<NSURL> acceptShare(const NSURL &shareURL);  // where it is now
+
   // These take as long as they take: the answer is waited for by the caller.
   std::shared_ptr<AnswerSlot<QVContentsResult>> evict(const NSURL &url);
   std::shared_ptr<AnswerSlot<bool>> waitForUpload(const NSURL &url);  // nil: everything
