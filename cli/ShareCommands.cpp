@@ -29,13 +29,14 @@ ShareCommands::ShareCommands(CLI::App &app) : app_(app) {
   add("participants", "Shows with whom it is shared");
   addChanges();
   CLI::App *accept =
-      share_->add_subcommand("accept", "Takes what somebody shares, by its link; prints where it is then");
+      share_->add_subcommand("accept", "Takes what somebody shares, by its link; prints where it is then")
+          ->fallthrough();
   accept->add_option("url", url_, "The link")->required();
   accept->add_flag("--json", arguments_.json, "One JSON object");
 }
 
 CLI::App *ShareCommands::add(const char *name, const char *description) {
-  CLI::App *command = share_->add_subcommand(name, description);
+  CLI::App *command = share_->add_subcommand(name, description)->fallthrough();
   command->add_option("item", arguments_.item, kItemArgumentHelp)->required();
   command->add_flag("--json", arguments_.json, "One JSON object");
   return command;

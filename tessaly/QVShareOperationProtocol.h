@@ -40,6 +40,8 @@ using QVSandboxingURLReply = std::function<void(
 // call is cancelled by; null: nobody wants to know. What is asked for may be nil wherever it can: the answer
 // is the daemon's. A reply is called exactly once, on any thread, unless the connection fails first: then the
 // error handler of the proxy is called instead. A value that isn't there is nil, the error is the last one.
+// Of an item that isn't shared, toCopySharingInfoAtURL's error is QVErrorNoShare; its URL is nil unless the
+// daemon has a reason to hand one out.
 class QVShareOperationProtocol {
  public:
   using Operation = std::shared_ptr<QVOperationClient>;
