@@ -17,6 +17,7 @@
 #include "keld/sync/CloudImport.h"
 #include "keld/sync/DeviceName.h"
 #include "platform/cloudkit/EmbeddedCloud.h"
+#include "platform/foundation/DescriptorLimit.h"
 #include "platform/foundation/Paths.h"
 #include "tessaly/QVLog.h"
 
@@ -134,6 +135,7 @@ int run(int argc, char **argv) {
   for (const int signal : {SIGTERM, SIGINT, SIGHUP}) sigaddset(&ending, signal);
   ::pthread_sigmask(SIG_BLOCK, &ending, nullptr);
   ::signal(SIGPIPE, SIG_IGN);
+  DroxaRaiseDescriptorLimit();
   ::mallopt(M_ARENA_MAX, 4);  // many short-lived threads would each keep memory of their own
   return serve(arguments, ::signalfd(-1, &ending, SFD_CLOEXEC));
 }
