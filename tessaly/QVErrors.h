@@ -27,6 +27,9 @@ inline constexpr std::int64_t QVErrorUnsentChanges = 36;     // the cloud doesn'
 inline constexpr std::int64_t QVErrorDocumentInUse = 37;
 inline constexpr std::int64_t QVErrorPinned = 38;
 inline constexpr std::int64_t QVErrorSharingUnavailable = 39;  // this daemon's cloud takes no shares
+inline constexpr std::int64_t QVErrorBusy = 40;  // too much is under way already; to be asked again later
+inline constexpr std::int64_t QVErrorNotShareable =
+    41;  // the item is of a kind, or in a place, that isn't shared
 
 // "Operation not supported" as clients of the sharing service know it, of NSPOSIXErrorDomain: the protocol's
 // number, whatever this system's own for it is.

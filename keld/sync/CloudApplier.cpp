@@ -40,7 +40,7 @@ std::string DigestOfFile(int descriptor) {
 }
 
 CloudApplier::CloudApplier(const SyncContext &context, ConflictCopies &conflicts)
-    : context_(context), conflicts_(conflicts) {}
+    : context_(context), conflicts_(conflicts), shares_(context.store, context.states) {}
 
 NSError CloudApplier::fetchAndApply(const CKCallContext &call) {
   undoUnfinished();
@@ -57,6 +57,7 @@ bool CloudApplier::hasFetchedAll() {
 void CloudApplier::beginFetchOfAll() {
   fetchesAll_ = true;
   seen_.clear();
+  seenShares_.clear();
   context_.store.setText(kToken, "");
   context_.store.setNumber(kFetchesAll, 1);
 }
@@ -95,7 +96,7 @@ NSError CloudApplier::fetchPages(const CKCallContext &call) {
 NSError CloudApplier::applyPage(const CKZoneChanges &page) {
   std::vector<DocumentRecord> documents;
   for (const CKRecord &record : page.changedRecords) {
-    if (record.recordType == CKRecordTypeShare) continue;  // is no item
+    if (record.recordType == CKRecordTypeShare) continue;  // is no item: noteShares()
     // One that makes no sense isn't one that was deleted.
     if (fetchesAll_) seen_.insert(record.recordID.recordName);
     auto document = ReadRecord(record);
@@ -113,9 +114,12 @@ NSError CloudApplier::applyPage(const CKZoneChanges &page) {
   beginUnfinished(documents);
   context_.store.transaction([&] {
     applyAll(documents);
-    for (const CKDeletedRecord &deleted : page.deletedRecords) remove(deleted.recordID.recordName);
+    noteShares(page);
+    for (const CKDeletedRecord &deleted : page.deletedRecords)
+      if (deleted.recordType != CKRecordTypeShare) remove(deleted.recordID.recordName);
     if (endsAll) {
       removeUnseen();
+      shares_.forgetUnseen(DriveZone(), seenShares_);
       context_.store.setNumber(kFetchesAll, 0);
     }
     if (!page.moreComing) removeFolders();
@@ -127,9 +131,24 @@ NSError CloudApplier::applyPage(const CKZoneChanges &page) {
   if (endsAll) {
     fetchesAll_ = false;
     seen_.clear();
+    seenShares_.clear();
   }
   finishBatch();
   return NSError();
+}
+
+void CloudApplier::noteShares(const CKZoneChanges &page) {
+  for (const CKRecord &record : page.changedRecords) {
+    if (record.recordType != CKRecordTypeShare) continue;
+    if (fetchesAll_) seenShares_.insert(record.recordID.recordName);
+    if (const auto share = CKShare::shareWithRecord(record))
+      shares_.note(*share);
+    else
+      os_log_error(qvc_default_log(), "[ERROR] the cloud's share %s makes no sense and is left alone",
+                   record.recordID.recordName);
+  }
+  for (const CKDeletedRecord &deleted : page.deletedRecords)
+    if (deleted.recordType == CKRecordTypeShare) shares_.forget(deleted.recordID);
 }
 
 // What the cloud doesn't have any more was deleted while nobody could tell. A cloud that has nothing at all
