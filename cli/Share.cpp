@@ -2,13 +2,13 @@
 
 #include <algorithm>
 
+#include "cli/DaemonClient.h"
 #include "cli/ExitStatus.h"
 #include "cli/ItemArgument.h"
 #include "cli/ShareClient.h"
 #include "cli/ShareText.h"
 #include "cli/Text.h"
 #include "platform/fileprovider/NSFileProviderError.h"
-#include "tessaly/QVErrors.h"
 
 namespace droxa {
 
@@ -26,8 +26,14 @@ int refuse(const CommandContext &context, const std::string &item, const std::st
   return kExitFailure;
 }
 
-// The way to the share of the item that the argument stands for; null with the exit status set.
-std::unique_ptr<ShareClient> clientOf(CommandContext &context, const std::string &argument, int *status) {
+// An item, and the way to its share.
+struct SharedItem {
+  std::string identifier;
+  std::unique_ptr<ShareClient> client;  // null: there is none
+};
+
+// That of the item that the argument stands for; without a client, the exit status is set.
+SharedItem sharedItem(CommandContext &context, const std::string &argument, int *status) {
   const auto found = resolveItem(*context.host, argument);
   NSError error = found.error;
   if (!error) {
@@ -35,7 +41,7 @@ std::unique_ptr<ShareClient> clientOf(CommandContext &context, const std::string
     const bool isFolder = fields.kind == NSFileProviderItemKind::folder;
     if (!isFolder && fields.kind != NSFileProviderItemKind::document) {
       *status = refuse(context, argument, "a link isn't shared; share what it leads to");
-      return nullptr;
+      return {};
     }
     const auto url = isFolder ? context.host->url(fields.itemIdentifier) : CallResult<NSURL>();
     error = url.error;
@@ -44,12 +50,12 @@ std::unique_ptr<ShareClient> clientOf(CommandContext &context, const std::string
     if (!error) {
       auto made = isFolder ? folderShare(context, fields.itemIdentifier, url.value)
                            : documentShare(context, fields.itemIdentifier);
-      if (made.value) return std::move(made.value);
+      if (made.value) return {fields.itemIdentifier, std::move(made.value)};
       error = made.error;
     }
   }
   *status = reportShareError(context, argument, error);
-  return nullptr;
+  return {};
 }
 
 void print(const CommandContext &context, const ShareArguments &arguments, const CKShare &share) {
@@ -57,21 +63,37 @@ void print(const CommandContext &context, const ShareArguments &arguments, const
               << std::flush;
 }
 
+// What is to be changed of an item that is shared by way of a folder above it is that folder's share.
+bool refuseForFolder(CommandContext &context, const ShareArguments &arguments, const std::string &identifier,
+                     int *status) {
+  const auto options = DaemonClient(context.daemon, context.timeout).shareOptions(identifier);
+  if (options.error || !options.value.isShared || options.value.isSharedByItself) return false;
+  *status = refuse(context, arguments.item,
+                   "it is shared with the folder " + escapedText(options.value.folder.value_or("above it")) +
+                       " that it is in; change that folder's share");
+  return true;
+}
+
+enum class Want { toLook, toChange };
+
 // Runs `command` with the item's share, whichever there is.
 template <class Command>
-int withShare(CommandContext &context, const ShareArguments &arguments, const Command &command) {
+int withShare(CommandContext &context, const ShareArguments &arguments, Want want, const Command &command) {
   int status = kExitSuccess;
-  const auto client = clientOf(context, arguments.item, &status);
-  if (!client) return status;
-  const auto share = client->fetch();
+  const SharedItem item = sharedItem(context, arguments.item, &status);
+  if (!item.client) return status;
+  const auto share = item.client->fetch();
   if (share.error) return reportShareError(context, arguments.item, share.error);
-  return command(*client, share.value);
+  const bool isRefused = want == Want::toChange && share.value.isKnownToServer() &&
+                         refuseForFolder(context, arguments, item.identifier, &status);
+  return isRefused ? status : command(*item.client, share.value);
 }
 
 // The same for what has to be shared already.
 template <class Command>
-int withExistingShare(CommandContext &context, const ShareArguments &arguments, const Command &command) {
-  return withShare(context, arguments, [&](ShareClient &client, const CKShare &share) {
+int withExistingShare(CommandContext &context, const ShareArguments &arguments, Want want,
+                      const Command &command) {
+  return withShare(context, arguments, want, [&](ShareClient &client, const CKShare &share) {
     if (share.isKnownToServer()) return command(client, share);
     return refuse(context, arguments.item, "it isn't shared; `droxa share create` shares it");
   });
@@ -105,14 +127,14 @@ int refuseUnknown(const CommandContext &context, const ShareArguments &arguments
 }  // namespace
 
 int runShareShow(CommandContext &context, const ShareArguments &arguments) {
-  return withShare(context, arguments, [&](ShareClient &, const CKShare &share) {
+  return withShare(context, arguments, Want::toLook, [&](ShareClient &, const CKShare &share) {
     print(context, arguments, share);
     return kExitSuccess;
   });
 }
 
 int runShareCreate(CommandContext &context, const ShareArguments &arguments) {
-  return withShare(context, arguments, [&](ShareClient &client, const CKShare &share) {
+  return withShare(context, arguments, Want::toChange, [&](ShareClient &client, const CKShare &share) {
     if (!share.isKnownToServer()) return saveAndPrint(context, arguments, client, share);
     print(context, arguments, share);  // it is shared already, which is what was asked for
     return kExitSuccess;
@@ -121,7 +143,7 @@ int runShareCreate(CommandContext &context, const ShareArguments &arguments) {
 
 int runShareAdd(CommandContext &context, const ShareArguments &arguments,
                 const std::vector<std::string> &names, CKShareParticipantPermission permission) {
-  return withShare(context, arguments, [&](ShareClient &client, CKShare share) {
+  return withShare(context, arguments, Want::toChange, [&](ShareClient &client, CKShare share) {
     for (const std::string &name : names) {
       auto known = participantNamed(share, name);
       if (known == share.participants.end()) {
@@ -140,7 +162,7 @@ int runShareAdd(CommandContext &context, const ShareArguments &arguments,
 
 int runSharePermission(CommandContext &context, const ShareArguments &arguments,
                        const std::optional<std::string> &name, CKShareParticipantPermission permission) {
-  return withExistingShare(context, arguments, [&](ShareClient &client, CKShare share) {
+  return withExistingShare(context, arguments, Want::toChange, [&](ShareClient &client, CKShare share) {
     if (!name) {
       share.publicPermission = permission;
       return saveAndPrint(context, arguments, client, share);
@@ -155,7 +177,7 @@ int runSharePermission(CommandContext &context, const ShareArguments &arguments,
 }
 
 int runShareLink(CommandContext &context, const ShareArguments &arguments) {
-  return withExistingShare(context, arguments, [&](ShareClient &client, const CKShare &share) {
+  return withExistingShare(context, arguments, Want::toLook, [&](ShareClient &client, const CKShare &share) {
     const auto link = client.link(share);
     if (link.error) return reportShareError(context, arguments.item, link.error);
     context.out << escapedText(link.value.absoluteString()) << std::endl;
@@ -164,7 +186,7 @@ int runShareLink(CommandContext &context, const ShareArguments &arguments) {
 }
 
 int runShareSave(CommandContext &context, const ShareArguments &arguments, const std::string &title) {
-  return withExistingShare(context, arguments, [&](ShareClient &client, CKShare share) {
+  return withExistingShare(context, arguments, Want::toChange, [&](ShareClient &client, CKShare share) {
     share.fields[CKShareTitleKey] = title;
     return saveAndPrint(context, arguments, client, share);
   });
@@ -172,7 +194,7 @@ int runShareSave(CommandContext &context, const ShareArguments &arguments, const
 
 int runShareRemove(CommandContext &context, const ShareArguments &arguments,
                    const std::optional<std::string> &name) {
-  return withExistingShare(context, arguments, [&](ShareClient &client, CKShare share) {
+  return withExistingShare(context, arguments, Want::toChange, [&](ShareClient &client, CKShare share) {
     if (!name) {
       const NSError error = client.withdraw(share);
       if (error) return reportShareError(context, arguments.item, error);
@@ -192,7 +214,7 @@ int runShareRemove(CommandContext &context, const ShareArguments &arguments,
 }
 
 int runShareParticipants(CommandContext &context, const ShareArguments &arguments) {
-  return withExistingShare(context, arguments, [&](ShareClient &, const CKShare &share) {
+  return withExistingShare(context, arguments, Want::toLook, [&](ShareClient &, const CKShare &share) {
     if (arguments.json) {
       print(context, arguments, share);
       return kExitSuccess;

@@ -11,7 +11,7 @@ set(client_package ${CMAKE_INSTALL_LIBDIR}/cmake/Droxa)
 install(TARGETS ${DROXA_CLIENT_LIBRARIES} ARCHIVE DESTINATION ${DROXA_CLIENT_ARCHIVES} COMPONENT client)
 # Adapters' and implementations' own headers stay behind: they name the libraries beneath.
 install(DIRECTORY platform tessaly DESTINATION ${DROXA_CLIENT_INCLUDES} COMPONENT client
-  FILES_MATCHING PATTERN "*.h" REGEX "Interface\\.h$|Interfaces\\.h$"
+  FILES_MATCHING PATTERN "*.h"
   PATTERN "platform/xpc/capnp" EXCLUDE PATTERN "platform/cloudkit/embedded" EXCLUDE
   PATTERN "*Adapter.h" EXCLUDE PATTERN "tessaly/xpc/QVProtocol*" EXCLUDE PATTERN "tessaly/xpc/QVPassed*" EXCLUDE
   PATTERN "tessaly/xpc/QVShare*" EXCLUDE PATTERN "tessaly/xpc/*Values.h" EXCLUDE)

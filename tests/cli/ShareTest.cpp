@@ -258,7 +258,8 @@ TEST_F(ShareCommand, aFolderGoesThroughTheShareOperations) {
   foldersShareIs(shared());
   EXPECT_EQ(with(runShareShow, "in"), 0) << err.str();
   EXPECT_EQ(out.str().find("in: shared\n"), 0U);
-  EXPECT_EQ(fake.daemon->calls(), Words{"startOperation_toCopySharingInfoAtURL(file:///replica/in)"});
+  EXPECT_EQ(fake.daemon->calls(), Words{"startOperation_toCopySharingInfoAtURL(file:///replica/in)"})
+      << "looking asks nothing else";
   EXPECT_EQ(add({"eve"}, "in"), 0) << err.str();
   EXPECT_EQ(fake.daemon->sharing().lastShare()->participants.back().userIdentity.accountName, "eve");
   EXPECT_EQ(with(runShareLink, "in"), 0);
@@ -271,6 +272,22 @@ TEST_F(ShareCommand, aFolderGoesThroughTheShareOperations) {
   foldersShareIs(unshared());
   EXPECT_EQ(with(runShareCreate, "in"), 0) << err.str();
   EXPECT_EQ(fake.daemon->log().count("createSharingInfoForURL"), 1U);
+}
+
+TEST_F(ShareCommand, whatIsSharedWithAFolderIsChangedThere) {
+  FakeSharing::Answers answers;
+  answers.isShared = true;
+  answers.sharedFolderName = "Plans";
+  fake.daemon->sharing().setAnswers(answers);
+  EXPECT_EQ(with(runShareShow), 0) << "it is shown";
+  EXPECT_EQ(remove(std::nullopt), 1);
+  EXPECT_TRUE(said("it is shared with the folder Plans that it is in; change that folder's share"))
+      << err.str();
+  EXPECT_EQ(add({"eve"}), 1);
+  EXPECT_EQ(service->log.count("save") + service->log.count("unshare"), 0U);
+  answers.isSharedByItself = true;
+  fake.daemon->sharing().setAnswers(answers);
+  EXPECT_EQ(remove(std::nullopt), 0);
 }
 
 TEST_F(ShareCommand, aMissingEntitlementIsToldWithTheFileThatGrantsIt) {

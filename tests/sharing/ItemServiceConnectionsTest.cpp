@@ -194,7 +194,6 @@ TEST_F(ItemServiceConnections, whereThePersonaCantBeAdoptedTheEndIsToldAllTheSam
   managed.mayUseArbitraryPersonas = false;
   UMSetConfiguration(managed);
   capture.clear();
-  const std::weak_ptr<NSXPCListener> none;
   lastConnection()->invalidate();
   const std::string refused = "debug: [DEBUG] Not allowed to adopt persona - should fallback persona";
   const std::string end = "debug: [DEBUG] sharing service source connection ";
