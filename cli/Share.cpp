@@ -180,7 +180,7 @@ int runShareLink(CommandContext &context, const ShareArguments &arguments) {
   return withExistingShare(context, arguments, Want::toLook, [&](ShareClient &client, const CKShare &share) {
     const auto link = client.link(share);
     if (link.error) return reportShareError(context, arguments.item, link.error);
-    context.out << escapedText(link.value.absoluteString()) << std::endl;
+    context.out << linkText(arguments.item, link.value, arguments.json) << std::flush;
     return kExitSuccess;
   });
 }

@@ -110,4 +110,10 @@ std::string shareJSON(const std::string &item, const CKShare &share) {
   return object.dump(-1, ' ', false, Json::error_handler_t::replace) + "\n";
 }
 
+std::string linkText(const std::string &item, const NSURL &link, bool json) {
+  if (!json) return escapedText(link.absoluteString()) + "\n";
+  const Json object{{"item", item}, {"link", link ? Json(link.absoluteString()) : Json(nullptr)}};
+  return object.dump(-1, ' ', false, Json::error_handler_t::replace) + "\n";
+}
+
 }  // namespace droxa

@@ -17,5 +17,7 @@ std::string participantLine(const CKShareParticipant &participant);
 // none.
 std::string shareLines(const std::string &item, const CKShare &share);
 std::string shareJSON(const std::string &item, const CKShare &share);
+// The link alone, as a line or one JSON object.
+std::string linkText(const std::string &item, const NSURL &link, bool json);
 
 }  // namespace droxa

@@ -229,6 +229,8 @@ TEST_F(ShareCommand, theLinkIsPrintedAlone) {
   service->url = NSURL::URLWithString("https://drive.example/s/1");
   EXPECT_EQ(with(runShareLink), 0);
   EXPECT_EQ(out.str(), "https://drive.example/s/1\n");
+  EXPECT_EQ(with(runShareLink, "a.txt", true), 0);
+  EXPECT_EQ(Json::parse(out.str()), Json::parse(R"({"item": "a.txt", "link": "https://drive.example/s/1"})"));
 }
 
 TEST_F(ShareCommand, aTitleIsSaved) {
