@@ -13,6 +13,7 @@
 #include "cli/ExitStatus.h"
 #include "cli/ItemArgument.h"
 #include "cli/Run.h"
+#include "cli/ShareCommands.h"
 #include "platform/foundation/Paths.h"
 #include "tessaly/QVDaemonConnection.h"
 
@@ -64,12 +65,14 @@ class CommandLine {
     addItemCommands();
     contents_.emplace(app_);
     actions_.emplace(app_);
+    sharing_.emplace(app_);
     addSystemCommands();
   }
 
   CLI::App &app() { return app_; }
   const ContentsCommands &contents() const { return *contents_; }
   const ActionCommands &actions() const { return *actions_; }
+  const ShareCommands &sharing() const { return *sharing_; }
   bool has(const char *command) const { return app_.got_subcommand(command); }
   bool hasAccount(const char *command) const { return account_->got_subcommand(command); }
   bool hasDepth() const { return depth_->count() > 0; }
@@ -184,6 +187,7 @@ class CommandLine {
   CLI::App app_;
   std::optional<ContentsCommands> contents_;
   std::optional<ActionCommands> actions_;
+  std::optional<ShareCommands> sharing_;
   CLI::App *account_ = nullptr;
   CLI::Option *depth_ = nullptr;
   CLI::Option *process_ = nullptr;
@@ -235,6 +239,7 @@ int runCommand(const CommandLine &line, const Words &words, std::ostream &out, s
   if (line.has("watch")) return runWatch(context, words.argument, words.json);
   if (line.contents().isChosen()) return line.contents().run(context);
   if (line.actions().isChosen()) return line.actions().run(context);
+  if (line.sharing().isChosen()) return line.sharing().run(context);
   if (line.has("status"))
     return words.items.empty() ? runStatus(context, words.json)
                                : runItemStatus(context, words.items, words.json);

@@ -45,6 +45,9 @@ class ControlClient {
   // An action that hasn't begun: it does when it is waited for (cli/Acting.h).
   CallResult<std::shared_ptr<FPDAction>> performAction(const FPDActionRequest &request);
 
+  // A service on the item, to be held until the first reply over its connection has come.
+  CallResult<std::shared_ptr<FPDService>> service(const std::string &name, const std::string &identifier);
+
   CallResult<Page> page(const Enumerator &enumerator, const NSData &page);
   CallResult<NSData> anchor(const Enumerator &enumerator);
   CallResult<Changes> changes(const Enumerator &enumerator, const NSData &anchor);

@@ -1,5 +1,10 @@
 #pragma once
 
+#include <cstdint>
+#include <functional>
+#include <string>
+#include <type_traits>
+
 #include "platform/foundation/NSError.h"
 #include "platform/oslog/LogFormat.h"
 
@@ -16,7 +21,7 @@ inline constexpr std::int64_t QVErrorDatabase = 30;
 inline constexpr std::int64_t QVErrorUnreadable = 31;          // the file system refused to show the item
 inline constexpr std::int64_t QVErrorChangeTokenExpired = 32;  // of the working-set feed
 inline constexpr std::int64_t QVErrorShuttingDown = 33;
-inline constexpr std::int64_t QVErrorCancelled = 34;         // a transfer that nobody wants any more
+inline constexpr std::int64_t QVErrorCancelled = 34;  // a transfer or an operation that nobody wants any more
 inline constexpr std::int64_t QVErrorChecksumMismatch = 35;  // what came isn't what the cloud promised
 inline constexpr std::int64_t QVErrorUnsentChanges = 36;     // the cloud doesn't have the contents yet
 inline constexpr std::int64_t QVErrorDocumentInUse = 37;
@@ -26,7 +31,13 @@ inline constexpr std::int64_t QVErrorBusy = 40;  // too much is under way alread
 inline constexpr std::int64_t QVErrorNotShareable =
     41;  // the item is of a kind, or in a place, that isn't shared
 
+// "Operation not supported" as clients of the sharing service know it, of NSPOSIXErrorDomain: the protocol's
+// number, whatever this system's own for it is.
+inline constexpr int QVPOSIXErrorNotSupported = 45;
+
 NSError qvc_errorLoggedOut();
+// Of NSPOSIXErrorDomain.
+NSError qv_errorWithPOSIXCode(int code, std::string description = {});
 // Describes it by a checked format (platform/oslog/LogFormat.h).
 template <class... Args>
 NSError qv_errorWithDomain(const char *domain, std::int64_t code,
@@ -35,5 +46,13 @@ NSError qv_errorWithDomain(const char *domain, std::int64_t code,
 }
 NSError qvc_error(std::int64_t code, std::string description);
 NSError qvc_errorNoSuchItem(const std::string &asked);
+
+// Whether it is one of QVTessalyErrorDomain with that code; a nil error isn't.
+bool qv_isTessalyErrorCode(const NSError &error, std::int64_t code);
+// Whether the cloud has no such record (CKErrorDomain).
+bool qvc_isCloudKitUnknownItemError(const NSError &error);
+// Whether `test` holds for the error or one of those beneath it: what the cloud said may be wrapped in what
+// the daemon makes of it. Not for a nil error, for which the test isn't asked.
+bool qvc_checkErrorsFromCloudKit(const NSError &error, const std::function<bool(const NSError &error)> &test);
 
 }  // namespace droxa

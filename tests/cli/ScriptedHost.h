@@ -50,10 +50,9 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
   }
   // Done by `act`, as the extension would.
   void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
-  void listenerEndpointForServiceName(const std::string &, const std::string &,
-                                      FPDServiceCompletion completion) override {
-    completion(nullptr, NSError(NSPOSIXErrorDomain, ENOSYS));
-  }
+  // As the item offers them: `services` by name.
+  void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
+                                      FPDServiceCompletion completion) override;
 
   std::map<std::string, NSFileProviderItemFields> items;  // by identifier
   std::map<std::string, std::string> paths;               // to identifiers
@@ -63,6 +62,7 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
   FPDStatus status;
   std::function<std::shared_ptr<FPDProviding>(const NSURL &url, std::uint64_t readingOptions)> provide;
   std::function<std::shared_ptr<FPDAction>(const FPDActionRequest &request)> act;
+  std::map<std::string, std::function<std::shared_ptr<FPDService>(const std::string &identifier)>> services;
   std::vector<FPDActionRequest> requests;                                      // of actions
   std::function<void(const std::string &container, std::size_t page)> onPage;  // before it is answered
   std::shared_ptr<FPDWatchObserver> observer;
