@@ -12,7 +12,7 @@
 #include "keld/contents/ContentsStorage.h"
 #include "keld/sync/DeviceName.h"
 #include "keld/sync/DriveAccount.h"
-#include "platform/cloudkit/EmbeddedCloud.h"
+#include "keld/sync/DriveCloud.h"
 #include "platform/fileprovider/FPReplacements.h"
 #include "platform/foundation/NSDate.h"
 #include "tessaly/QVErrors.h"
@@ -101,7 +101,7 @@ void Keld::openSync() {
   if (!cloud) {
     const std::string folder = options.cloudFolder.empty() ? home_.root() + "/cloud" : options.cloudFolder;
     NSError error;
-    cloud = EmbeddedCloud::open(folder, driveAccount_, options.device, &error);
+    cloud = OpenDriveCloud(home_, folder, driveAccount_, options.device, &error);
     if (!cloud) throw std::runtime_error(error.localizedDescription());
   }
   const auto readItems = [this](const std::function<void(ItemQueries &)> &work) {

@@ -10,7 +10,6 @@ namespace droxa::keld {
 namespace {
 
 constexpr char kAccount[] = "driveAccount";
-constexpr char kCloudIdentifier[] = "cloudIdentifier";
 
 // "" for a home that has never met its cloud.
 std::string accountBefore(const DroxaHome &home) {
@@ -19,7 +18,7 @@ std::string accountBefore(const DroxaHome &home) {
   SyncStore store(path);
   const std::string known = store.text(kAccount);
   // Drives of before this was remembered are those of who runs them.
-  if (known.empty() && !store.text(kCloudIdentifier).empty()) return AccountKeeper::localUserName();
+  if (known.empty() && !store.text(kSyncCloudIdentifier).empty()) return AccountKeeper::localUserName();
   return known;
 }
 

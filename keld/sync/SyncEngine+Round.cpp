@@ -18,7 +18,6 @@ constexpr std::chrono::milliseconds kCallTimeout{60'000};
 constexpr std::chrono::milliseconds kNoPause{0}, kFirstAgain{25}, kLongestAgain{5'000};
 constexpr std::uint64_t kVersionsAtATime = 1000;
 constexpr std::chrono::milliseconds kScanPoll{100};
-constexpr char kCloudIdentifier[] = "cloudIdentifier";
 
 }  // namespace
 
@@ -125,7 +124,7 @@ void SyncEngine::afterFirstScan() {
 }
 
 bool SyncEngine::isSameCloud() {
-  const std::string known = store_.text(kCloudIdentifier);
+  const std::string known = store_.text(kSyncCloudIdentifier);
   return known.empty() || cloud_->cloudIdentifier().description() == known;
 }
 
@@ -138,7 +137,7 @@ bool SyncEngine::prepareCloud() {
     return false;
   }
   // Each time: it may have been replaced while this runs.
-  const std::string known = store_.text(kCloudIdentifier);
+  const std::string known = store_.text(kSyncCloudIdentifier);
   if (!known.empty() && known != text) {
     noteCloudProblem(fetching,
                      CKErrorMake(CKErrorCode::invalidArguments,
@@ -147,7 +146,7 @@ bool SyncEngine::prepareCloud() {
     return false;
   }
   if (isCloudReady_) return true;
-  if (known.empty()) store_.setText(kCloudIdentifier, text);
+  if (known.empty()) store_.setText(kSyncCloudIdentifier, text);
   const NSError problem = cloud_->saveZone(DriveZone(), call(kCallTimeout));
   if (problem) {
     noteCloudProblem(fetching, problem);

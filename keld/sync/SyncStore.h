@@ -17,6 +17,9 @@
 
 namespace droxa::keld {
 
+// The key of the text that tells which cloud the drive is in; "" before it met one.
+inline constexpr char kSyncCloudIdentifier[] = "cloudIdentifier";
+
 // What a document's contents are, as the cloud tells them.
 struct ContentVersion {
   std::uint64_t size = 0;
