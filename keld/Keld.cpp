@@ -63,6 +63,9 @@ void Keld::open() {
   readers_ = std::make_unique<ReaderPool>(databasePath_);
   account_ = std::make_unique<AccountKeeper>(
       home_.configuration(), [this](const std::string &name) { return identifierForAccount(name); });
+  SharedZones::readTitles(home_.state(), [this](const std::string &container, const std::string &title) {
+    containers_.setTitle(container, title);
+  });
   keeper_->start();
   openSync();
   const NSError error = account_->load();
@@ -101,22 +104,46 @@ void Keld::openSync() {
     return read([&](ItemQueries &queries, const ItemPresenter &) { work(queries); });
   };
   sync_ = std::make_shared<SyncEngine>(
-      replicaPath_, home_.state() + "/sync.sqlite", std::move(cloud), [this] { return keeper_.get(); },
-      readItems, options);
+      replicaPath_, home_.state() + "/sync.sqlite", cloud, [this] { return keeper_.get(); }, readItems,
+      options);
   ContentsServiceHost host;
   host.replicaPath = replicaPath_;
   host.keeper = [this]() -> Keeper & { return *keeper_; };
   host.read = readItems;
   host.pathBelowReplica = [this](const NSURL &url) { return pathBelowReplica(url); };
   host.isSignedIn = [this] { return account_->isSignedIn(); };
+  host.sharedEngines = [this] { return sharedZones_->engines(); };
+  host.engineOfContainer = [this](const std::string &container) { return sharedZones_->engineOf(container); };
   contents_ = std::make_shared<ContentsService>(std::move(host), sync_);
   std::string itemDatabase;
   (void)readItems([&](ItemQueries &queries) { itemDatabase = queries.metaText("uuid"); });
   sync_->start(itemDatabase);
+  openSharedZones(cloud, itemDatabase);
+}
+
+void Keld::openSharedZones(const std::shared_ptr<CKCloud> &cloud, const std::string &itemDatabase) {
+  SharedZonesHost host;
+  host.replicaPath = replicaPath_;
+  host.stateFolder = home_.state();
+  host.keeper = [this] { return keeper_.get(); };
+  host.read = [this](const std::function<void(ItemQueries &)> &work) {
+    return read([&](ItemQueries &queries, const ItemPresenter &) { work(queries); });
+  };
+  host.itemDatabase = itemDatabase;
+  host.setTitle = [this](const std::string &container, const std::string &title) {
+    containers_.setTitle(container, title);
+    // Whatever it does next, it reads the list anew.
+    keeper_->perform([](Reconciler &, ItemQueries &, ItemEdits &) {}, [] {});
+  };
+  const std::shared_ptr<CKCloud> shared = cloud->sharedDatabase();
+  sharedZones_ = std::make_shared<SharedZones>(std::move(host), sync_, shared, options_.sync.pollInterval);
+  sharedZones_->start();
+  sharedFeed_ = sharedZones_.get();
 }
 
 void Keld::accountChanged() {
   sync_->setSignedIn(account_->isSignedIn());
+  sharedZones_->setSignedIn(account_->isSignedIn());
 }
 
 // A home that is used for the first time works at once. Who signed out there stays signed out: the database
@@ -158,6 +185,7 @@ std::string Keld::identifierForAccount(const std::string &name) {
 
 void Keld::stop() {
   if (stopped_.exchange(true)) return;
+  if (sharedZones_) sharedZones_->stop();
   if (sync_) sync_->stop();
   if (keeper_) keeper_->stop();
 }
@@ -223,6 +251,7 @@ void Keld::itemsChanged(Commit commit, ItemQueries &queries) {
 
 void Keld::feedAdvanced() {
   if (sync_) sync_->itemsChanged();
+  if (SharedZones *shared = sharedFeed_) shared->itemsChanged();
 }
 
 void Keld::containerListChanged() {

@@ -15,6 +15,7 @@
 #include "keld/ReaderPool.h"
 #include "keld/UpdateSenders.h"
 #include "keld/sync/ContentsService.h"
+#include "keld/sync/SharedZones.h"
 #include "platform/foundation/Paths.h"
 #include "tessaly/QVProtocol.h"
 
@@ -56,6 +57,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   UpdateSenders &senders() { return senders_; }
   QVContentsProtocol &contents() { return *contents_; }
   SyncEngine &sync() { return *sync_; }
+  SharedZones &sharedZones() { return *sharedZones_; }
   // Whether anybody is signed in has changed.
   void accountChanged();
   std::shared_ptr<const Containers> containers() const { return containers_.current(); }
@@ -83,6 +85,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   void open();
   void removeAbandonedActions();
   void openSync();
+  void openSharedZones(const std::shared_ptr<CKCloud> &cloud, const std::string &itemDatabase);
   bool replicaHasPromises() const;
   void offerLocalAccount(bool mayOffer);
   std::string identifierForAccount(const std::string &name);
@@ -102,6 +105,8 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   std::unique_ptr<AccountKeeper> account_;
   std::unique_ptr<Keeper> keeper_;
   std::shared_ptr<SyncEngine> sync_;
+  std::shared_ptr<SharedZones> sharedZones_;
+  std::atomic<SharedZones *> sharedFeed_{nullptr};  // the same, once the keeper may tell it of changes
   std::shared_ptr<QVContentsProtocol> contents_;
   std::atomic<bool> stopped_{false};
 };

@@ -96,8 +96,9 @@ void KeldSession::refreshSharingStateForItemIdentifier(const std::string & /*ide
   reply(noSharing());
 }
 
-void KeldSession::acceptShareWithURL(const NSURL & /*shareURL*/, QVURLReply reply) {
-  reply({}, noSharing());
+void KeldSession::acceptShareWithURL(const NSURL &shareURL, QVURLReply reply) {
+  if (const NSError error = daemon_->checkSignedIn()) return reply({}, error);
+  daemon_->sharedZones().acceptShare(shareURL, std::move(reply));
 }
 
 void KeldSession::resolveFileObjectIDsToContentRecordIDs(const std::vector<QVFileObjectID> & /*identifiers*/,

@@ -6,8 +6,10 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include "keld/SharedContainer.h"
 #include "keld/sync/DownloadTransfer.h"
 #include "keld/sync/ReplicaBarrier.h"
+#include "keld/sync/SharedAccess.h"
 #include "platform/dispatch/dispatch.h"
 #include "tessaly/NSURL+Tessaly.h"
 #include "tessaly/QVContainer.h"
@@ -30,9 +32,83 @@ bool isSyncedItem(const ItemRecord &item) {
   return isPlaced && (item.flags & kExcludedFlag) == 0;
 }
 
+void addCounts(const QVTransferCounts &more, QVTransferCounts *counts) {
+  counts->active += more.active;
+  counts->queued += more.queued;
+  counts->done += more.done;
+  counts->failed += more.failed;
+  counts->bytesDone += more.bytesDone;
+  counts->bytesLeft += more.bytesLeft;
+  counts->bytesPerSecond += more.bytesPerSecond;
+}
+
+void addTransfers(SyncEngine &engine, QVTransferStatus *status) {
+  const SyncEngine::Status own = engine.status();
+  addCounts(engine.downloads()->counts(), &status->downloads);
+  QVTransferCounts uploads;
+  for (const AssetUploads::Progress &upload : engine.assetUploads().underWay()) {
+    ++uploads.active;
+    uploads.bytesLeft += upload.total - std::min(upload.done, upload.total);
+  }
+  const std::uint64_t queued = engine.store().countQueued();
+  uploads.queued = queued - std::min(queued, uploads.active);
+  uploads.done = own.uploadsDone;
+  uploads.failed = engine.store().countFailed();
+  uploads.bytesDone = own.bytesUploaded;
+  uploads.bytesPerSecond = own.uploadRate;
+  addCounts(uploads, &status->uploads);
+  // One cloud for all; the first that has something to say of it is heard.
+  if (status->cloud.empty()) status->cloud = own.cloud;
+  if (status->cloudProblem.empty()) status->cloudProblem = own.cloudProblem;
+  status->heldDeletions += engine.store().countHeld();
+  status->conflicts += own.conflicts;
+}
+
+// Replies when all of `number` have been answered, with the first error.
+QVContentsErrorReply afterAll(std::size_t number, QVContentsErrorReply reply) {
+  struct Waiting {
+    Mutex mutex;
+    std::size_t left GUARDED_BY(mutex) = 0;
+    NSError error GUARDED_BY(mutex);
+  };
+  const auto waiting = std::make_shared<Waiting>();
+  {
+    const Lock lock(waiting->mutex);
+    waiting->left = number;
+  }
+  return [waiting, reply = std::move(reply)](const NSError &error) {
+    NSError outcome;
+    {
+      const Lock lock(waiting->mutex);
+      if (error && !waiting->error) waiting->error = error;
+      if (--waiting->left > 0) return;
+      outcome = waiting->error;
+    }
+    reply(outcome);
+  };
+}
+
 }  // namespace
 
 // --- Finding.
+
+std::shared_ptr<SyncEngine> ContentsService::engineOf(const ItemRecord &item) {
+  if ((item.flags & kSharedFlag) == 0) return drive_;
+  std::string container;
+  (void)host_.read([&](ItemQueries &queries) {
+    const std::vector<std::string> names = queries.namesTo(item);
+    if (!names.empty()) container = names.front();
+  });
+  auto engine = host_.engineOfContainer ? host_.engineOfContainer(container) : nullptr;
+  return engine ? engine : drive_;  // a container that is about to go
+}
+
+std::vector<std::shared_ptr<SyncEngine>> ContentsService::engines() {
+  std::vector<std::shared_ptr<SyncEngine>> engines{drive_};
+  if (host_.sharedEngines)
+    for (auto &engine : host_.sharedEngines()) engines.push_back(std::move(engine));
+  return engines;
+}
 
 std::optional<ItemRecord> ContentsService::known(const std::string &path, NSError *error) {
   std::optional<ItemRecord> found;
@@ -48,7 +124,7 @@ void ContentsService::find(const NSURL &url, Found found) {
   if (error) return found(nullptr, error);
   // Another file may have come to that path a moment ago.
   struct stat status = {};
-  const bool isThere = ::lstat(engine_->files().absolute(*path).c_str(), &status) == 0;
+  const bool isThere = ::lstat(drive_->files().absolute(*path).c_str(), &status) == 0;
   if (item && isThere && status.st_ino == item->facts.inode) return found(&*item, NSError());
   host_.keeper().lookAt(*path, [self = shared_from_this(), path = *path, url, found = std::move(found)] {
     NSError problem;
@@ -101,16 +177,17 @@ void ContentsService::startDownloadAtURL(const NSURL &url, std::uint64_t options
                                                                             const NSError &error) {
     if (!item) return reply(nullptr, error);
     const bool isFolder = item->isFolder();
+    const auto engine = self->engineOf(*item);
     std::vector<std::unique_ptr<Downloads::Interest>> interests;
     // What the table shows of a document may be a moment behind what the sync knows.
     const auto isWanted = [&](const ItemRecord &child) {
       if (!isFolder || (child.flags & kDatalessFlag) != 0) return true;
       if ((child.flags & kUploadedFlag) != 0) return false;
-      const auto row = self->engine_->store().byItem(child.id);
+      const auto row = engine->store().byItem(child.id);
       return row && row->isDataless;
     };
     for (const ItemRecord &document : self->documentsBelow(*item, isWanted))
-      interests.push_back(self->engine_->downloads()->want(document.id, document.facts.size, priority));
+      interests.push_back(engine->downloads()->want(document.id, document.facts.size, priority));
     reply(DownloadTransfer::of(std::move(interests)), NSError());
   });
 }
@@ -118,43 +195,43 @@ void ContentsService::startDownloadAtURL(const NSURL &url, std::uint64_t options
 // --- Letting go.
 
 void ContentsService::evictItemAtURL(const NSURL &url, QVContentsResultReply reply) {
-  find(url,
-       [self = shared_from_this(), reply = std::move(reply)](const ItemRecord *item, const NSError &error) {
-         if (!item) return reply({}, error);
-         dispatch_async_global([self, asked = *item, reply] {
-           QVContentsResult result;
-           NSError own;
-           for (const ItemRecord &document : self->documentsBelow(
-                    asked, [](const ItemRecord &child) { return (child.flags & kDatalessFlag) == 0; })) {
-             std::uint64_t bytes = 0;
-             const NSError refused = self->evict(document, &bytes);
-             if (!refused) {
-               ++result.documents;
-               result.bytes += bytes;
-               continue;
-             }
-             ++result.refused;
-             if (!asked.isFolder()) own = refused;
-             if (result.failures.size() < kMostFailures)
-               result.failures.push_back(
-                   {self->engine_->files().absolute(self->engine_->files().pathOf(document.id)), refused});
-           }
-           self->engine_->states().flush([reply, result, own] { reply(result, own); });
-         });
-       });
+  find(url, [self = shared_from_this(), reply = std::move(reply)](const ItemRecord *item,
+                                                                  const NSError &error) {
+    if (!item) return reply({}, error);
+    dispatch_async_global([self, asked = *item, reply] {
+      QVContentsResult result;
+      NSError own;
+      const auto engine = self->engineOf(asked);
+      for (const ItemRecord &document : self->documentsBelow(
+               asked, [](const ItemRecord &child) { return (child.flags & kDatalessFlag) == 0; })) {
+        std::uint64_t bytes = 0;
+        const NSError refused = evict(*engine, document, &bytes);
+        if (!refused) {
+          ++result.documents;
+          result.bytes += bytes;
+          continue;
+        }
+        ++result.refused;
+        if (!asked.isFolder()) own = refused;
+        if (result.failures.size() < kMostFailures)
+          result.failures.push_back({engine->files().absolute(engine->files().pathOf(document.id)), refused});
+      }
+      engine->states().flush([reply, result, own] { reply(result, own); });
+    });
+  });
 }
 
-NSError ContentsService::evict(const ItemRecord &document, std::uint64_t *bytes) {
+NSError ContentsService::evict(SyncEngine &engine, const ItemRecord &document, std::uint64_t *bytes) {
   NSError problem;
-  const auto location = engine_->files().locate(document.id, &problem);
+  const auto location = engine.files().locate(document.id, &problem);
   if (!location) return problem ? problem : qvc_errorNoSuchItem(document.name);
-  const std::string path = engine_->files().absolute(location->path);
-  if (engine_->isPinnedOrBelowPin(document.id)) return qvc_error(QVErrorPinned, path + ": is pinned here");
-  const auto row = engine_->store().byItem(document.id);
+  const std::string path = engine.files().absolute(location->path);
+  if (engine.isPinnedOrBelowPin(document.id)) return qvc_error(QVErrorPinned, path + ": is pinned here");
+  const auto row = engine.store().byItem(document.id);
   const NSError unsent = qvc_error(QVErrorUnsentChanges, path + ": the cloud doesn't have it yet");
   if (!row || row->tag.empty() || !isSyncedItem(location->item)) return unsent;
-  if (const auto queued = engine_->store().queued(document.id); queued && !queued->isDeletion) return unsent;
-  const DocumentLook look = engine_->storage().classify(location->folder.get(), location->name);
+  if (const auto queued = engine.store().queued(document.id); queued && !queued->isDeletion) return unsent;
+  const DocumentLook look = engine.storage().classify(location->folder.get(), location->name);
   if (look.kind == DocumentClass::dataless || look.facts.size == 0) return NSError();  // nothing to let go of
   if (!cloudHasContents(*location, *row, look)) return unsent;
   DocumentMarker marker = look.marker ? *look.marker : DocumentMarker();
@@ -163,7 +240,7 @@ NSError ContentsService::evict(const ItemRecord &document, std::uint64_t *bytes)
   marker.size = row->content.size;
   marker.modified = look.facts.modified;
   const ContentsResult result =
-      engine_->storage().evict(location->folder.get(), location->name, look.facts, marker);
+      engine.storage().evict(location->folder.get(), location->name, look.facts, marker);
   switch (result.outcome) {
     case ContentsOutcome::done:
       break;
@@ -177,14 +254,14 @@ NSError ContentsService::evict(const ItemRecord &document, std::uint64_t *bytes)
       return NSError::errorWithPOSIXCode(result.error != 0 ? result.error : EIO, path);
   }
   *bytes = row->content.size;
-  engine_->store().transaction([&] {
-    auto now = engine_->store().byItem(document.id);
+  engine.store().transaction([&] {
+    auto now = engine.store().byItem(document.id);
     if (!now || now->content.digest != row->content.digest) return;
     now->isDataless = true;
     now->local = LocalFileOf(result.facts);
-    engine_->store().put(*now);
+    engine.store().put(*now);
   });
-  engine_->states().show({document.id, true, true, LocalFileOf(result.facts), true});
+  engine.states().show({document.id, true, true, LocalFileOf(result.facts), true});
   return NSError();
 }
 
@@ -204,11 +281,12 @@ void ContentsService::setPinnedAtURL(const NSURL &url, bool isPinned, QVContents
   find(url, [self = shared_from_this(), isPinned, reply = std::move(reply)](const ItemRecord *item,
                                                                             const NSError &error) {
     if (!item) return reply(error);
-    self->engine_->store().setPinned(item->id, isPinned);
+    const auto engine = self->engineOf(*item);
+    engine->store().setPinned(item->id, isPinned);
     if (isPinned) {
       for (const ItemRecord &document : self->documentsBelow(
                *item, [](const ItemRecord &child) { return (child.flags & kDatalessFlag) != 0; }))
-        self->engine_->downloads()->fetchInBackground(document.id, document.facts.size);
+        engine->downloads()->fetchInBackground(document.id, document.facts.size);
     }
     reply(NSError());
   });
@@ -216,25 +294,25 @@ void ContentsService::setPinnedAtURL(const NSURL &url, bool isPinned, QVContents
 
 // --- What is what.
 
-QVContentsStatus ContentsService::statusOf(const ItemRecord &document) {
+QVContentsStatus ContentsService::statusOf(SyncEngine &engine, const ItemRecord &document) {
   QVContentsStatus status;
   status.size = document.facts.size;
-  status.isPinned = engine_->isPinnedOrBelowPin(document.id);
-  const auto transferred = engine_->downloads()->transferred(document.id);
-  const auto row = engine_->store().byItem(document.id);
+  status.isPinned = engine.isPinnedOrBelowPin(document.id);
+  const auto transferred = engine.downloads()->transferred(document.id);
+  const auto row = engine.store().byItem(document.id);
   if ((document.flags & kDatalessFlag) != 0)
     status.contents = transferred ? QVContentsState::downloading : QVContentsState::dataless;
   status.transferred = transferred.value_or(0);
-  status.error = engine_->downloads()->lastError(document.id);
+  status.error = engine.downloads()->lastError(document.id);
   if (row) status.checksum = row->content.digest;
   if (!isSyncedItem(document) || !host_.isSignedIn()) return status;
-  const auto queued = engine_->store().queued(document.id);
+  const auto queued = engine.store().queued(document.id);
   const bool isClean = row && !row->tag.empty() && !queued && (document.flags & kUploadedFlag) != 0;
   if (isClean) {
     status.upload = QVUploadState::inCloud;
-  } else if (engine_->assetUploads().isUnderWay(document.id)) {
+  } else if (engine.assetUploads().isUnderWay(document.id)) {
     status.upload = QVUploadState::uploading;
-    for (const AssetUploads::Progress &upload : engine_->assetUploads().underWay())
+    for (const AssetUploads::Progress &upload : engine.assetUploads().underWay())
       if (upload.item == document.id) status.transferred = upload.done;
   } else if (queued && queued->error) {
     status.upload = QVUploadState::failed;
@@ -264,9 +342,11 @@ QVContentsStatus ContentsService::statusBelow(const ItemRecord &folder) {
   };
   QVContentsStatus status;
   status.upload = QVUploadState::inCloud;
-  status.isPinned = engine_->isPinnedOrBelowPin(folder.id);
+  const auto engine = engineOf(folder);
+  status.isPinned = engine->isPinnedOrBelowPin(folder.id);
+  if (const auto queued = engine->store().queued(folder.id)) status.error = queued->error;
   for (const ItemRecord &document : documentsBelow(folder, [](const ItemRecord &) { return true; })) {
-    const QVContentsStatus own = statusOf(document);
+    const QVContentsStatus own = statusOf(*engine, document);
     ++status.documents;
     status.size += own.size;
     status.transferred += own.transferred;
@@ -287,29 +367,15 @@ void ContentsService::getContentsStatusAtURL(const NSURL &url, QVContentsStatusR
   find(url,
        [self = shared_from_this(), reply = std::move(reply)](const ItemRecord *item, const NSError &error) {
          if (!item) return reply({}, error);
-         reply(item->isFolder() ? self->statusBelow(*item) : self->statusOf(*item), NSError());
+         reply(item->isFolder() ? self->statusBelow(*item) : self->statusOf(*self->engineOf(*item), *item),
+               NSError());
        });
 }
 
 void ContentsService::getTransferStatus(QVTransferStatusReply reply) {
   QVTransferStatus status;
-  const SyncEngine::Status engine = engine_->status();
-  status.downloads = engine_->downloads()->counts();
-  for (const AssetUploads::Progress &upload : engine_->assetUploads().underWay()) {
-    ++status.uploads.active;
-    status.uploads.bytesLeft += upload.total - std::min(upload.done, upload.total);
-  }
-  const std::uint64_t queued = engine_->store().countQueued();
-  status.uploads.queued = queued - std::min(queued, status.uploads.active);
-  status.uploads.done = engine.uploadsDone;
-  status.uploads.failed = engine_->store().countFailed();
-  status.uploads.bytesDone = engine.bytesUploaded;
-  status.uploads.bytesPerSecond = engine.uploadRate;
-  status.cloud = engine.cloud;
-  status.cloudProblem = engine.cloudProblem;
-  status.isCloudReachable = engine.cloudProblem.empty();
-  status.heldDeletions = engine_->store().countHeld();
-  status.conflicts = engine.conflicts;
+  for (const auto &engine : engines()) addTransfers(*engine, &status);
+  status.isCloudReachable = status.cloudProblem.empty();
   reply(status, NSError());
 }
 
@@ -320,7 +386,12 @@ void ContentsService::waitForUploadAtURL(const NSURL &url, QVContentsErrorReply 
   dispatch_async_global([self = shared_from_this(), url, reply = std::move(reply)] {
     const NSError unseen = WaitUntilReplicaIsSeen(self->host_.replicaPath, self->host_.read);
     if (unseen) return reply(unseen);
-    if (!url) return self->engine_->whenUploaded({}, reply);
+    if (!url) {
+      const auto engines = self->engines();
+      const QVContentsErrorReply each = afterAll(engines.size(), reply);
+      for (const auto &engine : engines) engine->whenUploaded({}, each);
+      return;
+    }
     self->find(url, [self, reply](const ItemRecord *item, const NSError &error) {
       if (!item) return reply(error);
       std::vector<ItemNumber> items{item->id};
@@ -328,7 +399,7 @@ void ContentsService::waitForUploadAtURL(const NSURL &url, QVContentsErrorReply 
                *item, [](const ItemRecord &child) { return (child.flags & kUploadedFlag) == 0; }))
         items.push_back(document.id);
       std::sort(items.begin(), items.end());
-      self->engine_->whenUploaded(std::move(items), reply);
+      self->engineOf(*item)->whenUploaded(std::move(items), reply);
     });
   });
 }
@@ -339,22 +410,32 @@ void ContentsService::allowDeletionAtURL(const NSURL &url, QVContentsErrorReply 
          if (!item) return reply(error);
          std::vector<ItemNumber> items{item->id};
          self->forEachBelow(*item, [&](ItemRecord &child) { items.push_back(child.id); });
-         self->engine_->announceDeletions(items);
+         self->engineOf(*item)->announceDeletions(items);
          reply(NSError());
        });
 }
 
 void ContentsService::confirmDeletions(bool carryOut, QVContentsErrorReply reply) {
-  engine_->answerDeletions(carryOut);
+  for (const auto &engine : engines()) engine->answerDeletions(carryOut);
   reply(NSError());
 }
 
 // --- Moves.
 
+// Whether nothing can be put into the folder of what another shares.
+bool ContentsService::isReadOnlyFolder(const std::string &path) {
+  NSError error;
+  const auto folder = known(path, &error);
+  if (!folder || (folder->flags & kSharedFlag) == 0) return false;
+  const auto engine = engineOf(*folder);
+  const auto row = engine->store().byItem(folder->id);
+  return row && !SharedAccess(engine->store(), engine->scope()).isWritable(row->record);
+}
+
 QVMove ContentsService::describeMove(const ItemRecord &item, const NSURL &destination,
                                      const std::string &targetFolder) {
   QVMove move;
-  const std::string source = engine_->files().pathOf(item.id);
+  const std::string source = drive_->files().pathOf(item.id);
   const auto container = [](const std::string &path) { return path.substr(0, path.find('/')); };
   const auto target = host_.pathBelowReplica(destination);
   move.isOfContainer = item.zone() == Zone::structure;
@@ -374,6 +455,10 @@ QVMove ContentsService::describeMove(const ItemRecord &item, const NSURL &destin
   }
   move.isIntoItself = item.isFolder() && target->compare(0, source.size() + 1, source + "/") == 0;
   move.leavesContainer = container(*target) != container(source);
+  move.leavesShare = move.leavesContainer && IsSharedContainer(container(source));
+  if (IsSharedContainer(container(*target)))
+    move.isToReadOnlyPlace =
+        move.isToReadOnlyPlace || isReadOnlyFolder(target->substr(0, target->rfind('/')));
   move.isIntoTrash = container(*target) == QVUbiquitousTrashContainerID;
   move.isIntoLocalPlace =
       qv_isInTessalyPrivateStorages(destination) || qv_wouldBeExcludedFromSync(destination);
