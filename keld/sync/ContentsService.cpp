@@ -93,7 +93,7 @@ QVContentsErrorReply afterAll(std::size_t number, QVContentsErrorReply reply) {
 // --- Finding.
 
 std::shared_ptr<SyncEngine> ContentsService::engineOf(const ItemRecord &item) {
-  if ((item.flags & kSharedFlag) == 0) return drive_;
+  if ((item.flags & kOthersFlag) == 0) return drive_;
   std::string container;
   (void)host_.read([&](ItemQueries &queries) {
     const std::vector<std::string> names = queries.namesTo(item);
@@ -426,7 +426,7 @@ void ContentsService::confirmDeletions(bool carryOut, QVContentsErrorReply reply
 bool ContentsService::isReadOnlyFolder(const std::string &path) {
   NSError error;
   const auto folder = known(path, &error);
-  if (!folder || (folder->flags & kSharedFlag) == 0) return false;
+  if (!folder || (folder->flags & kOthersFlag) == 0) return false;
   const auto engine = engineOf(*folder);
   const auto row = engine->store().byItem(folder->id);
   return row && !SharedAccess(engine->store(), engine->scope()).isWritable(row->record);

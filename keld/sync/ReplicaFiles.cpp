@@ -16,7 +16,7 @@ ReplicaFiles::ReplicaFiles(std::string replicaPath, Read read, SyncStore &store,
     : replicaPath_(std::move(replicaPath)), read_(std::move(read)), store_(store), scope_(std::move(scope)) {}
 
 bool ReplicaFiles::isInScope(const ItemRecord &item, ItemQueries &queries) const {
-  const bool isShared = (item.flags & kSharedFlag) != 0;
+  const bool isShared = (item.flags & kOthersFlag) != 0;
   if (isShared != scope_.isShared()) return false;
   if (!isShared) return true;
   const std::vector<std::string> names = queries.namesTo(item);
@@ -24,7 +24,7 @@ bool ReplicaFiles::isInScope(const ItemRecord &item, ItemQueries &queries) const
 }
 
 bool ReplicaFiles::isInScope(const ItemRecord &item) const {
-  const bool isShared = (item.flags & kSharedFlag) != 0;
+  const bool isShared = (item.flags & kOthersFlag) != 0;
   bool isIn = isShared == scope_.isShared();
   if (isIn && isShared) (void)read_([&](ItemQueries &queries) { isIn = isInScope(item, queries); });
   return isIn;
