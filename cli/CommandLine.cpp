@@ -39,7 +39,7 @@ struct Words {
   std::string argument;
   std::string name;
   std::vector<std::string> items;
-  std::string folder, cloud, device;
+  std::string folder, cloud, device, account;
   std::int32_t process = 0;
   bool json = false;
 };
@@ -201,7 +201,7 @@ int runCommand(const CommandLine &line, const Words &words, std::ostream &out, s
   };
   const std::optional<std::string> home = given(words.home);
   if (line.has("run"))
-    return runRun(out, err, {home, given(words.folder), given(words.cloud), given(words.device)});
+    return runRun(out, err, {home, given(words.folder), given(words.cloud), given(words.device), given(words.account)});
 
   DroxaSetProcessHome(DroxaHome::resolve(home));
   const std::chrono::milliseconds timeout(std::llround(words.timeout * 1000));

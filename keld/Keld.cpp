@@ -8,9 +8,11 @@
 
 #include "keld/KeldSession.h"
 #include "keld/Schema.h"
+#include "keld/SharedContainer.h"
 #include "keld/TrashNotes.h"
 #include "keld/contents/ContentsStorage.h"
 #include "keld/sync/DeviceName.h"
+#include "keld/sync/DriveAccount.h"
 #include "platform/cloudkit/EmbeddedCloud.h"
 #include "platform/fileprovider/FPReplacements.h"
 #include "platform/foundation/NSDate.h"
@@ -70,7 +72,7 @@ void Keld::open() {
   openSync();
   const NSError error = account_->load();
   if (error) os_log_error(qvc_default_log(), "[ERROR] can't read the account: %@", error);
-  offerLocalAccount(!wasDamaged && !error);
+  offerAccount(!wasDamaged && !error);
   accountChanged();
 }
 
@@ -94,10 +96,11 @@ void Keld::openSync() {
   SyncOptions options = options_.sync;
   if (options.device.empty()) options.device = DeviceName(home_);
   std::shared_ptr<CKCloud> cloud = options.cloud;
+  const std::string drive = DriveAccount(home_, options.account);
   if (!cloud) {
     const std::string folder = options.cloudFolder.empty() ? home_.root() + "/cloud" : options.cloudFolder;
     NSError error;
-    cloud = EmbeddedCloud::open(folder, AccountKeeper::localUserName(), options.device, &error);
+    cloud = EmbeddedCloud::open(folder, drive, options.device, &error);
     if (!cloud) throw std::runtime_error(error.localizedDescription());
   }
   const auto readItems = [this](const std::function<void(ItemQueries &)> &work) {
@@ -106,6 +109,7 @@ void Keld::openSync() {
   sync_ = std::make_shared<SyncEngine>(
       replicaPath_, home_.state() + "/sync.sqlite", cloud, [this] { return keeper_.get(); }, readItems,
       options);
+  RememberDriveAccount(sync_->store(), drive);
   ContentsServiceHost host;
   host.replicaPath = replicaPath_;
   host.keeper = [this]() -> Keeper & { return *keeper_; };
@@ -113,8 +117,9 @@ void Keld::openSync() {
   host.pathBelowReplica = [this](const NSURL &url) { return pathBelowReplica(url); };
   host.isSignedIn = [this] { return account_->isSignedIn(); };
   host.sharedEngines = [this] { return sharedZones_->engines(); };
-  host.engineOfContainer = [this](const std::string &container) { return sharedZones_->engineOf(container); };
+  host.engineOf = [this](const ItemRecord &item) { return engineOf(item); };
   contents_ = std::make_shared<ContentsService>(std::move(host), sync_);
+  openSharing(cloud, drive);
   std::string itemDatabase;
   (void)readItems([&](ItemQueries &queries) { itemDatabase = queries.metaText("uuid"); });
   sync_->start(itemDatabase);
@@ -141,6 +146,34 @@ void Keld::openSharedZones(const std::shared_ptr<CKCloud> &cloud, const std::str
   sharedFeed_ = sharedZones_.get();
 }
 
+void Keld::openSharing(const std::shared_ptr<CKCloud> &cloud, const std::string &accountName) {
+  SharingHost host;
+  host.replicaPath = replicaPath_;
+  host.keeper = [this]() -> Keeper & { return *keeper_; };
+  host.read = [this](const std::function<void(ItemQueries &)> &work) {
+    return read([&](ItemQueries &queries, const ItemPresenter &) { work(queries); });
+  };
+  host.pathBelowReplica = [this](const NSURL &url) { return pathBelowReplica(url); };
+  host.isSignedIn = [this] { return account_->isSignedIn(); };
+  host.engineOf = [this](const ItemRecord &item) { return engineOf(item); };
+  host.engineOfZone = [this](const CKRecordZoneID &zone) {
+    return zone == sync_->scope().zone ? sync_ : sharedZones_->engineOf(SharedContainerOf(zone.ownerName));
+  };
+  sharing_ =
+      std::make_shared<SharingService>(std::move(host), SharingPlaces(cloud, accountName), options_.sharing);
+}
+
+std::shared_ptr<SyncEngine> Keld::engineOf(const ItemRecord &item) {
+  if ((item.flags & kOthersFlag) == 0) return sync_;
+  std::string container;
+  (void)read([&](ItemQueries &queries, const ItemPresenter &) {
+    const std::vector<std::string> names = queries.namesTo(item);
+    if (!names.empty()) container = names.front();
+  });
+  auto engine = sharedZones_->engineOf(container);
+  return engine ? engine : sync_;  // a container that is about to go
+}
+
 void Keld::accountChanged() {
   sync_->setSignedIn(account_->isSignedIn());
   sharedZones_->setSignedIn(account_->isSignedIn());
@@ -148,15 +181,15 @@ void Keld::accountChanged() {
 
 // A home that is used for the first time works at once. Who signed out there stays signed out: the database
 // knows that the account was offered, and one that replaces a damaged one doesn't offer it again.
-void Keld::offerLocalAccount(bool mayOffer) {
+void Keld::offerAccount(bool mayOffer) {
   bool wasOffered = false;
   (void)read([&](ItemQueries &queries, const ItemPresenter &) {
     wasOffered = queries.metaNumber("accountOffered") != 0;
   });
   if (wasOffered) return;
   if (mayOffer && !account_->isSignedIn()) {
-    const NSError error = account_->signIn(AccountKeeper::localUserName());
-    if (error) os_log_error(qvc_default_log(), "[ERROR] can't sign the local account in: %@", error);
+    const NSError error = account_->signIn(DriveAccount(home_, options_.sync.account));
+    if (error) os_log_error(qvc_default_log(), "[ERROR] can't sign the drive's account in: %@", error);
   }
   performAndWait([](ItemEdits &edits) { edits.setMeta("accountOffered", 1); });
 }
@@ -185,6 +218,7 @@ std::string Keld::identifierForAccount(const std::string &name) {
 
 void Keld::stop() {
   if (stopped_.exchange(true)) return;
+  if (sharing_) sharing_->queue().stop();
   if (sharedZones_) sharedZones_->stop();
   if (sync_) sync_->stop();
   if (keeper_) keeper_->stop();
@@ -197,7 +231,8 @@ std::shared_ptr<QVProtocol> Keld::newSession() {
 NSError Keld::read(const Read &work) {
   if (stopped_) return qvc_error(QVErrorShuttingDown, "the daemon is shutting down");
   try {
-    readers_->read([&](ItemQueries &queries) { work(queries, ItemPresenter(containers_.current())); });
+    readers_->read(
+        [&](ItemQueries &queries) { work(queries, ItemPresenter(containers_.current(), queries)); });
     return NSError();
   } catch (const SqlError &error) {
     os_log_error(qvc_default_log(), "[ERROR] the item database can't be read: %s", error.what());

@@ -14,6 +14,7 @@
 #include "keld/NotificationHub.h"
 #include "keld/ReaderPool.h"
 #include "keld/UpdateSenders.h"
+#include "keld/sharing/SharingService.h"
 #include "keld/sync/ContentsService.h"
 #include "keld/sync/SharedZones.h"
 #include "platform/foundation/Paths.h"
@@ -24,6 +25,7 @@ namespace droxa::keld {
 struct KeldOptions {
   KeeperOptions keeper;
   SyncOptions sync;
+  SharingOptions sharing;
   // Called once, on a thread of the daemon, when it can't go on: its program ends then.
   std::function<void(const std::string &why)> failed;
 };
@@ -58,6 +60,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   QVContentsProtocol &contents() { return *contents_; }
   SyncEngine &sync() { return *sync_; }
   SharedZones &sharedZones() { return *sharedZones_; }
+  SharingService &sharing() { return *sharing_; }
   // Whether anybody is signed in has changed.
   void accountChanged();
   std::shared_ptr<const Containers> containers() const { return containers_.current(); }
@@ -85,9 +88,11 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   void open();
   void removeAbandonedActions();
   void openSync();
+  std::shared_ptr<SyncEngine> engineOf(const ItemRecord &item);
   void openSharedZones(const std::shared_ptr<CKCloud> &cloud, const std::string &itemDatabase);
+  void openSharing(const std::shared_ptr<CKCloud> &cloud, const std::string &accountName);
   bool replicaHasPromises() const;
-  void offerLocalAccount(bool mayOffer);
+  void offerAccount(bool mayOffer);
   std::string identifierForAccount(const std::string &name);
   void performAndWait(const std::function<void(ItemEdits &edits)> &edit);
 
@@ -108,6 +113,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   std::shared_ptr<SharedZones> sharedZones_;
   std::atomic<SharedZones *> sharedFeed_{nullptr};  // the same, once the keeper may tell it of changes
   std::shared_ptr<QVContentsProtocol> contents_;
+  std::shared_ptr<SharingService> sharing_;
   std::atomic<bool> stopped_{false};
 };
 

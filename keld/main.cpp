@@ -16,6 +16,7 @@
 #include "keld/KeldListener.h"
 #include "keld/sync/CloudImport.h"
 #include "keld/sync/DeviceName.h"
+#include "keld/sync/DriveAccount.h"
 #include "platform/cloudkit/EmbeddedCloud.h"
 #include "platform/foundation/Paths.h"
 #include "tessaly/QVLog.h"
@@ -28,6 +29,7 @@ struct Arguments {
   std::string cloud;       // "": the home's own
   std::string importFrom;  // "": serve
   std::string device;
+  std::string account;
   WatcherKind watcher = WatcherKind::best;
   bool foreground = true;
 };
@@ -53,6 +55,7 @@ int serve(const Arguments &arguments, int signals) {
   options.keeper.watcher = arguments.watcher;
   options.sync.cloudFolder = arguments.cloud;
   options.sync.device = arguments.device;
+  options.sync.account = arguments.account;
   options.failed = [failure](const std::string &) {
     const std::uint64_t one = 1;
     (void)!::write(failure, &one, sizeof one);
@@ -82,8 +85,14 @@ int importFolder(const Arguments &arguments) {
   if (!home.create(&problem)) return fail(problem, EX_CANTCREAT);
   const std::string folder = arguments.cloud.empty() ? home.root() + "/cloud" : arguments.cloud;
   const std::string device = arguments.device.empty() ? DeviceName(home) : arguments.device;
+  std::string account;
+  try {
+    account = DriveAccount(home, arguments.account);
+  } catch (const std::runtime_error &refused) {
+    return fail(refused.what(), EX_CONFIG);
+  }
   NSError error;
-  const auto cloud = EmbeddedCloud::open(folder, AccountKeeper::localUserName(), device, &error);
+  const auto cloud = EmbeddedCloud::open(folder, account, device, &error);
   if (!cloud) return fail(folder + ": " + error.localizedDescription(), EX_UNAVAILABLE);
   const ImportReport report =
       ImportIntoCloud(*cloud, arguments.importFrom, {home.root(), folder}, [](const ImportReport &so) {
@@ -114,6 +123,10 @@ int run(int argc, char **argv) {
       ->envname("DROXA_CLOUD")
       ->option_text("DIR");
   app.add_option("--device", arguments.device, "What this device is called (default: the machine's name)")
+      ->option_text("NAME");
+  app.add_option(
+         "--account", arguments.account,
+         "The account in the cloud that the drive belongs to (default: as before, else who runs this)")
       ->option_text("NAME");
   app.add_option("--import", arguments.importFrom,
                  "Put the documents of a folder into the cloud, and end; the folder is only read")

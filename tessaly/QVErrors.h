@@ -9,6 +9,7 @@ inline constexpr char QVTessalyErrorDomain[] = "QVTessalyErrorDomain";
 
 inline constexpr std::int64_t QVErrorLoggedOut = 2;
 inline constexpr std::int64_t QVErrorNoSuchItem = 14;
+inline constexpr std::int64_t QVErrorNoShare = 20;  // there is no share of this item
 inline constexpr std::int64_t QVErrorInvalidArgument = 22;
 inline constexpr std::int64_t QVErrorPrivilegeRequired = 26;  // the client isn't entitled to it
 inline constexpr std::int64_t QVErrorDatabase = 30;
@@ -25,6 +26,8 @@ inline constexpr std::int64_t QVErrorSharingUnavailable = 39;  // this daemon's 
 inline constexpr std::int64_t QVErrorReadOnlyShare = 46;
 // Of what was put beside the shared folders instead of into one: it is kept on this machine alone.
 inline constexpr std::int64_t QVErrorNotInSharedFolder = 47;
+inline constexpr std::int64_t QVErrorBusy = 40;  // too much is under way already; to be asked again later
+inline constexpr std::int64_t QVErrorNotShareable = 41;  // the item is of a kind, or in a place, that isn't shared
 
 NSError qvc_errorLoggedOut();
 // Describes it by a checked format (platform/oslog/LogFormat.h).

@@ -94,7 +94,7 @@ bool CloudApplier::isAsApplied(const DocumentRecord &document, const SyncRow &ro
 
 // --- What may be done.
 
-void CloudApplier::noteShares(const CKZoneChanges &page) {
+void CloudApplier::noteAccesses(const CKZoneChanges &page) {
   if (!context_.scope.isShared()) return;
   for (const CKRecord &record : page.changedRecords)
     if (record.recordType == CKRecordTypeShare) followAccess(record);
@@ -198,6 +198,7 @@ void CloudApplier::emptyZone() {
     beginFetchOfAll();
     for (const std::string &record : context_.store.recordsInCloud()) remove(record);
     removeFolders();
+    shares_.forgetUnseen(context_.scope.zone, {});
     if (!touched_.empty()) syncReplica();
   });
   fetchesAll_ = false;

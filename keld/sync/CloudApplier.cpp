@@ -41,7 +41,7 @@ std::string DigestOfFile(int descriptor) {
 }
 
 CloudApplier::CloudApplier(const SyncContext &context, ConflictCopies &conflicts)
-    : context_(context), conflicts_(conflicts) {}
+    : context_(context), conflicts_(conflicts), shares_(context.store, context.states) {}
 
 NSError CloudApplier::fetchAndApply(const CKCallContext &call) {
   undoUnfinished();
@@ -60,6 +60,7 @@ bool CloudApplier::hasFetchedAll() {
 void CloudApplier::beginFetchOfAll() {
   fetchesAll_ = true;
   seen_.clear();
+  seenShares_.clear();
   context_.store.setText(kToken, "");
   context_.store.setNumber(kFetchesAll, 1);
   context_.store.forgetAccesses();
@@ -107,7 +108,7 @@ NSError CloudApplier::withoutZone(const CKCallContext &call) {
 std::vector<DocumentRecord> CloudApplier::documentsOf(const std::vector<CKRecord> &records) {
   std::vector<DocumentRecord> documents;
   for (const CKRecord &record : records) {
-    if (record.recordType == CKRecordTypeShare) continue;  // is no item
+    if (record.recordType == CKRecordTypeShare) continue;  // is no item: noteShares()
     // One that makes no sense isn't one that was deleted.
     if (fetchesAll_) seen_.insert(record.recordID.recordName);
     auto document = ReadRecord(record);
@@ -134,11 +135,14 @@ NSError CloudApplier::applyPage(const CKZoneChanges &page, const CKCallContext &
     return CKErrorMake(CKErrorCode::changeTokenExpired, "the cloud was replaced while it was read");
   beginUnfinished(documents);
   context_.store.transaction([&] {
-    noteShares(page);
+    noteAccesses(page);
     applyAll(documents);
-    for (const CKDeletedRecord &deleted : page.deletedRecords) remove(deleted.recordID.recordName);
+    noteShares(page);
+    for (const CKDeletedRecord &deleted : page.deletedRecords)
+      if (deleted.recordType != CKRecordTypeShare) remove(deleted.recordID.recordName);
     if (endsAll) {
       removeUnseen();
+      shares_.forgetUnseen(context_.scope.zone, seenShares_);
       context_.store.setNumber(kFetchesAll, 0);
     }
     if (!page.moreComing) removeFolders();
@@ -150,9 +154,24 @@ NSError CloudApplier::applyPage(const CKZoneChanges &page, const CKCallContext &
   if (endsAll) {
     fetchesAll_ = false;
     seen_.clear();
+    seenShares_.clear();
   }
   finishBatch();
   return NSError();
+}
+
+void CloudApplier::noteShares(const CKZoneChanges &page) {
+  for (const CKRecord &record : page.changedRecords) {
+    if (record.recordType != CKRecordTypeShare) continue;
+    if (fetchesAll_) seenShares_.insert(record.recordID.recordName);
+    if (const auto share = CKShare::shareWithRecord(record))
+      shares_.note(*share);
+    else
+      os_log_error(qvc_default_log(), "[ERROR] the cloud's share %s makes no sense and is left alone",
+                   record.recordID.recordName);
+  }
+  for (const CKDeletedRecord &deleted : page.deletedRecords)
+    if (deleted.recordType == CKRecordTypeShare) shares_.forget(deleted.recordID);
 }
 
 // What the cloud doesn't have any more was deleted while nobody could tell. A cloud that has nothing at all

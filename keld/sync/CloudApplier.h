@@ -8,6 +8,7 @@
 
 #include "keld/sync/ConflictCopies.h"
 #include "keld/sync/DocumentRecord.h"
+#include "keld/sync/KnownShares.h"
 #include "keld/sync/SyncContext.h"
 
 namespace droxa::keld {
@@ -48,6 +49,7 @@ class CloudApplier {
   NSError withoutZone(const CKCallContext &call);
   NSError applyPage(const CKZoneChanges &page, const CKCallContext &call);
   std::vector<DocumentRecord> documentsOf(const std::vector<CKRecord> &records);
+  void noteShares(const CKZoneChanges &page);
   void applyAll(const std::vector<DocumentRecord> &documents);
   NSError fetchAgain(const CKCallContext &call);
   void applyFetched(const std::vector<CKRecordResult> &results);
@@ -107,7 +109,7 @@ class CloudApplier {
   // belongs; false: in none.
   bool place(DocumentRecord *document);
   bool isAsApplied(const DocumentRecord &document, const SyncRow &row) const;
-  void noteShares(const CKZoneChanges &page);
+  void noteAccesses(const CKZoneChanges &page);
   void followAccess(const CKRecord &record);
   void applyAccessBelow(const std::string &root);
   void hangChildren(const std::string &folder, const std::set<std::string> &doomed);
@@ -122,6 +124,7 @@ class CloudApplier {
 
   const SyncContext &context_;
   ConflictCopies &conflicts_;
+  KnownShares shares_;
   std::vector<std::string> touched_;          // paths that the keeper is to look at
   std::map<std::string, PutBack> early_;      // by the names in the trash, until the folder is known
   std::vector<std::string> foldersToRemove_;  // records
@@ -131,7 +134,7 @@ class CloudApplier {
   bool isZoneGone_ = false;
   std::string account_;  // this one's name, once it was asked for
   bool fetchesAll_ = false;
-  std::set<std::string> seen_;  // while everything is fetched anew
+  std::set<std::string> seen_, seenShares_;  // while everything is fetched anew
 };
 
 // SHA-256 of an open file, in hexadecimal; "" when it can't be read.

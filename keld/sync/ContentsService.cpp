@@ -92,21 +92,9 @@ QVContentsErrorReply afterAll(std::size_t number, QVContentsErrorReply reply) {
 
 // --- Finding.
 
-std::shared_ptr<SyncEngine> ContentsService::engineOf(const ItemRecord &item) {
-  if ((item.flags & kOthersFlag) == 0) return drive_;
-  std::string container;
-  (void)host_.read([&](ItemQueries &queries) {
-    const std::vector<std::string> names = queries.namesTo(item);
-    if (!names.empty()) container = names.front();
-  });
-  auto engine = host_.engineOfContainer ? host_.engineOfContainer(container) : nullptr;
-  return engine ? engine : drive_;  // a container that is about to go
-}
-
 std::vector<std::shared_ptr<SyncEngine>> ContentsService::engines() {
   std::vector<std::shared_ptr<SyncEngine>> engines{drive_};
-  if (host_.sharedEngines)
-    for (auto &engine : host_.sharedEngines()) engines.push_back(std::move(engine));
+  for (auto &engine : host_.sharedEngines()) engines.push_back(std::move(engine));
   return engines;
 }
 

@@ -20,7 +20,7 @@ struct ContentsServiceHost {
   std::function<bool()> isSignedIn;
   // Of what others share.
   std::function<std::vector<std::shared_ptr<SyncEngine>>()> sharedEngines;
-  std::function<std::shared_ptr<SyncEngine>(const std::string &containerID)> engineOfContainer;
+  std::function<std::shared_ptr<SyncEngine>(const ItemRecord &item)> engineOf;  // of the item's scope
 };
 
 // Answers clients about contents, each from the engine of the scope that the item is in. Thread contract: any
@@ -42,8 +42,8 @@ class ContentsService final : public QVContentsProtocol,
   void confirmDeletions(bool carryOut, QVContentsErrorReply reply) override;
 
  private:
-  // Of the item's scope. All that is below one folder is of one scope.
-  std::shared_ptr<SyncEngine> engineOf(const ItemRecord &item);
+  // All that is below one folder is of one scope.
+  std::shared_ptr<SyncEngine> engineOf(const ItemRecord &item) const { return host_.engineOf(item); }
   std::vector<std::shared_ptr<SyncEngine>> engines();  // the drive's first
   using Found = std::function<void(const ItemRecord *item, const NSError &error)>;
   // Finds the item at the URL, looking on disk where it isn't known. `found` comes once, on any thread.

@@ -127,12 +127,15 @@ void SyncEngine::stop() {
   {
     const Lock lock(mutex_);
     waiters.swap(waiters_);
+    for (auto &fetch : fetches_) fetching_.push_back(std::move(fetch));
+    fetches_.clear();
   }
   for (Waiter &waiter : waiting_) waiters.push_back(std::move(waiter));
   waiting_.clear();
   const NSError error = qvc_error(QVErrorShuttingDown, "the daemon is shutting down");
   for (Waiter &waiter : waiters)
     dispatch_async_global([done = std::move(waiter.done), error] { done(error); });
+  answerFetches(error);
 }
 
 std::string SyncEngine::identityFolder() const {
@@ -159,6 +162,16 @@ void SyncEngine::checkReplica() {
   if (known.empty()) known = found.empty() ? NewRecordName() : found;
   if (found != known) std::ofstream(path + "/" + kIdentityName, std::ios::trunc) << known << "\n";
   store_.setText(kReplica, known);
+}
+
+// The shared container is what it is now: somebody was asked about what is missing.
+void SyncEngine::adoptContainer() {
+  const std::string path = identityFolder();
+  ::mkdir(path.c_str(), 0700);
+  ::mkdir((path + "/" + QVDocumentsFolderName(scope().container)).c_str(), 0700);
+  struct stat status = {};
+  if (::stat(path.c_str(), &status) == 0) storageInode_ = status.st_ino;
+  std::ofstream(path + "/" + kIdentityName, std::ios::trunc) << store_.text(kReplica) << "\n";
 }
 
 bool SyncEngine::isReplicaItself() const {
@@ -199,6 +212,19 @@ void SyncEngine::cloudChanged() {
   const Lock lock(mutex_);
   hasCloudNews_ = true;
   wake_.notify_all();
+}
+
+void SyncEngine::fetchNow(std::function<void(const NSError &)> done) {
+  {
+    const Lock lock(mutex_);
+    if (!stop_) {
+      fetches_.push_back(std::move(done));
+      hasCloudNews_ = true;
+      wake_.notify_all();
+      return;
+    }
+  }
+  done(qvc_error(QVErrorShuttingDown, "the daemon is shutting down"));
 }
 
 void SyncEngine::setSignedIn(bool isSignedIn) {
@@ -268,12 +294,13 @@ ContentsResult SyncEngine::keepBoth(const FileLocation &location, PreparedFile &
   return result;
 }
 
-void SyncEngine::whenUploaded(std::vector<ItemNumber> items, std::function<void(const NSError &)> done) {
+void SyncEngine::whenUploaded(std::vector<ItemNumber> items, std::function<void(const NSError &)> done,
+                              std::shared_ptr<const CKCancellation> cancellation) {
   {
     const Lock lock(mutex_);
     if (!stop_) {
       const bool isAll = items.empty();
-      waiters_.push_back({std::move(items), isAll, std::move(done)});
+      waiters_.push_back({std::move(items), isAll, std::move(done), std::move(cancellation)});
       hasLocalNews_ = true;
       wake_.notify_all();
       return;
@@ -295,6 +322,7 @@ void SyncEngine::answerDeletions(bool carryOut) {
       const Lock lock(mutex_);
       hasCloudNews_ = true;
     }
+    if (scope().isShared()) adoptContainer();
     examiner_.allowDeletions();
   });
 }

@@ -83,9 +83,24 @@ constexpr char kMeantUntil[] = R"sql(
 ALTER TABLE meant ADD COLUMN until INTEGER NOT NULL DEFAULT 1;
 )sql";
 
+// Shares. Those that were made before this device looked at them have been passed over, so that everything
+// is read once more.
+constexpr char kShares[] = R"sql(
+CREATE TABLE shares(
+  zone TEXT NOT NULL,
+  zoneOwner TEXT NOT NULL,
+  record TEXT NOT NULL,
+  root TEXT NOT NULL,
+  owner TEXT NOT NULL,
+  PRIMARY KEY(zone, zoneOwner, record)
+) WITHOUT ROWID;
+CREATE INDEX shares_root ON shares(root);
+DELETE FROM meta WHERE key = 'changeToken';
+)sql";
+
 // What a zone of another account needs: what may be done in it, what hangs at its top, and what was refused
 // for good.
-constexpr char kShared[] = R"sql(
+constexpr char kOthersZones[] = R"sql(
 CREATE TABLE accesses(share TEXT PRIMARY KEY, root TEXT NOT NULL, writable INTEGER NOT NULL) WITHOUT ROWID;
 CREATE INDEX accesses_root ON accesses(root);
 CREATE TABLE tops(record TEXT PRIMARY KEY, parent TEXT NOT NULL) WITHOUT ROWID;
@@ -94,7 +109,7 @@ ALTER TABLE uploads ADD COLUMN refused INTEGER NOT NULL DEFAULT 0;
 )sql";
 
 // Each step leads from the version of its place to the next; version 0 is an empty database.
-constexpr const char *kSteps[] = {kTables, kUnfinished, kMeant, kMeantUntil, kShared};
+constexpr const char *kSteps[] = {kTables, kUnfinished, kMeant, kMeantUntil, kShares, kOthersZones};
 
 }  // namespace
 

@@ -11,6 +11,7 @@
 
 #include "keld/ItemRecord.h"
 #include "keld/Sql.h"
+#include "platform/cloudkit/CKRecordID.h"
 #include "platform/foundation/NSError.h"
 #include "platform/foundation/ThreadSafety.h"
 
@@ -80,6 +81,14 @@ struct ShareAccess {
   bool operator==(const ShareAccess &) const = default;
 };
 
+// A share that this account sees: the zone that it is in, and the record that it shares with all below it.
+struct KnownShare {
+  CKRecordID record;
+  std::string root;   // its record's name
+  std::string owner;  // the account's name; "" when the share didn't tell
+  bool operator==(const KnownShare &) const = default;
+};
+
 // The device's side of the sync, in a database of its own: what is known of the cloud's records, the uploads
 // that wait, and how far both feeds were read. It survives kill -9 at any moment, and can be thrown away: the
 // markers on the files and the cloud have everything again.
@@ -130,6 +139,13 @@ class SyncStore {
   std::vector<UnfinishedRecord> unfinished();
   std::optional<UnfinishedRecord> unfinished(const std::string &record);
   void forgetUnfinished();  // all
+
+  // Shares, as the feeds of changes tell them.
+  void putShare(const KnownShare &share);
+  void eraseShare(const CKRecordID &record);
+  std::optional<KnownShare> share(const CKRecordID &record);
+  std::optional<KnownShare> shareOfRoot(const std::string &root);
+  std::vector<KnownShare> shares();  // all
 
   // Contents whose save was begun, and may have been carried out without this device being told.
   void noteSent(const std::string &record, const std::string &digest);
@@ -197,6 +213,7 @@ class SyncStore {
   std::optional<SyncRow> one(SqlStatement &statement);
   std::vector<SyncRow> all(SqlStatement &statement);
   static std::vector<UnfinishedRecord> readUnfinished(SqlStatement &asked);
+  static std::vector<KnownShare> readShares(SqlStatement &asked);
   QueuedUpload readQueued(const SqlStatement &row);
   std::vector<QueuedUpload> queuedOf(SqlStatement &statement);
   SqlStatement &statement(const char *sql) REQUIRES(mutex_);

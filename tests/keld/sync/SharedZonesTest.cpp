@@ -134,6 +134,78 @@ TEST_F(SharedZonesTest, aDocumentThatIsMovedIntoASharedFolderIsTheOwnersThen) {
   EXPECT_EQ(ben.device.status(ben.by("anna", "project/note.txt")).upload, QVUploadState::inCloud);
 }
 
+TEST_F(SharedZonesTest, pinsAndDownloadsOfAFolderAreTheZones) {
+  shareProject(Permission::readWrite);
+  const std::string plan = ben.by("anna", "project/plan.txt");
+  EXPECT_TRUE(ben.device.isDataless(plan));
+  ASSERT_FALSE(ben.device.pin(ben.by("anna", "project")));
+  EXPECT_TRUE(eventually([&] { return ben.device.read(plan) == "the plan"; }));
+  EXPECT_TRUE(ben.device.evict(plan).is(QVTessalyErrorDomain, QVErrorPinned));
+  ASSERT_FALSE(ben.device.pin(ben.by("anna", "project"), false));
+  EXPECT_FALSE(ben.device.evict(plan));
+  EXPECT_TRUE(ben.device.isDataless(plan));
+  EXPECT_GE(ben.device.transfers().downloads.done, 1U);
+}
+
+TEST_F(SharedZonesTest, anEditorThatSavesByRenamingDoesNotLeaveTheShare) {
+  anna.device.keld.write("letter.txt", "dear Ben");
+  ASSERT_TRUE(anna.hasSentAll());
+  const std::string letter = ben.accept(anna.share("letter.txt", {{"ben", Permission::readWrite}}));
+  EXPECT_EQ(ben.device.contents(letter), "dear Ben");
+  ben.device.keld.write(letter + "-new", "dear Anna");
+  ben.device.keld.rename(letter + "-new", letter);
+  EXPECT_TRUE(anna.device.saysSoon("letter.txt", "dear Anna"));
+  ASSERT_TRUE(ben.hasSentAll());
+  // With a pause, in which the other file is seen.
+  ben.device.keld.write(letter + "-new", "dear Anna, again");
+  EXPECT_EQ(ben.refusalOf(letter + "-new"), QVErrorNotInSharedFolder);
+  ben.device.keld.rename(letter + "-new", letter);
+  EXPECT_TRUE(anna.device.saysSoon("letter.txt", "dear Anna, again"));
+  ASSERT_TRUE(ben.hasSentAll());
+  EXPECT_TRUE(ben.device.exists(letter));
+}
+
+// --- The sharing operations on what others share.
+
+TEST_F(SharedZonesTest, aParticipantIsToldOfTheShareAndLeavesItByAnOperation) {
+  const CKShare share = shareProject(Permission::readOnly);
+  const NSURL plan = ben.device.url(ben.by("anna", "project/plan.txt"));
+  Once<std::optional<CKShare>, NSURL, NSError> told("share");
+  ben.device.keld.session()->startOperation_toCopySharingInfoAtURL(nullptr, plan, told.completion());
+  ASSERT_FALSE(told.value<2>()) << told.value<2>().description();
+  ASSERT_TRUE(told.value<0>());
+  EXPECT_EQ(told.value<0>()->URL, share.URL);
+  EXPECT_EQ(told.value<0>()->recordID.zoneID.ownerName, "anna");
+  Once<NSError> left("leaving");
+  ben.device.keld.session()->startOperation_toUnshareShare(nullptr, told.value<0>(), true, left.completion());
+  EXPECT_FALSE(left.value<0>()) << left.value<0>().description();
+  EXPECT_TRUE(hasNothingOf(ben, "anna"));
+  EXPECT_TRUE(anna.device.exists("project/plan.txt"));
+}
+
+TEST_F(SharedZonesTest, aParticipantCantShareWhatIsTheOwners) {
+  shareProject(Permission::readWrite);
+  Once<std::optional<CKShare>, NSError> made("share");
+  ben.device.keld.session()->createSharingInfoForURL(ben.device.url(ben.by("anna", "project/plan.txt")),
+                                                     made.completion());
+  EXPECT_TRUE(made.value<1>().is(QVTessalyErrorDomain, QVErrorNotShareable)) << made.value<1>().description();
+}
+
+TEST_F(SharedZonesTest, itemsKnowTheirRecordsAndWhoSharesThem) {
+  shareProject(Permission::readWrite);
+  const std::string plan = ben.by("anna", "project/plan.txt");
+  const QVFileObjectID id = QVFileObjectID::documentID(ben.device.keld.number(plan));
+  Once<std::map<QVFileObjectID, CKRecordID>, NSError> records("records");
+  ben.device.keld.session()->resolveFileObjectIDsToContentRecordIDs({id}, records.completion());
+  ASSERT_EQ(records.value<0>().count(id), 1U);
+  EXPECT_EQ(records.value<0>().at(id), (CKRecordID{anna.recordAt("project/plan.txt"), {"drive", "anna"}}));
+  Once<bool, bool, bool, std::optional<std::string>, NSError> options("share options");
+  ben.device.keld.session()->getShareOptionsOfItemIdentifier(id.asString(), options.completion());
+  EXPECT_TRUE(options.value<0>());
+  EXPECT_TRUE(options.value<1>());
+  EXPECT_FALSE(options.value<2>());
+}
+
 TEST_F(SharedZonesTest, tagsAndFavouritesAreEachPersonsOwn) {
   anna.device.keld.folder("project");
   anna.device.keld.write("project/plan.txt", "the plan");

@@ -101,6 +101,31 @@ TEST_F(SharesTakenBackTest, aRestartGoesOnWhereItWas) {
   EXPECT_TRUE(ben.hasSentAll());
 }
 
+TEST_F(SharesTakenBackTest, aRestartInTheMiddleOfALargeZoneGetsAllOfIt) {
+  constexpr int kDocuments = 450;
+  anna.device.keld.folder("project");
+  for (int number = 0; number < kDocuments; ++number)
+    anna.device.keld.write("project/" + std::to_string(number), std::to_string(number));
+  ASSERT_TRUE(anna.hasSentAll());
+  const CKShare share = anna.share("project", {{"ben", Permission::readWrite}});
+  ASSERT_FALSE(ben.cloud->acceptShare(share.URL, {}).error);
+  const auto count = [&] {
+    std::error_code problem;
+    const std::filesystem::directory_iterator begin(ben.by("anna", "project"), problem);
+    return problem ? 0 : std::distance(begin, std::filesystem::directory_iterator());
+  };
+  EXPECT_TRUE(eventually([&] { return count() > 0; }));
+  for (int time = 0; time < 3; ++time) {
+    ben.device.keld.stop();
+    ben.device.keld.start();
+  }
+  ben.device.keld.waitForFirstScan();
+  EXPECT_TRUE(eventually([&] { return count() == kDocuments; })) << count();
+  EXPECT_EQ(ben.device.contents(ben.by("anna", "project/449")), "449");
+  EXPECT_TRUE(ben.hasSentAll());
+  EXPECT_EQ(anna.device.names("project").size(), std::size_t{kDocuments});
+}
+
 TEST_F(SharesTakenBackTest, aKillBeforeTheContainerIsMadeLeavesNothingHalfDone) {
   const CKShare share = shareProject(Permission::readWrite);
   ben.device.keld.stop();
@@ -133,6 +158,27 @@ TEST_F(SharesTakenBackTest, aContainerThatHasVanishedDeletesNothing) {
   Once<NSError> answer("deletions");
   ben.device.keld.session()->confirmDeletions(false, answer.completion());
   EXPECT_TRUE(ben.device.knowsSoon(ben.by("anna", "project/plan.txt")));
+  // What is deleted then is meant.
+  ben.device.keld.remove(ben.by("anna", "project/plan.txt"));
+  EXPECT_TRUE(anna.device.losesSoon("project/plan.txt"));
+}
+
+TEST_F(SharesTakenBackTest, aLostItemDatabaseAndALostDatabaseOfTheZoneAreFoundAnew) {
+  shareProject(Permission::readWrite);
+  const std::string plan = ben.by("anna", "project/plan.txt");
+  EXPECT_EQ(ben.device.contents(plan), "the plan");
+  for (const std::string &lost : {ben.device.keld.databasePath(), ben.stateOf("anna")}) {
+    ben.device.keld.stop();
+    for (const char *suffix : {"", "-wal", "-shm"}) std::filesystem::remove(lost + suffix);
+    ben.device.keld.start();
+    ben.device.keld.waitForFirstScan();
+    EXPECT_TRUE(eventually([&] { return ben.device.status(plan).upload == QVUploadState::inCloud; })) << lost;
+    EXPECT_TRUE(ben.hasSentAll());
+    EXPECT_EQ(ben.device.names(ben.by("anna")), std::vector<std::string>{"project"});
+    EXPECT_EQ(ben.device.names(ben.by("anna", "project")), std::vector<std::string>{"plan.txt"});
+    EXPECT_EQ(anna.device.names("project"), std::vector<std::string>{"plan.txt"});
+    EXPECT_EQ(ben.device.read(plan), "the plan");
+  }
 }
 
 TEST_F(SharesTakenBackTest, severalOwnersHaveAPlaceEachWhateverTheirNames) {

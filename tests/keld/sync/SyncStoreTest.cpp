@@ -281,7 +281,8 @@ TEST_F(SyncStoreTest, aDatabaseOfTheFirstVersionIsBroughtUpToDate) {
   {
     SqlDatabase database(old, SqlDatabase::Access::readWrite, 100);
     database.execute(
-        "DROP TABLE unfinished; DROP TABLE meant; ALTER TABLE rows DROP COLUMN tags;"
+        "DROP TABLE unfinished; DROP TABLE meant; DROP TABLE shares; DROP TABLE accesses; DROP TABLE tops;"
+        "ALTER TABLE uploads DROP COLUMN refused; ALTER TABLE rows DROP COLUMN tags;"
         "ALTER TABLE rows DROP COLUMN lastUsed; ALTER TABLE rows DROP COLUMN favoriteRank;"
         "PRAGMA user_version = 1");
   }

@@ -5,6 +5,7 @@
 #include <string>
 #include <vector>
 
+#include "keld/AccountKeeper.h"
 #include "keld/SharedContainer.h"
 #include "keld/sync/SharedZones.h"
 #include "platform/cloudkit/CKShare.h"
@@ -19,7 +20,7 @@ using Participants = std::map<std::string, Permission>;
 class AccountDevice {
  public:
   AccountDevice(const std::string &cloudFolder, const std::string &account)
-      : name(account), cloud(open(cloudFolder, account)), device(options(cloud)) {}
+      : name(account), cloud(open(cloudFolder, account)), device(options(account, cloud)) {}
 
   // Shares what is at the path, or changes how it is shared.
   CKShare share(const std::string &path, const Participants &participants,
@@ -88,10 +89,11 @@ class AccountDevice {
     EXPECT_TRUE(cloud) << error.description();
     return cloud;
   }
-  static KeldOptions options(const std::shared_ptr<CKCloud> &cloud) {
+  static KeldOptions options(const std::string &account, const std::shared_ptr<CKCloud> &cloud) {
     KeldOptions options;
     options.sync.cloud = cloud;
     options.sync.device = cloud->deviceName();
+    if (AccountKeeper::isValidName(account)) options.sync.account = account;
     return options;
   }
   CKShare save(CKShare share, const Participants &participants, Permission publicPermission) {
