@@ -3,6 +3,7 @@
 #include "cli/Commands.h"
 #include "cli/DaemonClient.h"
 #include "cli/ExitStatus.h"
+#include "cli/HomeCloud.h"
 #include "cli/Text.h"
 
 namespace droxa {
@@ -10,6 +11,7 @@ namespace droxa {
 int runAccountShow(CommandContext &context, bool json) {
   const auto account = DaemonClient(context.daemon, context.timeout).account();
   if (account.error) return reportError(context, "the account", account.error);
+  const std::string drive = rememberedAccount(DroxaProcessHome());
   if (json) {
     nlohmann::ordered_json object;
     object["account"] =

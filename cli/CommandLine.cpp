@@ -165,6 +165,11 @@ class CommandLine {
                     "What this device is called, as conflict copies show it; remembered too (default: the\n"
                     "machine's name)")
         ->type_name("NAME");
+    run->add_option(
+           "--account", words_.account,
+           "The account in the cloud that the drive belongs to, remembered too: homes of two accounts\n"
+           "on one cloud are two people's (default: who runs it)")
+        ->type_name("NAME");
   }
 
   CLI::App *add(const char *name, const char *description) {
@@ -201,7 +206,8 @@ int runCommand(const CommandLine &line, const Words &words, std::ostream &out, s
   };
   const std::optional<std::string> home = given(words.home);
   if (line.has("run"))
-    return runRun(out, err, {home, given(words.folder), given(words.cloud), given(words.device), given(words.account)});
+    return runRun(out, err,
+                  {home, given(words.folder), given(words.cloud), given(words.device), given(words.account)});
 
   DroxaSetProcessHome(DroxaHome::resolve(home));
   const std::chrono::milliseconds timeout(std::llround(words.timeout * 1000));

@@ -138,8 +138,10 @@ bool rememberHomeCloud(const DroxaHome &home, const HomeCloud &cloud, std::strin
   const std::string path = settingsFile(home);
   const std::string made = path + ".new";
   std::ofstream file(made, std::ios::trunc);
-  file << Json{{"cloud", orNull(cloud.folder)}, {"device", orNull(cloud.device)}, {"account", orNull(cloud.account)}}.dump(
-              2, ' ', false, Json::error_handler_t::replace)
+  file << Json{{"cloud", orNull(cloud.folder)},
+               {"device", orNull(cloud.device)},
+               {"account", orNull(cloud.account)}}
+              .dump(2, ' ', false, Json::error_handler_t::replace)
        << "\n";
   file.close();
   if (file && std::rename(made.c_str(), path.c_str()) == 0) return true;

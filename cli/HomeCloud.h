@@ -10,8 +10,8 @@ namespace droxa {
 
 // Which cloud a home's drive is in, whose it is, and what its device is called there.
 struct HomeCloud {
-  std::string folder;  // "": the home's own
-  std::string device;  // "": as the machine is
+  std::string folder;        // "": the home's own
+  std::string device;        // "": as the machine is
   std::string account = {};  // "": who runs it
   std::vector<std::string> keldOptions() const;
 };

@@ -45,6 +45,12 @@ std::shared_ptr<Keld> Keld::start(const DroxaHome &home, KeldOptions options, st
   if (!problem->empty()) return nullptr;
   daemon->removeAbandonedActions();
   try {
+    daemon->driveAccount_ = DriveAccount(home, daemon->options_.sync.account);
+  } catch (const std::exception &refused) {
+    *problem = refused.what();
+    return nullptr;
+  }
+  try {
     daemon->open();
   } catch (const std::exception &error) {
     *problem = error.what();
@@ -96,11 +102,10 @@ void Keld::openSync() {
   SyncOptions options = options_.sync;
   if (options.device.empty()) options.device = DeviceName(home_);
   std::shared_ptr<CKCloud> cloud = options.cloud;
-  const std::string drive = DriveAccount(home_, options.account);
   if (!cloud) {
     const std::string folder = options.cloudFolder.empty() ? home_.root() + "/cloud" : options.cloudFolder;
     NSError error;
-    cloud = EmbeddedCloud::open(folder, drive, options.device, &error);
+    cloud = EmbeddedCloud::open(folder, driveAccount_, options.device, &error);
     if (!cloud) throw std::runtime_error(error.localizedDescription());
   }
   const auto readItems = [this](const std::function<void(ItemQueries &)> &work) {
@@ -109,7 +114,7 @@ void Keld::openSync() {
   sync_ = std::make_shared<SyncEngine>(
       replicaPath_, home_.state() + "/sync.sqlite", cloud, [this] { return keeper_.get(); }, readItems,
       options);
-  RememberDriveAccount(sync_->store(), drive);
+  RememberDriveAccount(sync_->store(), driveAccount_);
   ContentsServiceHost host;
   host.replicaPath = replicaPath_;
   host.keeper = [this]() -> Keeper & { return *keeper_; };
@@ -119,7 +124,7 @@ void Keld::openSync() {
   host.sharedEngines = [this] { return sharedZones_->engines(); };
   host.engineOf = [this](const ItemRecord &item) { return engineOf(item); };
   contents_ = std::make_shared<ContentsService>(std::move(host), sync_);
-  openSharing(cloud, drive);
+  openSharing(cloud);
   std::string itemDatabase;
   (void)readItems([&](ItemQueries &queries) { itemDatabase = queries.metaText("uuid"); });
   sync_->start(itemDatabase);
@@ -146,7 +151,7 @@ void Keld::openSharedZones(const std::shared_ptr<CKCloud> &cloud, const std::str
   sharedFeed_ = sharedZones_.get();
 }
 
-void Keld::openSharing(const std::shared_ptr<CKCloud> &cloud, const std::string &accountName) {
+void Keld::openSharing(const std::shared_ptr<CKCloud> &cloud) {
   SharingHost host;
   host.replicaPath = replicaPath_;
   host.keeper = [this]() -> Keeper & { return *keeper_; };
@@ -159,8 +164,8 @@ void Keld::openSharing(const std::shared_ptr<CKCloud> &cloud, const std::string 
   host.engineOfZone = [this](const CKRecordZoneID &zone) {
     return zone == sync_->scope().zone ? sync_ : sharedZones_->engineOf(SharedContainerOf(zone.ownerName));
   };
-  sharing_ =
-      std::make_shared<SharingService>(std::move(host), SharingPlaces(cloud, accountName), options_.sharing);
+  sharing_ = std::make_shared<SharingService>(std::move(host), SharingPlaces(cloud, driveAccount_),
+                                              options_.sharing);
 }
 
 std::shared_ptr<SyncEngine> Keld::engineOf(const ItemRecord &item) {
@@ -188,7 +193,7 @@ void Keld::offerAccount(bool mayOffer) {
   });
   if (wasOffered) return;
   if (mayOffer && !account_->isSignedIn()) {
-    const NSError error = account_->signIn(DriveAccount(home_, options_.sync.account));
+    const NSError error = account_->signIn(driveAccount_);
     if (error) os_log_error(qvc_default_log(), "[ERROR] can't sign the drive's account in: %@", error);
   }
   performAndWait([](ItemEdits &edits) { edits.setMeta("accountOffered", 1); });

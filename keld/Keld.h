@@ -90,7 +90,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   void openSync();
   std::shared_ptr<SyncEngine> engineOf(const ItemRecord &item);
   void openSharedZones(const std::shared_ptr<CKCloud> &cloud, const std::string &itemDatabase);
-  void openSharing(const std::shared_ptr<CKCloud> &cloud, const std::string &accountName);
+  void openSharing(const std::shared_ptr<CKCloud> &cloud);
   bool replicaHasPromises() const;
   void offerAccount(bool mayOffer);
   std::string identifierForAccount(const std::string &name);
@@ -101,6 +101,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   const std::string replicaPath_;
   const std::string databasePath_;
   const std::int64_t startedNanoseconds_;
+  std::string driveAccount_;  // constant after start()
   std::unique_ptr<HomeLock> lock_;
   ContainerList containers_;
   ListingCursors cursors_;

@@ -27,7 +27,8 @@ inline constexpr std::int64_t QVErrorReadOnlyShare = 46;
 // Of what was put beside the shared folders instead of into one: it is kept on this machine alone.
 inline constexpr std::int64_t QVErrorNotInSharedFolder = 47;
 inline constexpr std::int64_t QVErrorBusy = 40;  // too much is under way already; to be asked again later
-inline constexpr std::int64_t QVErrorNotShareable = 41;  // the item is of a kind, or in a place, that isn't shared
+inline constexpr std::int64_t QVErrorNotShareable =
+    41;  // the item is of a kind, or in a place, that isn't shared
 
 NSError qvc_errorLoggedOut();
 // Describes it by a checked format (platform/oslog/LogFormat.h).

@@ -47,8 +47,8 @@ inline constexpr std::uint64_t QVProcessWithdrawSubshares = 1;  // withdraws the
 // that isn't there is nil, the error is the last one.
 //
 // Errors of every call: 2 when nobody is signed in; 22 for a URL, share or record that is nil; 14 when there
-// is nothing at the URL in the drive; 41 for what isn't shared: aliases, containers' own folders, what lies in
-// the trash or in private storage, or is kept local; 34 when it was cancelled, also by the end of the
+// is nothing at the URL in the drive; 41 for what isn't shared: aliases, containers' own folders, what lies
+// in the trash or in private storage, or is kept local; 34 when it was cancelled, also by the end of the
 // connection; 40 when too many calls wait already; 33 when the daemon ends. The cloud's errors
 // (CKErrorDomain) come as they are; what doesn't move for a minute ends with CKErrorIsTimeout.
 class QVShareOperationProtocol {
@@ -80,8 +80,8 @@ class QVShareOperationProtocol {
   // when the item has no share of its own.
   virtual void startOperation_toModifyRecordAccessAtURL(Operation op, const NSURL &url, bool allowAccess,
                                                         QVRecordAccessReply reply) = 0;
-  // Tokens by which the account shows others that it may read the item (CKShareTokens): first the share's,
-  // nil when the item is in none, then the item's own.
+  // Tokens by which the account shows others that it may read the item (CKShareTokens): first the share's, by
+  // which it may where the item is in a share, then the item's own.
   virtual void startOperation_toCopyParticipantTokenAtURL(Operation op, const NSURL &url,
                                                           QVParticipantTokenReply reply) = 0;
   // Replies when the item, and everything below it that has changed so far, is safe in the cloud; or with why

@@ -29,14 +29,14 @@ void SharingQueue::start(const std::shared_ptr<SharingOwner> &owner,
     if (const auto self = queue.lock()) self->takeOut(raw);
   });
   operation->offerCancelling();
-  const auto entry = std::make_shared<const Entry>(Entry{operation, owner, std::move(task)});
+  const auto entry = std::make_shared<Entry>(Entry{operation, owner, std::move(task)});
   const NSError refused = add(entry);
   if (!refused) return;
   operation->finish();
   entry->task.answer(refused);
 }
 
-NSError SharingQueue::add(const std::shared_ptr<const Entry> &entry) {
+NSError SharingQueue::add(const std::shared_ptr<Entry> &entry) {
   const Lock lock(mutex_);
   if (stopped_) return shuttingDown();
   if (entry->owner->hasEnded) return clientGone();
@@ -61,12 +61,12 @@ void SharingQueue::startMore() {
   }
 }
 
-void SharingQueue::runOnPool(const std::shared_ptr<const Entry> &entry) {
+void SharingQueue::runOnPool(const std::shared_ptr<Entry> &entry) {
   running_.insert(entry);
   dispatch_async_global([self = shared_from_this(), entry] { self->run(entry); });
 }
 
-void SharingQueue::run(const std::shared_ptr<const Entry> &entry) {
+void SharingQueue::run(const std::shared_ptr<Entry> &entry) {
   SharingOperation &operation = *entry->operation;
   NSError error = operation.stopped();
   try {
@@ -79,6 +79,7 @@ void SharingQueue::run(const std::shared_ptr<const Entry> &entry) {
   if (const NSError why = operation.stopped(); error && why) error = why;
   operation.finish();
   entry->task.answer(error);
+  entry->task = {};  // what it held isn't held after stop()
   const Lock lock(mutex_);
   running_.erase(entry);
   startMore();

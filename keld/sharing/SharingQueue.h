@@ -54,12 +54,12 @@ class SharingQueue final : public std::enable_shared_from_this<SharingQueue> {
     std::shared_ptr<SharingOwner> owner;
     Task task;
   };
-  using Entries = std::deque<std::shared_ptr<const Entry>>;
+  using Entries = std::deque<std::shared_ptr<Entry>>;
 
-  NSError add(const std::shared_ptr<const Entry> &entry) EXCLUDES(mutex_);
+  NSError add(const std::shared_ptr<Entry> &entry) EXCLUDES(mutex_);
   void startMore() REQUIRES(mutex_);
-  void runOnPool(const std::shared_ptr<const Entry> &entry) REQUIRES(mutex_);
-  void run(const std::shared_ptr<const Entry> &entry) EXCLUDES(mutex_);
+  void runOnPool(const std::shared_ptr<Entry> &entry) REQUIRES(mutex_);
+  void run(const std::shared_ptr<Entry> &entry) EXCLUDES(mutex_);
   void takeOut(const SharingOperation *operation) EXCLUDES(mutex_);
   Entries entriesOf(const SharingOwner *owner) const EXCLUDES(mutex_);  // null: everybody's
 
@@ -67,7 +67,7 @@ class SharingQueue final : public std::enable_shared_from_this<SharingQueue> {
   mutable Mutex mutex_;
   std::condition_variable_any idle_;
   Entries waiting_ GUARDED_BY(mutex_);
-  std::set<std::shared_ptr<const Entry>> running_ GUARDED_BY(mutex_);
+  std::set<std::shared_ptr<Entry>> running_ GUARDED_BY(mutex_);
   bool stopped_ GUARDED_BY(mutex_) = false;
 };
 

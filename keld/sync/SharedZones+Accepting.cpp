@@ -3,7 +3,6 @@
 #include <algorithm>
 
 #include "keld/SharedContainer.h"
-#include "keld/sync/CloudErrors.h"
 #include "keld/sync/SharedZones.h"
 #include "platform/dispatch/dispatch.h"
 #include "tessaly/QVErrors.h"
@@ -17,7 +16,11 @@ constexpr std::chrono::milliseconds kFirstPause{5}, kLongestPause{200};
 }  // namespace
 
 void SharedZones::acceptShare(const NSURL &url, QVURLReply reply) {
-  if (!url) return reply(NSURL(), qvc_error(QVErrorInvalidArgument, "a share is accepted by its URL"));
+  if (!url || url.isFileURL()) {
+    const std::string asked = url ? url.description() : "nothing";
+    return reply(NSURL(), qvc_error(QVErrorInvalidArgument,
+                                    asked + " isn't the URL of a share; ask its owner for that"));
+  }
   dispatch_async_global(
       [self = shared_from_this(), url, reply = std::move(reply)] { self->accept(url, reply); });
 }
@@ -26,8 +29,6 @@ void SharedZones::accept(const NSURL &url, const QVURLReply &reply) {
   CKCallContext call = CKCallContext::withTimeout(kCallTimeout);
   call.cancellation = stopping_;
   const CKShareMetadataReply accepted = cloud_->acceptShare(url, call);
-  const bool isTransient = accepted.error && CKErrorIsTransient(accepted.error);
-  if (isTransient) return reply(NSURL(), ErrorForClients(accepted.error, url.description()));
   if (accepted.error) return reply(NSURL(), accepted.error);
   const CKShareMetadata &metadata = accepted.metadata;
   if (!metadata.share.rootRecordID)

@@ -51,10 +51,14 @@ SharedZones::~SharedZones() {
 void SharedZones::readTitles(const std::string &stateFolder,
                              const std::function<void(const std::string &, const std::string &)> &setTitle) {
   for (const std::string &path : databasesIn(stateFolder + kFolder)) {
-    SyncStore store(path);
-    const std::string owner = store.text(kOwner);
-    const std::string title = store.text(kTitle);
-    if (!owner.empty() && !title.empty()) setTitle(SharedContainerOf(owner), title);
+    try {
+      SyncStore store(path);
+      const std::string owner = store.text(kOwner);
+      const std::string title = store.text(kTitle);
+      if (!owner.empty() && !title.empty()) setTitle(SharedContainerOf(owner), title);
+    } catch (const SqlError &) {
+      // start() tells.
+    }
   }
 }
 
@@ -159,7 +163,8 @@ void SharedZones::lookForZones() {
   for (const CKRecordZoneID &zone : list.zones) {
     if (zone.zoneName != DriveZone().zoneName) continue;
     listed.insert(SharedContainerOf(zone.ownerName));
-    begin(zone.ownerName);
+    tryToBegin(zone.ownerName);
+    if (const auto engine = engineOf(SharedContainerOf(zone.ownerName))) refreshTitle(*engine);
   }
   // What isn't listed its engine has to find gone by itself: it knows what is to become of its items.
   for (const auto &engine : engines())
@@ -181,24 +186,49 @@ std::string SharedZones::databaseOf(const std::string &containerID) const {
 
 void SharedZones::beginKnown() {
   for (const std::string &path : databasesIn(host_.stateFolder + kFolder)) {
-    const std::string owner = SyncStore(path).text(kOwner);
-    // One that a killed process has just made.
-    if (owner.empty())
-      removeDatabase(path);
-    else
-      begin(owner);
+    try {
+      const std::string owner = SyncStore(path).text(kOwner);
+      // One that a killed process has just made.
+      if (owner.empty())
+        removeDatabase(path);
+      else
+        tryToBegin(owner);
+    } catch (const SqlError &error) {
+      os_log_error(qvc_default_log(), "[ERROR] %s: %s", path, std::string(error.what()));
+    }
   }
 }
 
-// By what people know the owner.
+// One zone that can't be shown leaves the others, and the drive, alone.
+void SharedZones::tryToBegin(const std::string &owner) {
+  try {
+    begin(owner);
+    failed_.erase(owner);
+  } catch (const std::exception &error) {
+    if (failed_.insert(owner).second)
+      os_log_error(qvc_default_log(), "[ERROR] what %s shares can't be shown: %s", owner,
+                   std::string(error.what()));
+  }
+}
+
 std::string SharedZones::titleOf(const std::string &owner) const {
   CKCallContext call = CKCallContext::withTimeout(kCallTimeout);
   call.cancellation = stopping_;
   const CKShareParticipantsReply reply = cloud_->lookUpShareParticipants({owner}, call);
-  std::string name;
-  if (reply.results.size() == 1 && !reply.results.front().error)
-    name = reply.results.front().participant.userIdentity.displayName;
+  if (reply.results.size() != 1 || reply.results.front().error) return "";
+  const std::string &name = reply.results.front().participant.userIdentity.displayName;
   return SharedContainerTitle(name.empty() ? owner : name);
+}
+
+// Once a start: people seldom get another name.
+void SharedZones::refreshTitle(SyncEngine &engine) {
+  const std::string &container = engine.scope().container;
+  if (titled_.count(container) != 0) return;
+  const std::string title = titleOf(engine.scope().zone.ownerName);
+  if (title.empty()) return;
+  titled_.insert(container);
+  if (title != engine.store().text(kTitle)) engine.store().setText(kTitle, title);
+  host_.setTitle(container, title);
 }
 
 void SharedZones::makeContainer(const std::string &containerID) const {
@@ -217,7 +247,8 @@ void SharedZones::begin(const std::string &owner) {
   const SyncScope scope{{DriveZone().zoneName, owner}, container};
   auto engine = std::make_shared<SyncEngine>(*drive_, scope, databaseOf(container), cloud_, host_.read);
   if (engine->store().text(kOwner).empty()) {
-    engine->store().setText(kTitle, titleOf(owner));
+    const std::string title = titleOf(owner);
+    engine->store().setText(kTitle, title.empty() ? SharedContainerTitle(owner) : title);
     engine->store().setText(kOwner, owner);
     os_log(qvc_default_log(), "[NOTICE] %s shares with this account: it is shown in %s", owner, container);
   }

@@ -59,11 +59,14 @@ class SharedZones : public std::enable_shared_from_this<SharedZones> {
   void run();
   void look();
   void lookForZones();
+  void tryToBegin(const std::string &owner);
   void begin(const std::string &owner);
   void beginKnown();
   bool end(const std::string &containerID);
   void makeContainer(const std::string &containerID) const;
+  // By what people know the owner; "" when that can't be asked now.
   std::string titleOf(const std::string &owner) const;
+  void refreshTitle(SyncEngine &engine);
   std::string databaseOf(const std::string &containerID) const;
   void zoneIsGone(const std::string &containerID);
   void waitForWork();
@@ -78,6 +81,8 @@ class SharedZones : public std::enable_shared_from_this<SharedZones> {
   const std::shared_ptr<CKCancellation> stopping_ = std::make_shared<CKCancellation>();
   std::unique_ptr<CKSubscription> subscription_;  // its own thread's
   std::chrono::steady_clock::time_point nextPoll_;
+  std::set<std::string> failed_;  // owners whose zones can't be shown; told once
+  std::set<std::string> titled_;  // the containers whose owners were looked up since the start
 
   mutable Mutex mutex_;
   std::condition_variable_any wake_;

@@ -197,6 +197,13 @@ bool Uploader::hasDatalessElsewhere(const SyncRow &row) {
   return found;
 }
 
+bool Uploader::hasChildrenThatLeave(const SyncRow &row) {
+  if (row.kind != NSFileProviderItemKind::folder) return false;
+  for (const SyncRow &child : context_.store.childrenOf(row.record, UINT32_MAX))
+    if (child.item != 0 && !context_.files.item(child.item) && context_.store.queued(child.item)) return true;
+  return false;
+}
+
 Uploader::Prepared Uploader::undoDeletion(const Plan &plan) {
   os_log(qvc_default_log(), "[NOTICE] %s may only be read: its deletion is undone", plan.row.name);
   context_.store.transaction([&] {

@@ -165,6 +165,9 @@ Uploader::Prepared Uploader::prepareDeletion(const std::optional<ItemRecord> &it
     if (needsContents_) needsContents_(location->item);
     return laterWith(plan, NSError());
   }
+  // A folder leaves for another zone after what is in it, which may wait for its contents.
+  if (location && !item && plan->leaves.empty() && hasChildrenThatLeave(plan->row))
+    return laterWith(plan, NSError());
   assets_.forget(plan->entry.item);
   plan->isDeletion = true;
   return Prepared::remove;

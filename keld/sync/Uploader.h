@@ -89,6 +89,7 @@ class Uploader {
   std::optional<Prepared> prepareSharedDeletion(Plan *plan);
   std::optional<Prepared> keepMetadataHere(const FileLocation &location, Plan *plan);
   bool hasDatalessElsewhere(const SyncRow &row);
+  bool hasChildrenThatLeave(const SyncRow &row);
   Prepared refuse(const Plan &plan, const NSError &error);
   Prepared undoChange(const FileLocation &location, const Plan &plan, const std::string &why);
   Prepared undoDeletion(const Plan &plan);

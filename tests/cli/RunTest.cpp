@@ -166,7 +166,7 @@ TEST_F(Import, aFailureHasTheLastWordsOfTheProgram) {
 
 TEST_F(Setup, aHomeRemembersItsCloudAndItsDevice) {
   ASSERT_TRUE(home().create(&problem));
-  const auto first = resolveHomeCloud(home(), root / "cloud", "laptop", {}, {}, &problem);
+  const auto first = resolveHomeCloud(home(), root / "cloud", "laptop", {}, &problem);
   ASSERT_TRUE(first) << problem;
   EXPECT_EQ(first->keldOptions(),
             (std::vector<std::string>{"--cloud", (root / "cloud").native(), "--device", "laptop"}));
@@ -186,6 +186,24 @@ TEST_F(Setup, aDriveStaysInItsCloudOnceItWasServed) {
   EXPECT_NE(problem.find((root / "other").native()), std::string::npos) << problem;
   EXPECT_NE(problem.find(home().root() + "/cloud"), std::string::npos) << problem;
   EXPECT_TRUE(resolveHomeCloud(home(), home().root() + "/cloud/", {}, {}, &problem)) << problem;
+}
+
+TEST_F(Setup, aDriveStaysItsAccountsOnceItWasServed) {
+  ASSERT_TRUE(home().create(&problem));
+  const auto first = resolveHomeCloud(home(), {}, {}, "anna", &problem);
+  ASSERT_TRUE(first) << problem;
+  EXPECT_EQ(first->keldOptions(), (std::vector<std::string>{"--account", "anna"}));
+  ASSERT_TRUE(rememberHomeCloud(home(), *first, &problem)) << problem;
+  EXPECT_EQ(rememberedAccount(home()), "anna");
+  EXPECT_TRUE(resolveHomeCloud(home(), {}, {}, "ben", &problem)) << "nothing was served yet: " << problem;
+  write(home().state() + "/sync.sqlite", "");
+  EXPECT_FALSE(resolveHomeCloud(home(), {}, {}, "ben", &problem));
+  EXPECT_NE(problem.find("\"anna\""), std::string::npos) << problem;
+  EXPECT_NE(problem.find("name another --home"), std::string::npos) << problem;
+  const auto later = resolveHomeCloud(home(), {}, {}, {}, &problem);
+  ASSERT_TRUE(later) << problem;
+  EXPECT_EQ(later->keldOptions(), first->keldOptions());
+  EXPECT_FALSE(resolveHomeCloud(home(), {}, {}, "", &problem));
 }
 
 TEST_F(Setup, aCloudAmongTheDocumentsIsRefused) {

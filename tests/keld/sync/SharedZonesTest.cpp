@@ -29,6 +29,14 @@ TEST_F(SharedZonesTest, anOwnerWithADisplayNameIsShownByIt) {
   ben.device.keld.start();
   ben.device.keld.waitForFirstScan();
   EXPECT_TRUE(isListed());
+  ben.device.keld.stop();
+  ASSERT_FALSE(anna.cloud->setUserIdentity("Anna Smith", "anna@example.org", {}));
+  ben.device.keld.start();
+  ben.device.keld.waitForFirstScan();
+  EXPECT_TRUE(eventually([&] {
+    const auto listed = ben.device.keld.namesIn("");
+    return std::find(listed.begin(), listed.end(), "Shared by Anna Smith") != listed.end();
+  }));
 }
 
 TEST_F(SharedZonesTest, editsTravelBothWays) {
@@ -121,6 +129,20 @@ TEST_F(SharedZonesTest, aSharedFolderThatIsMovedIntoTheOwnDriveIsLeftWithItsCont
   EXPECT_EQ(ben.device.contents("copy/plan.txt"), "the plan");
   ASSERT_TRUE(ben.hasSentAll());
   EXPECT_EQ(anna.device.names("project"), (std::vector<std::string>{"plan.txt"}));
+}
+
+TEST_F(SharedZonesTest, aFolderThatIsMovedIntoASharedOneTakesEverythingAlongAndLeavesNothing) {
+  ben.device.keld.folder("mine/deep");
+  ben.device.keld.write("mine/deep/one.txt", "one");
+  ASSERT_TRUE(ben.hasSentAll());
+  ASSERT_FALSE(ben.device.evict("mine/deep/one.txt"));
+  shareProject(Permission::readWrite);
+  ben.device.keld.rename("mine", ben.by("anna", "project/mine"));
+  EXPECT_TRUE(anna.device.knowsSoon("project/mine/deep/one.txt"));
+  EXPECT_TRUE(anna.device.saysSoon("project/mine/deep/one.txt", "one"));
+  ASSERT_TRUE(ben.hasSentAll());
+  EXPECT_EQ(ben.device.keld.daemon().sync().store().countRows(), 0U);
+  EXPECT_EQ(ben.device.contents(ben.by("anna", "project/mine/deep/one.txt")), "one");
 }
 
 TEST_F(SharedZonesTest, aDocumentThatIsMovedIntoASharedFolderIsTheOwnersThen) {

@@ -181,6 +181,19 @@ TEST_F(SharesTakenBackTest, aLostItemDatabaseAndALostDatabaseOfTheZoneAreFoundAn
   }
 }
 
+TEST_F(SharesTakenBackTest, aDamagedDatabaseOfAZoneLeavesTheDriveAlone) {
+  shareProject(Permission::readWrite);
+  ben.device.keld.stop();
+  for (const char *suffix : {"-wal", "-shm"}) std::filesystem::remove(ben.stateOf("anna") + suffix);
+  std::ofstream(ben.stateOf("anna"), std::ios::trunc) << std::string(10000, 'x');
+  ben.device.keld.start();
+  ben.device.keld.waitForFirstScan();
+  ben.device.keld.write("own.txt", "Ben's own");
+  EXPECT_TRUE(ben.hasSentAll("own.txt"));
+  EXPECT_TRUE(ben.device.exists(ben.by("anna", "project/plan.txt")));
+  EXPECT_TRUE(anna.device.exists("project/plan.txt"));
+}
+
 TEST_F(SharesTakenBackTest, severalOwnersHaveAPlaceEachWhateverTheirNames) {
   const std::string hostile = "../\n%2e " + std::string(200, 'x');
   AccountDevice clara(cloudFolder, hostile);
@@ -197,6 +210,23 @@ TEST_F(SharesTakenBackTest, severalOwnersHaveAPlaceEachWhateverTheirNames) {
   clara.takeBack(share);
   EXPECT_TRUE(hasNothingOf(ben, hostile));
   EXPECT_EQ(ben.device.contents(ben.by("anna", "project/plan.txt")), "the plan");
+}
+
+TEST_F(SharesTakenBackTest, aFolderThatIsMovedFromOneOwnersToAnothersGoesThereWithEverything) {
+  anna.device.keld.folder("project/sub/deep");
+  anna.device.keld.write("project/sub/deep/one.txt", "one");
+  shareProject(Permission::readWrite);
+  AccountDevice clara(cloudFolder, "clara");
+  clara.device.keld.folder("work");
+  ASSERT_TRUE(clara.hasSentAll());
+  ben.accept(clara.share("work", {{"ben", Permission::readWrite}}));
+  ASSERT_TRUE(ben.device.knowsSoon(ben.by("anna", "project/sub/deep/one.txt")));
+  ben.device.keld.rename(ben.by("anna", "project/sub"), ben.by("clara", "work/sub"));
+  EXPECT_TRUE(clara.device.knowsSoon("work/sub/deep/one.txt"));
+  EXPECT_TRUE(anna.device.losesSoon("project/sub"));
+  EXPECT_TRUE(clara.device.saysSoon("work/sub/deep/one.txt", "one"));
+  EXPECT_EQ(ben.device.contents(ben.by("clara", "work/sub/deep/one.txt")), "one");
+  EXPECT_TRUE(ben.hasSentAll());
 }
 
 TEST(SharedContainerName, isAContainersWhateverTheOwnersNameAndEachOwnersOwn) {

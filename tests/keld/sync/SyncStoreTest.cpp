@@ -375,5 +375,32 @@ TEST_F(SyncStoreTest, onlyRecordsWithATagAreInTheCloud) {
   EXPECT_EQ(store.countRows(), 2U);
 }
 
+TEST_F(SyncStoreTest, sharesAreFoundByTheirRootsAndSurviveANewItemDatabase) {
+  const KnownShare own{{"s1", {"drive"}}, "root", "anna"};
+  const KnownShare others{{"s1", {"drive", "ben"}}, "other", "ben"};
+  store.putShare(own);
+  store.putShare(others);
+  store.unbindAll();
+  EXPECT_EQ(store.share(own.record), own);
+  EXPECT_EQ(store.shareOfRoot("other"), others);
+  EXPECT_EQ(store.shares().size(), 2U);
+  KnownShare moved = own;
+  moved.root = "elsewhere";
+  store.putShare(moved);
+  EXPECT_FALSE(store.shareOfRoot("root"));
+  store.eraseShare(own.record);
+  EXPECT_EQ(store.shares(), std::vector<KnownShare>{others});
+}
+
+TEST_F(SyncStoreTest, aDatabaseThatHasPassedOverSharesReadsEverythingOnceMore) {
+  store.setText("changeToken", "t");
+  store.transaction([] {});
+  SqlDatabase(path, SqlDatabase::Access::readWrite, 100)
+      .execute("DROP TABLE shares; PRAGMA user_version = 4");
+  SyncStore upgraded(path);
+  EXPECT_EQ(upgraded.text("changeToken"), "");
+  EXPECT_TRUE(upgraded.shares().empty());
+}
+
 }  // namespace
 }  // namespace droxa::keld
