@@ -27,6 +27,10 @@ inline constexpr std::int64_t QVErrorUnsentChanges = 36;     // the cloud doesn'
 inline constexpr std::int64_t QVErrorDocumentInUse = 37;
 inline constexpr std::int64_t QVErrorPinned = 38;
 inline constexpr std::int64_t QVErrorSharingUnavailable = 39;  // this daemon's cloud takes no shares
+// Of what others share: it may only be read, and what was changed is kept on this machine alone.
+inline constexpr std::int64_t QVErrorReadOnlyShare = 46;
+// Of what was put beside the shared folders instead of into one: it is kept on this machine alone.
+inline constexpr std::int64_t QVErrorNotInSharedFolder = 47;
 inline constexpr std::int64_t QVErrorBusy = 40;  // too much is under way already; to be asked again later
 inline constexpr std::int64_t QVErrorNotShareable =
     41;  // the item is of a kind, or in a place, that isn't shared
