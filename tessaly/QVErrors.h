@@ -1,5 +1,8 @@
 #pragma once
 
+#include <optional>
+#include <string>
+
 #include "platform/foundation/NSError.h"
 #include "platform/oslog/LogFormat.h"
 
@@ -7,6 +10,7 @@ namespace droxa {
 
 inline constexpr char QVTessalyErrorDomain[] = "QVTessalyErrorDomain";
 
+inline constexpr std::int64_t QVErrorNotEntitled = 1;  // to any container of the cloud
 inline constexpr std::int64_t QVErrorLoggedOut = 2;
 inline constexpr std::int64_t QVErrorNoSuchItem = 14;
 inline constexpr std::int64_t QVErrorInvalidArgument = 22;
@@ -30,6 +34,8 @@ NSError qv_errorWithDomain(const char *domain, std::int64_t code,
   return NSError(domain, code, {{NSLocalizedDescriptionKey, description.print(args...)}});
 }
 NSError qvc_error(std::int64_t code, std::string description);
+// 22: a parameter, named in the text, has a value that it can't have.
+NSError qvc_errorInvalidParameter(const std::string &parameter, const std::optional<std::string> &value);
 NSError qvc_errorNoSuchItem(const std::string &asked);
 
 }  // namespace droxa

@@ -12,6 +12,12 @@ std::shared_ptr<NSProgress> &Current() {
 
 }  // namespace
 
+std::shared_ptr<NSProgress> NSProgress::progressWithTotalUnitCount(std::int64_t count) {
+  auto progress = std::make_shared<NSProgress>();
+  progress->setTotalUnitCount(count);
+  return progress;
+}
+
 std::int64_t NSProgress::totalUnitCount() const {
   const Lock lock(mutex_);
   return total_;
@@ -30,6 +36,16 @@ std::int64_t NSProgress::completedUnitCount() const {
 void NSProgress::setCompletedUnitCount(std::int64_t count) {
   const Lock lock(mutex_);
   completed_ = count;
+}
+
+bool NSProgress::isCancellable() const {
+  const Lock lock(mutex_);
+  return isCancellable_;
+}
+
+void NSProgress::setCancellable(bool isCancellable) {
+  const Lock lock(mutex_);
+  isCancellable_ = isCancellable;
 }
 
 void NSProgress::cancel() {

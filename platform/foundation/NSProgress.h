@@ -14,6 +14,7 @@ namespace droxa {
 class NSProgress final {
  public:
   NSProgress() = default;
+  static std::shared_ptr<NSProgress> progressWithTotalUnitCount(std::int64_t count);
   NSProgress(const NSProgress &) = delete;
   NSProgress &operator=(const NSProgress &) = delete;
 
@@ -23,6 +24,9 @@ class NSProgress final {
   std::int64_t completedUnitCount() const;
   void setCompletedUnitCount(std::int64_t count);
 
+  // Whether cancelling it stops anything; for those who offer that to people.
+  bool isCancellable() const;
+  void setCancellable(bool isCancellable);
   void cancel();
   bool isCancelled() const;
   // Called by cancel(); at once, when that has been. A later handler replaces an earlier one.
@@ -35,6 +39,7 @@ class NSProgress final {
   mutable Mutex mutex_;
   std::int64_t total_ GUARDED_BY(mutex_) = -1;
   std::int64_t completed_ GUARDED_BY(mutex_) = 0;
+  bool isCancellable_ GUARDED_BY(mutex_) = true;
   bool isCancelled_ GUARDED_BY(mutex_) = false;
   std::function<void()> cancellationHandler_ GUARDED_BY(mutex_);
 };
