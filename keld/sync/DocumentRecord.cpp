@@ -99,11 +99,22 @@ CKRecord MakeRecord(const DocumentRecord &document) {
 
 CKRecord MakeRecordWithContent(const DocumentRecord &document) {
   CKRecord record = MakeRecord(document);
-  record.fields[kRecordKeySize] = static_cast<std::int64_t>(document.content.size);
+  record.fields[kQVRecordKeySize] = static_cast<std::int64_t>(document.content.size);
   record.fields[kRecordKeyModified] = document.content.modified;
   record.fields[kRecordKeyContent] =
       CKAsset::assetWithReference({document.content.size, document.content.digest});
+  record.fields[kQVRecordKeyThumbnail1024x1024] = std::monostate();
   return record;
+}
+
+CKRecord MakeRecordWithThumbnail(const std::string &record, const std::string &tag,
+                                 const CKAssetReference &thumbnail) {
+  CKRecord made;
+  made.recordType = kRecordType;
+  made.recordID = RecordID(record);
+  made.recordChangeTag = tag;
+  made.fields[kQVRecordKeyThumbnail1024x1024] = CKAsset::assetWithReference(thumbnail);
+  return made;
 }
 
 std::optional<DocumentRecord> ReadRecord(const CKRecord &record) {
@@ -124,7 +135,7 @@ std::optional<DocumentRecord> ReadRecord(const CKRecord &record) {
   if (isInTrashItself(document) && !putBack.parent.empty() && isFileName(putBack.name))
     document.putBack = std::move(putBack);
   const std::int64_t kind = integer(record, kRecordKeyKind, -1);
-  const std::int64_t size = integer(record, kRecordKeySize, 0);
+  const std::int64_t size = integer(record, kQVRecordKeySize, 0);
   if (kind < 0 || kind > 3 || size < 0 || size > kMostSize) return std::nullopt;
   document.kind = static_cast<NSFileProviderItemKind>(kind);
   document.content.modified = integer(record, kRecordKeyModified, 0);

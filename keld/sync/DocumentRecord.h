@@ -5,6 +5,7 @@
 
 #include "keld/sync/SyncStore.h"
 #include "platform/cloudkit/CKRecord.h"
+#include "tessaly/QVRecordKeys.h"
 
 namespace droxa::keld {
 
@@ -38,12 +39,11 @@ struct DocumentRecord {
 std::string ContainerRecord(const std::string &containerID);
 std::optional<std::string> ContainerOfRecord(const std::string &parent);
 
-// Keys of an item's record.
+// Keys of an item's record, beside those that others name (QVRecordKeys.h).
 inline constexpr char kRecordType[] = "item";
 inline constexpr char kRecordKeyParent[] = "parent";
 inline constexpr char kRecordKeyName[] = "name";
 inline constexpr char kRecordKeyKind[] = "kind";
-inline constexpr char kRecordKeySize[] = "size";
 inline constexpr char kRecordKeyModified[] = "modified";
 inline constexpr char kRecordKeyMode[] = "mode";
 inline constexpr char kRecordKeyTarget[] = "target";
@@ -60,8 +60,11 @@ inline constexpr char kRecordKeyTrashed[] = "trashed";
 CKRecordID RecordID(const std::string &record);
 // The record without its contents: a save leaves those that the cloud has.
 CKRecord MakeRecord(const DocumentRecord &document);
-// The same with the contents, which the cloud must have already.
+// The same with the contents, which the cloud must have already. A thumbnail of others goes with that save.
 CKRecord MakeRecordWithContent(const DocumentRecord &document);
+// Adds a thumbnail to a document in that state, and changes nothing else.
+CKRecord MakeRecordWithThumbnail(const std::string &record, const std::string &tag,
+                                 const CKAssetReference &thumbnail);
 // nullopt for a record that no device of this kind wrote: hostile names, sizes and kinds among them.
 std::optional<DocumentRecord> ReadRecord(const CKRecord &record);
 

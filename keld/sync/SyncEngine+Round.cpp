@@ -76,10 +76,14 @@ void SyncEngine::round() {
     return;
   }
   const bool isPoll = std::chrono::steady_clock::now() >= nextPoll_;
+  const std::uint64_t applied = applier_.applied();
   if (fetches) fetch();
   if (isPoll) bringBackUnseen();
   // What is new here may be known there, until all of that was seen.
-  if (applier_.hasFetchedAll()) send();
+  if (applier_.hasFetchedAll()) {
+    send();
+    makeThumbnails(isPoll || applier_.applied() != applied);
+  }
   downloads_->retryDue();
   startWaitingVersions();
   answerWaiters();
@@ -98,6 +102,11 @@ void SyncEngine::send() {
   else if (sent.sent > 0 || store_.countQueued() == 0)
     noteCloudProblem(sending, NSError());
   moreIsDue_ = sent.moreIsDue || (!sent.newerRecords.empty() && !sent.cloudProblem);
+}
+
+void SyncEngine::makeThumbnails(bool isPoll) {
+  const auto newer = thumbnails_->work(isPoll, call(kCallTimeout));
+  if (!newer.empty()) applier_.applyRecords(newer, call(kCallTimeout));
 }
 
 // The whole replica was looked at once: a record that no file stands for has lost its file unseen, and what

@@ -10,6 +10,7 @@
 
 #include "keld/sync/CloudErrors.h"
 #include "keld/sync/ReplicaBarrier.h"
+#include "keld/thumbnails/SandboxedThumbnailer.h"
 #include "platform/dispatch/dispatch.h"
 #include "tessaly/QVContainer.h"
 #include "tessaly/QVErrors.h"
@@ -56,7 +57,10 @@ SyncEngine::SyncEngine(const std::string &replicaPath, const std::string &databa
       downloads_(std::make_shared<Downloads>(cloud_, store_, files_, *storage_, states_, options_.downloads)),
       examiner_(store_, files_, *storage_, states_, read, options_.deletionGuard),
       uploader_(context_, *assets_, conflicts_, examiner_),
-      applier_(context_, conflicts_) {
+      applier_(context_, conflicts_),
+      thumbnails_(std::make_shared<ThumbnailQueue>(
+          context_, options_.thumbnailer ? options_.thumbnailer : std::make_shared<SandboxedThumbnailer>(),
+          [this] { itemsChanged(); })) {
   downloads_->setConflictHandler([this](const FileLocation &location, PreparedFile &prepared) {
     ContentsResult result = ContentsResult::failed(ContentsOutcome::changedMeanwhile);
     performAndWait([&] { result = keepBoth(location, prepared); });
@@ -70,6 +74,7 @@ SyncEngine::SyncEngine(const std::string &replicaPath, const std::string &databa
   applier_.setCloudCheck([this] { return isSameCloud(); });
   uploader_.setNeedsContents(
       [this](const ItemRecord &item) { downloads_->fetchInBackground(item.id, item.facts.size); });
+  uploader_.setWantsThumbnail([this](const std::string &name) { return thumbnails_->isFor(name); });
   uploader_.setProblemOfNewer([this](ItemNumber item) { return downloads_->lastError(item); });
 }
 
@@ -104,6 +109,7 @@ void SyncEngine::stop() {
     const Lock lock(mutex_);
     never.swap(work_);
   }
+  thumbnails_->stop();
   assets_->stop();
   downloads_->stop();
   if (wasRunning) noteEnd();

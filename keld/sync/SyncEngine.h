@@ -18,6 +18,7 @@
 #include "keld/sync/LocalExaminer.h"
 #include "keld/sync/SyncContext.h"
 #include "keld/sync/Uploader.h"
+#include "keld/thumbnails/ThumbnailQueue.h"
 #include "platform/foundation/ThreadSafety.h"
 
 namespace droxa::keld {
@@ -30,6 +31,7 @@ struct SyncOptions {
   DeletionGuard deletionGuard;
   DownloadOptions downloads;
   ContentsSettings contents;
+  std::shared_ptr<Thumbnailer> thumbnailer;                           // null: SandboxedThumbnailer
   std::chrono::milliseconds pollInterval = std::chrono::seconds(30);  // in case a change wasn't told
 };
 
@@ -98,6 +100,7 @@ class SyncEngine {
   void round();
   void fetch();
   void send();
+  void makeThumbnails(bool isPoll);
   enum Direction { fetching, sending };
   void noteCloudProblem(Direction direction, const NSError &error);
   void answerWaiters();
@@ -120,6 +123,7 @@ class SyncEngine {
   LocalExaminer examiner_;
   Uploader uploader_;
   CloudApplier applier_;
+  const std::shared_ptr<ThumbnailQueue> thumbnails_;
   std::uint64_t storageInode_ = 0;  // of the replica's own folder; constant after start()
   const std::shared_ptr<CKCancellation> stopping_ = std::make_shared<CKCancellation>();
   std::unique_ptr<CKSubscription> subscription_;

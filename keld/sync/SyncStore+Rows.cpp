@@ -137,6 +137,7 @@ void SyncStore::put(const SyncRow &row) {
 void SyncStore::erase(const std::string &record) {
   const RecursiveLock lock(mutex_);
   statement("DELETE FROM rows WHERE record = ?").bindText(1, record).run();
+  statement("DELETE FROM thumbnails WHERE record = ?").bindText(1, record).run();
 }
 
 std::uint64_t SyncStore::countRows() {

@@ -83,8 +83,20 @@ constexpr char kMeantUntil[] = R"sql(
 ALTER TABLE meant ADD COLUMN until INTEGER NOT NULL DEFAULT 1;
 )sql";
 
+// Thumbnails that are still to be made.
+constexpr char kThumbnails[] = R"sql(
+CREATE TABLE thumbnails(
+  record TEXT PRIMARY KEY,
+  digest TEXT NOT NULL,
+  source BLOB NOT NULL,
+  inode INTEGER NOT NULL,
+  size INTEGER NOT NULL,
+  modified INTEGER NOT NULL
+) WITHOUT ROWID;
+)sql";
+
 // Each step leads from the version of its place to the next; version 0 is an empty database.
-constexpr const char *kSteps[] = {kTables, kUnfinished, kMeant, kMeantUntil};
+constexpr const char *kSteps[] = {kTables, kUnfinished, kMeant, kMeantUntil, kThumbnails};
 
 }  // namespace
 

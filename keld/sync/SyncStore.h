@@ -72,6 +72,15 @@ struct UnfinishedRecord {
   NSFileProviderItemKind kind = NSFileProviderItemKind::document;
 };
 
+// A document that is to have a thumbnail, once its record has exactly these contents.
+struct WantedThumbnail {
+  std::string record;
+  std::string digest;
+  // A file with these contents that isn't the item's own, whose document may be dataless here; "": none.
+  std::string source;
+  LocalFile sourceFile;  // as it was when its contents were sent
+};
+
 // The device's side of the sync, in a database of its own: what is known of the cloud's records, the uploads
 // that wait, and how far both feeds were read. It survives kill -9 at any moment, and can be thrown away: the
 // markers on the files and the cloud have everything again.
@@ -158,6 +167,16 @@ class SyncStore {
   void keepAllowedDeletion(ItemNumber item);
   void forgetAllowedDeletion(ItemNumber item);
 
+  // Thumbnails that are wanted; the last want of a record counts.
+  void wantThumbnail(const WantedThumbnail &wanted);
+  // Those whose contents are known to be in the cloud, with an item that stands for them.
+  std::vector<WantedThumbnail> dueThumbnails(std::uint64_t limit);
+  void thumbnailSettled(const std::string &record,
+                        const std::string &digest);  // saved, or there will be none
+  void dropStaleThumbnails();                        // of contents that a record doesn't have any more
+  std::uint64_t countThumbnails();
+  std::uint64_t thumbnailNews();  // goes up with every want of this process
+
   // Pins, by item.
   void setPinned(ItemNumber item, bool isPinned);
   bool isPinned(ItemNumber item);
@@ -182,6 +201,7 @@ class SyncStore {
   SqlDatabase database_ GUARDED_BY(mutex_);
   std::map<const char *, std::unique_ptr<SqlStatement>> statements_ GUARDED_BY(mutex_);  // by the literal
   int depth_ GUARDED_BY(mutex_) = 0;
+  std::uint64_t thumbnailNews_ GUARDED_BY(mutex_) = 0;
 };
 
 }  // namespace droxa::keld

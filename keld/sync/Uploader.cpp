@@ -99,11 +99,7 @@ Uploader::Round Uploader::sendDue(const CKCallContext &call) {
   for (const Plan &plan : removals)
     request.recordsToDelete.push_back(
         {RecordID(plan.row.record), plan.row.tag.empty() ? kUnknownTag : plan.row.tag});
-  // The outcome of a call that is cut off isn't known: what this device itself has sent isn't a conflict.
-  context_.store.transaction([&] {
-    for (const Plan &plan : saves)
-      if (plan.hasContent) context_.store.noteSent(plan.row.record, plan.document.content.digest);
-  });
+  noteSent(saves);
   CKCallContext own = call;
   own.deadline = CKCallContext::Clock::now() + kTransferTimeout;
   const CKModifyReply reply = context_.cloud.modifyRecords(request, own);
@@ -132,6 +128,21 @@ Uploader::Round Uploader::sendDue(const CKCallContext &call) {
   context_.states.flush();
   round.moreIsDue = !round.cloudProblem && !context_.store.due(nowMilliseconds(), 1).empty();
   return round;
+}
+
+// The outcome of a call that is cut off isn't known: what this device itself has sent isn't a conflict. Nor
+// is it known later on which contents the thumbnail is to be of.
+void Uploader::noteSent(const std::vector<Plan> &saves) {
+  context_.store.transaction([&] {
+    for (const Plan &plan : saves) {
+      if (!plan.hasContent) continue;
+      const DocumentRecord &document = plan.document;
+      context_.store.noteSent(document.record, document.content.digest);
+      const bool isHere = !plan.isDataless && document.content.size > 0;
+      if (isHere && wantsThumbnail_ && wantsThumbnail_(document.name))
+        context_.store.wantThumbnail({document.record, document.content.digest, {}, {}});
+    }
+  });
 }
 
 // --- Working out what is to be sent.

@@ -38,6 +38,11 @@ class Uploader {
   // Asked why the newer version of a document that was written here, too, isn't here yet; nil: it is coming.
   void setProblemOfNewer(std::function<NSError(ItemNumber item)> ask) { problemOfNewer_ = std::move(ask); }
 
+  // Asked whether a document of that name is to have a thumbnail.
+  void setWantsThumbnail(std::function<bool(const std::string &name)> ask) {
+    wantsThumbnail_ = std::move(ask);
+  }
+
   // Sends a batch of what is due.
   Round sendDue(const CKCallContext &call);
 
@@ -63,6 +68,7 @@ class Uploader {
 
   Prepared prepare(const QueuedUpload &entry, Plan *plan, const CKCallContext &call);
   Prepared prepareDeletion(const std::optional<ItemRecord> &item, Plan *plan);
+  void noteSent(const std::vector<Plan> &saves);
   static bool changesAnything(const Plan &plan);
   Prepared nothingToSend(const Plan &plan);
   Prepared prepareSave(const ItemRecord &item, Plan *plan, const CKCallContext &call);
@@ -82,6 +88,7 @@ class Uploader {
   AssetUploads &assets_;
   std::function<void(const ItemRecord &)> needsContents_;
   std::function<NSError(ItemNumber)> problemOfNewer_;
+  std::function<bool(const std::string &)> wantsThumbnail_;
   ConflictCopies &conflicts_;
   LocalExaminer &examiner_;
   std::uint64_t inlineBytes_ = 0;  // sent by this round on this thread

@@ -95,7 +95,7 @@ TEST(DocumentRecord, whereItemsOfTheTrashWereComesBackAsItWas) {
 
 TEST(DocumentRecord, withoutItsContentsTheFieldsOfContentsAreLeftAlone) {
   const CKRecord without = MakeRecord(document());
-  for (const char *key : {kRecordKeySize, kRecordKeyModified, kRecordKeyContent})
+  for (const char *key : {kQVRecordKeySize, kRecordKeyModified, kRecordKeyContent})
     EXPECT_EQ(without.fields.count(key), 0U) << key;
 }
 
@@ -109,7 +109,7 @@ TEST(DocumentRecord, namesThatNoFileHasAreRefused) {
 
 TEST(DocumentRecord, sizesKindsAndDatesThatCantBeAreRefused) {
   for (const std::int64_t size : {std::int64_t{-1}, INT64_MIN, INT64_MAX, std::int64_t{13}})
-    EXPECT_FALSE(reads(kRecordKeySize, size)) << size;
+    EXPECT_FALSE(reads(kQVRecordKeySize, size)) << size;
   for (const std::int64_t kind : {std::int64_t{-1}, std::int64_t{4}, INT64_MAX, INT64_MIN})
     EXPECT_FALSE(reads(kRecordKeyKind, kind)) << kind;
   EXPECT_FALSE(reads(kRecordKeyKind, std::string("document")));
