@@ -86,6 +86,26 @@ CallResult<std::shared_ptr<FPDAction>> ControlClient::performAction(const FPDAct
   });
 }
 
+CallResult<std::shared_ptr<FPDThumbnails>> ControlClient::fetchThumbnails(
+    const std::vector<std::string> &identifiers, CGSize size) {
+  using Thumbnails = std::shared_ptr<FPDThumbnails>;
+  return ask<Thumbnails>(*connecting_, timeout_, [&](FPDControlProtocol &control, auto slot) {
+    control.fetchThumbnailsForItemIdentifiers(identifiers, size,
+                                              [slot](const Thumbnails &thumbnails, const NSError &error) {
+                                                slot->put({thumbnails, error});
+                                              });
+  });
+}
+
+CallResult<ControlClient::Item> ControlClient::defaultContainer(
+    const std::optional<std::string> &application) {
+  return ask<Item>(*connecting_, timeout_, [&](FPDControlProtocol &control, auto slot) {
+    control.defaultContainerForBundleIdentifier(application, [slot](const Item &item, const NSError &error) {
+      slot->put({item, error});
+    });
+  });
+}
+
 CallResult<ControlClient::Page> ControlClient::page(const Enumerator &enumerator, const NSData &page) {
   auto slot = std::make_shared<AnswerSlot<Page>>();
   enumerator->enumerateItems(

@@ -2,7 +2,9 @@
 
 #include <chrono>
 #include <memory>
+#include <optional>
 #include <string>
+#include <vector>
 
 #include "cli/CallResult.h"
 #include "cli/ControlConnecting.h"
@@ -44,6 +46,12 @@ class ControlClient {
 
   // An action that hasn't begun: it does when it is waited for (cli/Acting.h).
   CallResult<std::shared_ptr<FPDAction>> performAction(const FPDActionRequest &request);
+
+  // Thumbnails that are fetched once the next ones are asked for (cli/Thumbnail.cpp).
+  CallResult<std::shared_ptr<FPDThumbnails>> fetchThumbnails(const std::vector<std::string> &identifiers,
+                                                             CGSize size);
+  // nullopt: of no application.
+  CallResult<Item> defaultContainer(const std::optional<std::string> &application);
 
   CallResult<Page> page(const Enumerator &enumerator, const NSData &page);
   CallResult<NSData> anchor(const Enumerator &enumerator);

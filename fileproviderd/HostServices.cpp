@@ -1,6 +1,7 @@
 #include "fileproviderd/HostServices.h"
 
 #include "fileproviderd/HostErrors.h"
+#include "fileproviderd/RelayedThumbnails.h"
 #include "platform/dispatch/dispatch.h"
 #include "platform/fileprovider/NSFileProviderError.h"
 
@@ -123,6 +124,23 @@ void ControlService::listenerEndpointForServiceName(const std::string &name,
                                                     FPDServiceCompletion completion) {
   const auto client = NSXPCConnection::currentConnection();
   services_->open(name, itemIdentifier, client ? client->peer().processIdentifier : 0, completion);
+}
+
+void ControlService::fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers,
+                                                       CGSize size, FPDThumbnailsCompletion completion) {
+  RelayedThumbnails::open(calls_, identifiers, size, completion);
+}
+
+// The top-level folder may be a container's, which making a folder of its name wouldn't find.
+void ControlService::defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                                         NSFileProviderItemCompletion completion) {
+  if (bundleIdentifier) return calls_->defaultContainerForBundleIdentifier(bundleIdentifier, completion);
+  itemAtPath("/Documents", [calls = calls_, completion](const auto &item, const NSError &error) {
+    const bool isMissing = error.is(NSFileProviderErrorDomain, NSFileProviderErrorNoSuchItem);
+    const bool isFolder = item && item->fields().kind == NSFileProviderItemKind::folder;
+    if (isFolder || (!item && !isMissing)) return completion(item, error);
+    calls->defaultContainerForBundleIdentifier(std::nullopt, completion);
+  });
 }
 
 }  // namespace droxa

@@ -59,6 +59,10 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
   void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
                                       FPDServiceCompletion completion) override;
+  void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers, CGSize size,
+                                         FPDThumbnailsCompletion completion) override;
+  void defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                           NSFileProviderItemCompletion completion) override;
 
  private:
   const std::shared_ptr<ExtensionCalls> calls_;

@@ -54,6 +54,16 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
                                       FPDServiceCompletion completion) override {
     completion(nullptr, NSError(NSPOSIXErrorDomain, ENOSYS));
   }
+  void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers, CGSize size,
+                                         FPDThumbnailsCompletion completion) override {
+    if (!fetchThumbnails) return completion(nullptr, NSError(NSPOSIXErrorDomain, ENOSYS));
+    completion(fetchThumbnails(identifiers, size), NSError());
+  }
+  void defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                           NSFileProviderItemCompletion completion) override {
+    if (!defaultContainer) return completion(nullptr, NSError(NSPOSIXErrorDomain, ENOSYS));
+    defaultContainer(bundleIdentifier, completion);
+  }
 
   std::map<std::string, NSFileProviderItemFields> items;  // by identifier
   std::map<std::string, std::string> paths;               // to identifiers
@@ -63,6 +73,10 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
   FPDStatus status;
   std::function<std::shared_ptr<FPDProviding>(const NSURL &url, std::uint64_t readingOptions)> provide;
   std::function<std::shared_ptr<FPDAction>(const FPDActionRequest &request)> act;
+  std::function<std::shared_ptr<FPDThumbnails>(const std::vector<std::string> &identifiers, CGSize size)>
+      fetchThumbnails;
+  std::function<void(const std::optional<std::string> &, const NSFileProviderItemCompletion &)>
+      defaultContainer;
   std::vector<FPDActionRequest> requests;                                      // of actions
   std::function<void(const std::string &container, std::size_t page)> onPage;  // before it is answered
   std::shared_ptr<FPDWatchObserver> observer;
