@@ -52,6 +52,7 @@ struct ThumbnailOptions {
   std::vector<std::string> arguments;
   std::uint32_t size = 256;  // the longest side, in pixels
   std::string folder = ".";  // where the pictures go
+  bool fillsCache = false;   // into the desktop's cache instead, those of folders
   bool json = false;
 };
 int runThumbnail(CommandContext &context, const ThumbnailOptions &options);

@@ -97,6 +97,28 @@ CallResult<std::shared_ptr<FPDThumbnails>> ControlClient::fetchThumbnails(
   });
 }
 
+NSError ControlClient::fillDesktopThumbnails(
+    const std::string &container, const std::function<bool(std::chrono::milliseconds)> &waitForStop,
+    bool *wasStopped) {
+  constexpr std::chrono::milliseconds kLook{50};
+  const auto slot = std::make_shared<AnswerSlot<bool>>();
+  NSError error;
+  const auto control = connecting_->control(
+      [slot](const NSError &failure) {
+        slot->put({false, failure});
+      },
+      &error);
+  if (!control) return error;
+  control->fillDesktopThumbnailsForContainer(container, [slot](const NSError &outcome) {
+    slot->put({true, outcome});
+  });
+  for (;;) {
+    if (const auto end = slot->waitFor(kLook)) return end->error;
+    *wasStopped = waitForStop(std::chrono::milliseconds(0));
+    if (*wasStopped) return {};
+  }
+}
+
 CallResult<ControlClient::Item> ControlClient::defaultContainer(
     const std::optional<std::string> &application) {
   return ask<Item>(*connecting_, timeout_, [&](FPDControlProtocol &control, auto slot) {

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <chrono>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -50,6 +51,10 @@ class ControlClient {
   // Thumbnails that are fetched once the next ones are asked for (cli/Thumbnail.cpp).
   CallResult<std::shared_ptr<FPDThumbnails>> fetchThumbnails(const std::vector<std::string> &identifiers,
                                                              CGSize size);
+  // However long it takes.
+  NSError fillDesktopThumbnails(const std::string &container,
+                                const std::function<bool(std::chrono::milliseconds)> &waitForStop,
+                                bool *wasStopped);
   // nullopt: of no application.
   CallResult<Item> defaultContainer(const std::optional<std::string> &application);
 

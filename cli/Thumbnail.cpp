@@ -1,4 +1,5 @@
 #include <algorithm>
+#include <cerrno>
 #include <chrono>
 #include <map>
 #include <nlohmann/json.hpp>
@@ -219,9 +220,29 @@ class Fetching {
   std::size_t done_ = 0;
 };
 
+// What was begun goes on when the command is stopped.
+int fillCache(CommandContext &context, const ThumbnailOptions &options) {
+  int status = kExitSuccess;
+  for (const std::string &argument : options.arguments) {
+    const auto found = resolveContainer(*context.host, argument);
+    NSError error = found.error;
+    const auto &item = found.value.item;
+    if (!error && item && item->fields().kind != NSFileProviderItemKind::folder)
+      error = NSError::errorWithPOSIXCode(ENOTDIR, "only a folder's can be put into the cache");
+    bool wasStopped = false;
+    if (!error)
+      error = context.host->fillDesktopThumbnails(found.value.identifier, context.waitForStop, &wasStopped);
+    if (wasStopped) return kExitInterrupted;
+    const int one = error ? reportError(context, argument, error) : kExitSuccess;
+    if (status == kExitSuccess) status = one;
+  }
+  return status;
+}
+
 }  // namespace
 
 int runThumbnail(CommandContext &context, const ThumbnailOptions &options) {
+  if (options.fillsCache) return fillCache(context, options);
   Documents documents(context);
   int status = kExitSuccess;
   for (const std::string &argument : options.arguments) {

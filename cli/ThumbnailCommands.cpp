@@ -25,6 +25,12 @@ ThumbnailCommands::ThumbnailCommands(CLI::App &app) : app_(app) {
       ->add_option("--out", options_.folder,
                    "The folder for the files, which are never written over others (default: this one)")
       ->type_name("DIR");
+  thumbnail
+      ->add_flag("--cache", options_.fillsCache,
+                 "Puts those of what isn't here in the folders into the cache that the desktop's programs\n"
+                 "share, instead; listing a folder does that too")
+      ->excludes(thumbnail->get_option("--out"))
+      ->excludes(thumbnail->get_option("--size"));
   CLI::App *folder =
       app_.add_subcommand("default-folder",
                           "Shows the folder where an application's documents go, and makes it where it is\n"

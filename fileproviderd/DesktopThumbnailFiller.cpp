@@ -55,8 +55,13 @@ DesktopThumbnailFiller::DesktopThumbnailFiller(std::shared_ptr<ExtensionCalls> c
                                                std::vector<ShownFolder> folders)
     : calls_(std::move(calls)),
       cache_(std::move(cache)),
-      folders_(std::move(folders)),
-      queue_(dispatch_queue_create("desktop-thumbnails", DISPATCH_QUEUE_SERIAL)) {}
+      queue_(dispatch_queue_create("desktop-thumbnails", DISPATCH_QUEUE_SERIAL)),
+      folders_(std::move(folders)) {}
+
+void DesktopThumbnailFiller::addShownFolder(const ShownFolder &folder) {
+  const Lock lock(lock_);
+  folders_.push_back(folder);
+}
 
 void DesktopThumbnailFiller::itemsWereListed(const std::string &container, const NSFileProviderItems &items) {
   if (!isPlainContainer(container)) return;
@@ -129,10 +134,15 @@ NSError DesktopThumbnailFiller::fill(const std::string &container, const NSFileP
 }
 
 DesktopThumbnailFiller::Wanted DesktopThumbnailFiller::wanted(const std::string &folder,
-                                                              const NSFileProviderItemFields &item) const {
+                                                              const NSFileProviderItemFields &item) {
   Wanted document{item.itemIdentifier, {}};
   const std::string path = folder + "/" + item.filename;
-  for (const ShownFolder &place : folders_) {
+  std::vector<ShownFolder> places;
+  {
+    const Lock lock(lock_);
+    places = folders_;
+  }
+  for (const ShownFolder &place : places) {
     if (!path.starts_with(place.replica + "/")) continue;
     const DesktopThumbnailSubject subject{place.shown + path.substr(place.replica.size()),
                                           secondsOf(item.contentModificationDate), item.documentSize};

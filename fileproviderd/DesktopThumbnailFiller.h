@@ -33,6 +33,9 @@ class DesktopThumbnailFiller final : public std::enable_shared_from_this<Desktop
   DesktopThumbnailFiller(std::shared_ptr<ExtensionCalls> calls, DesktopThumbnails cache,
                          std::vector<ShownFolder> folders);
 
+  // From now on what lies in the replica is seen there too: a mount's folder, say.
+  void addShownFolder(const ShownFolder &folder);
+
   // A client was given these items of the container. Returns at once; when it can't keep up, what comes is
   // left out.
   void itemsWereListed(const std::string &container, const NSFileProviderItems &items);
@@ -52,19 +55,19 @@ class DesktopThumbnailFiller final : public std::enable_shared_from_this<Desktop
   NSError fill(const std::string &container, const NSFileProviderItems &items);
   NSError list(const std::string &container, NSFileProviderItems *items) const;
   NSError locate(const std::string &container, std::string *path) const;
-  Wanted wanted(const std::string &folder, const NSFileProviderItemFields &item) const;
+  Wanted wanted(const std::string &folder, const NSFileProviderItemFields &item);
   NSError fetch(const std::vector<Wanted> &documents);
   void store(const Wanted &document, const FPDThumbnail &thumbnail);
 
   const std::shared_ptr<ExtensionCalls> calls_;
   const DesktopThumbnails cache_;
-  const std::vector<ShownFolder> folders_;
   const dispatch_queue_t queue_;
 
   // Touched on the queue alone: documents, in a state, that have no thumbnail.
   std::set<std::pair<std::string, std::int64_t>> without_;
 
-  Mutex lock_;
+  Mutex lock_;  // held for no call
+  std::vector<ShownFolder> folders_ GUARDED_BY(lock_);
   std::size_t waiting_ GUARDED_BY(lock_) = 0;  // items that were listed and not looked at yet
 };
 

@@ -263,6 +263,10 @@ class FPDControlProtocol {
   // documents folder, the one that is there already where there is one.
   virtual void defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
                                                    NSFileProviderItemCompletion completion) = 0;
+  // Puts the thumbnails of the documents in the container that aren't here into the cache that the desktop's
+  // programs share, where they aren't yet; completes when it is done, however long that takes.
+  virtual void fillDesktopThumbnailsForContainer(const std::string &identifier,
+                                                 NSFileProviderErrorCompletion completion) = 0;
 };
 
 }  // namespace droxa

@@ -64,6 +64,11 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
     if (!defaultContainer) return completion(nullptr, NSError(NSPOSIXErrorDomain, ENOSYS));
     defaultContainer(bundleIdentifier, completion);
   }
+  void fillDesktopThumbnailsForContainer(const std::string &identifier,
+                                         NSFileProviderErrorCompletion completion) override {
+    filled.push_back(identifier);
+    completion(NSError());
+  }
 
   std::map<std::string, NSFileProviderItemFields> items;  // by identifier
   std::map<std::string, std::string> paths;               // to identifiers
@@ -75,6 +80,7 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
   std::function<std::shared_ptr<FPDAction>(const FPDActionRequest &request)> act;
   std::function<std::shared_ptr<FPDThumbnails>(const std::vector<std::string> &identifiers, CGSize size)>
       fetchThumbnails;
+  std::vector<std::string> filled;  // the containers whose thumbnails the desktop was given
   std::function<void(const std::optional<std::string> &, const NSFileProviderItemCompletion &)>
       defaultContainer;
   std::vector<FPDActionRequest> requests;                                      // of actions

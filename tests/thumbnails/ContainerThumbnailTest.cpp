@@ -35,7 +35,7 @@ class ContainerThumbnail : public ThumbnailsTest {
   // The identifier of the folder that the container is shown as.
   std::string folderOfWriter() {
     daemon.addContainer(kWriter);
-    return daemon.identifier("Writer").asString();
+    return daemon.identifier(kWriter).asString();
   }
 };
 

@@ -31,6 +31,7 @@ interface FPDControlProtocol {
   fetchThumbnails @13 (identifiers :List(Data), width :Float64, height :Float64)
       -> (thumbnails :Thumbnails.FPDThumbnails, error :Values.Error);
   defaultContainer @14 (identifier :Data) -> (item :Values.Item, error :Values.Error);
+  fillDesktopThumbnails @15 (identifier :Data) -> (error :Values.Error);
 }
 
 interface FPDWatch {

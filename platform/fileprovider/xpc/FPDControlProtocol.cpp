@@ -210,6 +210,13 @@ class ControlServer final : public Schema::Server {
     });
   }
 
+  kj::Promise<void> fillDesktopThumbnails(FillDesktopThumbnailsContext context) override {
+    return exported_.serve(
+        context, [identifier = xpcString(context.getParams().getIdentifier())](auto &object, auto reply) {
+          object.fillDesktopThumbnailsForContainer(identifier, reply(writeOutcome));
+        });
+  }
+
  private:
   Exported<FPDControlProtocol> exported_;
 };
@@ -356,6 +363,14 @@ class ControlProxy final : public XPCProxy<Schema, FPDControlProtocol, ControlPr
         [bundleIdentifier](auto params, Session &) { setIdentifier(params, bundleIdentifier); },
         std::move(completion),
         [](auto results, const RemoteObject &) { return std::tuple(getItem(results), getError(results)); });
+  }
+
+  void fillDesktopThumbnailsForContainer(const std::string &identifier,
+                                         NSFileProviderErrorCompletion completion) override {
+    call(
+        &Client::fillDesktopThumbnailsRequest,
+        [identifier](auto params, Session &) { params.setIdentifier(xpcBytes(identifier)); },
+        std::move(completion), readOutcome, XPCWithoutDeadline);
   }
 };
 
