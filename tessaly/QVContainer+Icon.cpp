@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <cmath>
 
+#include "platform/imaging/PNGImage.h"
 #include "platform/launchservices/IconTheme.h"
 #include "platform/launchservices/LSBundleProxy.h"
 #include "tessaly/QVContainer.h"
@@ -26,6 +27,15 @@ int Side(CGSize size) {
   return side >= 1 ? static_cast<int>(std::min(side, kLargest)) : 0;
 }
 
+// Where only a larger one is installed, it is scaled down; one that can't be read stays as it is.
+NSData IconOfSide(const std::string &name, int side) {
+  NSData data = IconImageData(name, side);
+  const auto picture = data ? PNGImage::read(data, nullptr) : std::nullopt;
+  const auto longest = static_cast<std::uint32_t>(side);
+  if (!picture || std::max(picture->width(), picture->height()) <= longest) return data;
+  return picture->scaledToFit(longest).file();
+}
+
 }  // namespace
 
 NSData QVContainer::bestFittingImageDataForSize(CGSize size, bool *shouldTransformToAppIcon) const {
@@ -33,12 +43,12 @@ NSData QVContainer::bestFittingImageDataForSize(CGSize size, bool *shouldTransfo
   const int side = Side(size);
   if (side == 0) return {};
   if (const char *name = FolderIconName(containerID())) {
-    NSData data = IconImageData(name, side);
-    return data ? data : IconImageData("folder", side);
+    NSData data = IconOfSide(name, side);
+    return data ? data : IconOfSide("folder", side);
   }
   const auto application = LSBundleProxy::bundleProxyForIdentifier(containerID());
   if (!application) return {};
-  NSData data = IconImageData(application->iconName(), side);
+  NSData data = IconOfSide(application->iconName(), side);
   if (data && shouldTransformToAppIcon) *shouldTransformToAppIcon = true;
   return data;
 }

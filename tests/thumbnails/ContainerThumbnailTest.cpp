@@ -1,5 +1,6 @@
 #include "additions/NSError+QVFPAdditions.h"
 #include "platform/fileprovider/NSFileProviderError.h"
+#include "platform/imaging/PNGImage.h"
 #include "tessaly/QVErrors.h"
 #include "tests/thumbnails/ThumbnailsFixture.h"
 #include "thumbnails/QVThumbnailFetching.h"
@@ -49,6 +50,19 @@ TEST_F(ContainerThumbnail, anApplicationsFolderIsItsPlainIcon) {
   EXPECT_EQ(answer.contentType, "com.quorva.fileprovider.qv-undecorated-container");
   EXPECT_EQ(answer.error, NSError());
   EXPECT_EQ(answers->done.value<0>(), NSError());
+}
+
+TEST_F(ContainerThumbnail, aLargerIconIsScaledDown) {
+  installWriter();
+  installIcon("writer", {128});
+  const NSData large = PNGImage(128, 128, std::vector<std::uint8_t>(std::size_t{128} * 128 * 4, 7)).file();
+  std::ofstream(share + "/icons/hicolor/128x128/apps/writer.png")
+      .write(reinterpret_cast<const char *>(large.bytes().data()),
+             static_cast<std::streamsize>(large.length()));
+  const std::string folder = folderOfWriter();
+  const auto scaled = PNGImage::read(fetch({folder}, {100, 100})->of(folder).data, nullptr);
+  ASSERT_TRUE(scaled);
+  EXPECT_EQ(scaled->width(), 100U);
 }
 
 TEST_F(ContainerThumbnail, theRootIsAFolderWithoutAContentType) {
