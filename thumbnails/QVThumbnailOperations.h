@@ -2,6 +2,8 @@
 
 #include <deque>
 #include <memory>
+#include <optional>
+#include <utility>
 
 #include "platform/cloudkit/CKFetchRecordsOperation.h"
 #include "platform/foundation/ThreadSafety.h"
