@@ -17,6 +17,7 @@
 #include "platform/cloudkit/CKContainer.h"
 #include "platform/cloudkit/EmbeddedCloud.h"
 #include "platform/foundation/Paths.h"
+#include "platform/oslog/os_log.h"
 #include "tessaly/QVRecordKeys.h"
 #include "tessaly/QVUbiquitousCloudKitContainer.h"
 #include "tessaly/QVUserDefaults.h"

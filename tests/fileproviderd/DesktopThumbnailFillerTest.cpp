@@ -95,7 +95,7 @@ TEST_F(DesktopThumbnailFillerTest, whatIsListedHasAThumbnailInEverySizeWhereverI
 
 TEST_F(DesktopThumbnailFillerTest, theFilesAreForTheUserAlone) {
   list({document("d1", "a.jpg")});
-  ASSERT_TRUE(isFilled("/replica/Pictures/a.jpg"));
+  ASSERT_TRUE(isFilled("/replica/Pictures/a.jpg") && isFilled("/mnt/drive/Pictures/a.jpg"));
   struct stat status {};
   ASSERT_EQ(stat(cache.fileFor("/replica/Pictures/a.jpg", "normal").c_str(), &status), 0);
   EXPECT_EQ(status.st_mode & 07777, 0600U);

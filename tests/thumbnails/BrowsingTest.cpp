@@ -115,9 +115,11 @@ TEST_F(Browsing, aClientGetsEveryAnswerAcrossTheProcesses) {
 }
 
 TEST_F(Browsing, theDocumentsFolderThatIsListedIsTheDefaultOne) {
+  const std::string documents = daemon.addFolder("Documents").asString();
   const Once<std::shared_ptr<const NSFileProviderItem>, NSError> found("the folder");
   control->defaultContainerForBundleIdentifier(std::nullopt, found.completion());
   ASSERT_TRUE(found.value<0>()) << found.value<1>().description();
+  EXPECT_EQ(found.value<0>()->itemIdentifier(), documents);
   EXPECT_EQ(count("creating directory"), 0U);
 }
 

@@ -36,7 +36,7 @@ class ContainerThumbnail : public ThumbnailsTest {
   // The identifier of the folder that the container is shown as.
   std::string folderOfWriter() {
     daemon.addContainer(kWriter);
-    return daemon.identifier(kWriter).asString();
+    return daemon.identifier(documentsOf(kWriter)).asString();
   }
 };
 

@@ -95,7 +95,7 @@ TEST_F(DefaultApplicationContainer, ofSeveralContainersItIsTheFirst) {
               "com.quorva.developer.droxa-container-identifiers": ["org.example.Second", "org.example.Writer"]})");
   const auto [item, error] = find(kWriter);
   ASSERT_TRUE(item) << error.description();
-  EXPECT_EQ(item->itemIdentifier(), daemon.identifier("org.example.Second").asString());
+  EXPECT_EQ(item->itemIdentifier(), daemon.identifier(documentsOf("org.example.Second")).asString());
   EXPECT_EQ(error, NSError());
   EXPECT_EQ(daemon.log().count("getContainerURLForID(org.example.Second, recreate 1)"), 1U);
 }

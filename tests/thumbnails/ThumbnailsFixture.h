@@ -118,6 +118,10 @@ class ThumbnailsTest : public ExtensionTest {
     daemon.sharing().setAnswers(answers);
   }
 
+  static std::string documentsOf(const std::string &containerID) {
+    return DroxaProcessHome().replica() + "/" + containerID + "/Documents";
+  }
+
   // Makes the request; waits for its end.
   std::shared_ptr<ThumbnailAnswers> fetch(const std::vector<std::string> &identifiers,
                                           CGSize size = {256, 256}) {
