@@ -40,7 +40,7 @@ class QVContainer final {
   const NSURL &url() const { return description_.url; }
   const NSURL &documentsURL() const { return description_.documentsURL; }
 
-  // The picture (PNG) that fits the size, in pixels, best of those installed, scaled down to it: the icon of the application
+  // The picture (PNG) that fits the size, in pixels, best of those installed: the icon of the application
   // whose identifier the container's is, and then `shouldTransformToAppIcon` (may be null) tells that it is
   // an application's plain icon; or that of a folder of this kind. nil when there is none. Reads files.
   NSData bestFittingImageDataForSize(CGSize size, bool *shouldTransformToAppIcon) const;
