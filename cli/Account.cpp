@@ -3,6 +3,7 @@
 #include "cli/Commands.h"
 #include "cli/DaemonClient.h"
 #include "cli/ExitStatus.h"
+#include "cli/HomeCloud.h"
 #include "cli/Text.h"
 
 namespace droxa {
@@ -10,13 +11,18 @@ namespace droxa {
 int runAccountShow(CommandContext &context, bool json) {
   const auto account = DaemonClient(context.daemon, context.timeout).account();
   if (account.error) return reportError(context, "the account", account.error);
+  const std::string drive = rememberedAccount(DroxaProcessHome());
   if (json) {
     nlohmann::ordered_json object;
     object["account"] =
         account.value ? nlohmann::ordered_json(account.value->name) : nlohmann::ordered_json(nullptr);
+    if (!drive.empty()) object["driveAccount"] = drive;
     context.out << object.dump(-1, ' ', false, nlohmann::ordered_json::error_handler_t::replace) << std::endl;
   } else if (account.value) {
-    context.out << escapedText(account.value->name) << std::endl;
+    context.out << escapedText(account.value->name);
+    if (!drive.empty() && drive != account.value->name)
+      context.out << " (the drive is the account " << escapedText(drive) << "'s)";
+    context.out << std::endl;
   } else {
     context.out << "nobody is signed in; `droxa account sign-in NAME` signs somebody in" << std::endl;
   }

@@ -13,6 +13,7 @@
 #include "cli/ExitStatus.h"
 #include "cli/ItemArgument.h"
 #include "cli/Run.h"
+#include "cli/ShareCommands.h"
 #include "cli/ThumbnailCommands.h"
 #include "platform/foundation/Paths.h"
 #include "tessaly/QVDaemonConnection.h"
@@ -40,7 +41,7 @@ struct Words {
   std::string argument;
   std::string name;
   std::vector<std::string> items;
-  std::string folder, cloud, device;
+  std::string folder, cloud, device, account;
   std::int32_t process = 0;
   bool json = false;
 };
@@ -66,6 +67,7 @@ class CommandLine {
     contents_.emplace(app_);
     actions_.emplace(app_);
     thumbnails_.emplace(app_);
+    sharing_.emplace(app_);
     addSystemCommands();
   }
 
@@ -73,6 +75,7 @@ class CommandLine {
   const ContentsCommands &contents() const { return *contents_; }
   const ActionCommands &actions() const { return *actions_; }
   const ThumbnailCommands &thumbnails() const { return *thumbnails_; }
+  const ShareCommands &sharing() const { return *sharing_; }
   bool has(const char *command) const { return app_.got_subcommand(command); }
   bool hasAccount(const char *command) const { return account_->got_subcommand(command); }
   bool hasDepth() const { return depth_->count() > 0; }
@@ -168,6 +171,11 @@ class CommandLine {
                     "What this device is called, as conflict copies show it; remembered too (default: the\n"
                     "machine's name)")
         ->type_name("NAME");
+    run->add_option(
+           "--account", words_.account,
+           "The account in the cloud that the drive belongs to, remembered too: homes of two accounts\n"
+           "on one cloud are two people's (default: who runs it)")
+        ->type_name("NAME");
   }
 
   CLI::App *add(const char *name, const char *description) {
@@ -183,6 +191,7 @@ class CommandLine {
   std::optional<ContentsCommands> contents_;
   std::optional<ActionCommands> actions_;
   std::optional<ThumbnailCommands> thumbnails_;
+  std::optional<ShareCommands> sharing_;
   CLI::App *account_ = nullptr;
   CLI::Option *depth_ = nullptr;
   CLI::Option *process_ = nullptr;
@@ -205,7 +214,8 @@ int runCommand(const CommandLine &line, const Words &words, std::ostream &out, s
   };
   const std::optional<std::string> home = given(words.home);
   if (line.has("run"))
-    return runRun(out, err, {home, given(words.folder), given(words.cloud), given(words.device)});
+    return runRun(out, err,
+                  {home, given(words.folder), given(words.cloud), given(words.device), given(words.account)});
 
   DroxaSetProcessHome(DroxaHome::resolve(home));
   const std::chrono::milliseconds timeout(std::llround(words.timeout * 1000));
@@ -235,6 +245,7 @@ int runCommand(const CommandLine &line, const Words &words, std::ostream &out, s
   if (line.contents().isChosen()) return line.contents().run(context);
   if (line.actions().isChosen()) return line.actions().run(context);
   if (line.thumbnails().isChosen()) return line.thumbnails().run(context);
+  if (line.sharing().isChosen()) return line.sharing().run(context);
   if (line.has("status"))
     return words.items.empty() ? runStatus(context, words.json)
                                : runItemStatus(context, words.items, words.json);

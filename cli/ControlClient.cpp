@@ -128,6 +128,17 @@ CallResult<ControlClient::Item> ControlClient::defaultContainer(
   });
 }
 
+CallResult<std::shared_ptr<FPDService>> ControlClient::service(const std::string &name,
+                                                               const std::string &identifier) {
+  using Service = std::shared_ptr<FPDService>;
+  return ask<Service>(*connecting_, timeout_, [&](FPDControlProtocol &control, auto slot) {
+    control.listenerEndpointForServiceName(name, identifier,
+                                           [slot](const Service &service, const NSError &error) {
+                                             slot->put({service, error});
+                                           });
+  });
+}
+
 CallResult<ControlClient::Page> ControlClient::page(const Enumerator &enumerator, const NSData &page) {
   auto slot = std::make_shared<AnswerSlot<Page>>();
   enumerator->enumerateItems(

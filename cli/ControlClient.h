@@ -57,6 +57,8 @@ class ControlClient {
                                 bool *wasStopped);
   // nullopt: of no application.
   CallResult<Item> defaultContainer(const std::optional<std::string> &application);
+  // A service on the item, to be held until the first reply over its connection has come.
+  CallResult<std::shared_ptr<FPDService>> service(const std::string &name, const std::string &identifier);
 
   CallResult<Page> page(const Enumerator &enumerator, const NSData &page);
   CallResult<NSData> anchor(const Enumerator &enumerator);

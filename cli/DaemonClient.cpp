@@ -106,6 +106,24 @@ NSError DaemonClient::confirmDeletions(bool carryOut) {
       .error;
 }
 
+CallResult<DaemonClient::ShareOptions> DaemonClient::shareOptions(const std::string &identifier) {
+  return ask<ShareOptions>(*connection_, timeout_, [&](QVProtocol &daemon, auto slot) {
+    daemon.getShareOptionsOfItemIdentifier(
+        identifier, [slot](bool isShared, bool byOthers, bool byItself,
+                           const std::optional<std::string> &folder, const NSError &error) {
+          slot->put({{isShared, byOthers, byItself, folder}, error});
+        });
+  });
+}
+
+CallResult<NSURL> DaemonClient::acceptShare(const NSURL &shareURL) {
+  return ask<NSURL>(*connection_, timeout_, [&](QVProtocol &daemon, auto slot) {
+    daemon.acceptShareWithURL(shareURL, [slot](const NSURL &url, const NSError &error) {
+      slot->put({url, error});
+    });
+  });
+}
+
 std::shared_ptr<AnswerSlot<QVContentsResult>> DaemonClient::evict(const NSURL &url) {
   return begin<QVContentsResult>(*connection_, [&](QVProtocol &daemon, auto slot) {
     daemon.evictItemAtURL(url, [slot](const QVContentsResult &result, const NSError &error) {

@@ -29,6 +29,16 @@ class DaemonClient {
   NSError setPinned(const NSURL &url, bool isPinned);
   NSError confirmDeletions(bool carryOut);
 
+  // How an item is shared, as far as it is known here.
+  struct ShareOptions {
+    bool isShared = false;
+    bool isSharedByOthers = false;
+    bool isSharedByItself = false;
+    std::optional<std::string> folder;  // the uppermost shared one
+  };
+  CallResult<ShareOptions> shareOptions(const std::string &identifier);
+  CallResult<NSURL> acceptShare(const NSURL &shareURL);  // where it is now
+
   // These take as long as they take: the answer is waited for by the caller.
   std::shared_ptr<AnswerSlot<QVContentsResult>> evict(const NSURL &url);
   std::shared_ptr<AnswerSlot<bool>> waitForUpload(const NSURL &url);  // nil: everything

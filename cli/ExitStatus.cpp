@@ -5,6 +5,7 @@
 #include <sysexits.h>
 
 #include "cli/Text.h"
+#include "platform/cloudkit/CKError.h"
 #include "platform/fileprovider/NSFileProviderError.h"
 #include "platform/xpc/NSXPCConnection.h"
 #include "tessaly/QVErrors.h"
@@ -35,6 +36,9 @@ enum class Meaning {
   documentInUse,
   pinned,
   cancelled,
+  notAllowed,
+  notShared,
+  changedMeanwhile,
   other
 };
 
@@ -59,6 +63,14 @@ constexpr Known kKnown[] = {
     {QVTessalyErrorDomain, QVErrorUnsentChanges, Meaning::unsentChanges},
     {QVTessalyErrorDomain, QVErrorDocumentInUse, Meaning::documentInUse},
     {QVTessalyErrorDomain, QVErrorPinned, Meaning::pinned},
+    {QVTessalyErrorDomain, QVErrorPrivilegeRequired, Meaning::notAllowed},
+    {QVTessalyErrorDomain, QVErrorNoShare, Meaning::notShared},
+    {CKErrorDomain, static_cast<std::int64_t>(CKErrorCode::permissionFailure), Meaning::notAllowed},
+    {CKErrorDomain, static_cast<std::int64_t>(CKErrorCode::serverRecordChanged), Meaning::changedMeanwhile},
+    {CKErrorDomain, static_cast<std::int64_t>(CKErrorCode::networkUnavailable), Meaning::cloudIsAway},
+    {CKErrorDomain, static_cast<std::int64_t>(CKErrorCode::networkFailure), Meaning::cloudIsAway},
+    {CKErrorDomain, static_cast<std::int64_t>(CKErrorCode::serviceUnavailable), Meaning::cloudIsAway},
+    {CKErrorDomain, static_cast<std::int64_t>(CKErrorCode::quotaExceeded), Meaning::cloudIsFull},
     {NSCocoaErrorDomain, kCloudIsFull, Meaning::cloudIsFull},
     {NSCocoaErrorDomain, kCloudIsAway, Meaning::cloudIsAway},
     {NSCocoaErrorDomain, NSUserCancelledError, Meaning::cancelled},
@@ -118,6 +130,7 @@ int exitStatusForError(const NSError &error) {
     case Meaning::notSignedIn:
     case Meaning::unreadable:
     case Meaning::unwritable:
+    case Meaning::notAllowed:
       return EX_NOPERM;
     case Meaning::partIsAway:
       return EX_UNAVAILABLE;
@@ -171,6 +184,12 @@ std::string explanationOfError(const NSError &error) {
       return "it is pinned, or below a folder that is; `droxa unpin` unpins it";
     case Meaning::cancelled:
       return "it was cancelled";
+    case Meaning::notAllowed:
+      return "it isn't allowed: " + words(error);
+    case Meaning::notShared:
+      return "it isn't shared; `droxa share create` shares it";
+    case Meaning::changedMeanwhile:
+      return "somebody else changed it in the same moment; look at it, and try again";
     default:
       return words(error);
   }

@@ -5,6 +5,8 @@
 #include <filesystem>
 #include <fstream>
 #include <nlohmann/json.hpp>
+#include <pwd.h>
+#include <unistd.h>
 
 #include "cli/Text.h"
 #include "tessaly/QVHomeCloud.h"
@@ -42,7 +44,7 @@ std::optional<HomeCloud> remembered(const DroxaHome &home, std::string *problem)
                "or remove it and name the cloud with --cloud";
   }
   if (!known) return std::nullopt;
-  return HomeCloud{known->folder, known->device};
+  return HomeCloud{known->folder, known->device, known->account};
 }
 
 // Until keld has opened the cloud for the first time, nothing depends on it.
@@ -51,13 +53,43 @@ bool isBound(const DroxaHome &home) {
   return fs::exists(home.state() + "/sync.sqlite", code);
 }
 
+std::string userName() {
+  const passwd *entry = getpwuid(getuid());
+  return entry && entry->pw_name ? entry->pw_name : "";
+}
+
+// A drive stays its account's.
+bool setAccount(const DroxaHome &home, const std::optional<HomeCloud> &known, const std::string &account,
+                HomeCloud *cloud, std::string *problem) {
+  if (account.empty() || account.size() > 255 || !isValidUTF8(account)) {
+    *problem = "\"" + escapedText(account) + "\" isn't an account's name";
+    return false;
+  }
+  const std::string before = known && !known->account.empty() ? known->account : userName();
+  if (isBound(home) && account != before) {
+    *problem = "the drive of " + escapedText(home.root()) + " is the account \"" + escapedText(before) +
+               "\"'s, and can't become \"" + escapedText(account) +
+               "\"'s; leave --account out, or name another --home";
+    return false;
+  }
+  cloud->account = account;
+  return true;
+}
+
 }  // namespace
 
 std::vector<std::string> HomeCloud::keldOptions() const {
   std::vector<std::string> options;
   if (!folder.empty()) options.insert(options.end(), {"--cloud", folder});
   if (!device.empty()) options.insert(options.end(), {"--device", device});
+  if (!account.empty()) options.insert(options.end(), {"--account", account});
   return options;
+}
+
+std::string rememberedAccount(const DroxaHome &home) {
+  std::string ignored;
+  const auto cloud = remembered(home, &ignored);
+  return cloud ? cloud->account : "";
 }
 
 std::string cloudFolder(const DroxaHome &home, const HomeCloud &cloud) {
@@ -65,7 +97,8 @@ std::string cloudFolder(const DroxaHome &home, const HomeCloud &cloud) {
 }
 
 std::optional<HomeCloud> resolveHomeCloud(const DroxaHome &home, const std::optional<std::string> &folder,
-                                          const std::optional<std::string> &device, std::string *problem) {
+                                          const std::optional<std::string> &device,
+                                          const std::optional<std::string> &account, std::string *problem) {
   problem->clear();
   const auto known = remembered(home, problem);
   if (!problem->empty()) return std::nullopt;
@@ -91,6 +124,7 @@ std::optional<HomeCloud> resolveHomeCloud(const DroxaHome &home, const std::opti
     cloud.folder = named.folder;
   }
   if (device) cloud.device = *device;
+  if (account && !setAccount(home, known, *account, &cloud, problem)) return std::nullopt;
   return cloud;
 }
 
@@ -100,8 +134,10 @@ bool rememberHomeCloud(const DroxaHome &home, const HomeCloud &cloud, std::strin
   const std::string path = settingsFile(home);
   const std::string made = path + ".new";
   std::ofstream file(made, std::ios::trunc);
-  file << Json{{"cloud", orNull(cloud.folder)}, {"device", orNull(cloud.device)}}.dump(
-              2, ' ', false, Json::error_handler_t::replace)
+  file << Json{{"cloud", orNull(cloud.folder)},
+               {"device", orNull(cloud.device)},
+               {"account", orNull(cloud.account)}}
+              .dump(2, ' ', false, Json::error_handler_t::replace)
        << "\n";
   file.close();
   if (file && std::rename(made.c_str(), path.c_str()) == 0) return true;

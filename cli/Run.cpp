@@ -145,7 +145,7 @@ class Run {
   bool signInSomebody(std::string *problem) {
     const auto account = daemon_.account();
     if (!account.error && account.value) return true;
-    const auto signedIn = daemon_.signIn(userName());
+    const auto signedIn = daemon_.signIn(cloud_.account.empty() ? userName() : cloud_.account);
     if (!signedIn.error) return true;
     *problem = "can't sign in: " + signedIn.error.localizedDescription();
     return false;
@@ -241,7 +241,7 @@ int runRun(std::ostream &out, std::ostream &err, const RunOptions &options) {
     err << "droxa: " << problem << std::endl;
     return status;
   };
-  const auto cloud = resolveHomeCloud(home, options.cloud, options.device, &problem);
+  const auto cloud = resolveHomeCloud(home, options.cloud, options.device, options.account, &problem);
   if (!cloud) return fail(EX_CONFIG);
   int holder = 0;
   const auto lock = ProcessLock::acquire(home.run() + "/droxa-run.pid", &holder, &problem);

@@ -13,6 +13,7 @@ struct RunOptions {
   std::optional<std::string> folder;  // whose documents go into the cloud
   std::optional<std::string> cloud;   // the folder that the drive's cloud is in
   std::optional<std::string> device;
+  std::optional<std::string> account;  // that the drive belongs to
 };
 
 // `droxa run`: serves a drive in the foreground until Ctrl-C. Gives the exit status.

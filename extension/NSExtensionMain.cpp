@@ -13,6 +13,7 @@
 #include "extension/QVFileProviderExtension.h"
 #include "platform/featureflags/feature_flags.h"
 #include "platform/fileprovider/NSFileProviderManager.h"
+#include "platform/foundation/DescriptorLimit.h"
 #include "platform/foundation/Paths.h"
 #include "platform/usermanagement/UMUserManager.h"
 #include "tessaly/QVLog.h"
@@ -80,6 +81,7 @@ int NSExtensionMain(int argc, char *argv[]) {
 
   const sigset_t endSignals = BlockEndSignals();
   signal(SIGPIPE, SIG_IGN);
+  DroxaRaiseDescriptorLimit();
   fcntl(arguments->hostDescriptor, F_SETFD, FD_CLOEXEC);
   if (const NSError error = ConfigureProcess(arguments->home)) {
     return FailBeforeServing(EX_CONFIG, error.localizedDescription());

@@ -1,6 +1,10 @@
+#include <type_traits>
+
 #include "extension/QVFileProviderExtension.h"
 #include "platform/foundation/NSURLResources.h"
+#include "sharing/QVFileProviderPlendaCollaborationServiceSource.h"
 #include "sharing/QVFileProviderShareOperationServiceSource.h"
+#include "sharing/QVSharingClient.h"
 #include "tessaly/QVDaemonConnection.h"
 #include "tessaly/QVFileObjectID.h"
 #include "tessaly/QVLog.h"
@@ -43,14 +47,17 @@ NSFileProviderServiceSources QVFileProviderExtension::supportedServiceSourcesFor
     const std::string &identifier, NSError * /*error*/) {
   const std::shared_ptr<NSOperationQueue> operationQueue(shared_from_this(), _operationQueue.get());
   NSFileProviderServiceSources sources;
-  sources.push_back(std::make_shared<QVFileProviderShareOperationServiceSource>(shared_from_this(),
-                                                                                identifier, operationQueue));
+  const auto offer = [&]<class Source>(std::type_identity<Source>) {
+    sources.push_back(std::make_shared<Source>(shared_from_this(), identifier, operationQueue));
+  };
+  offer(std::type_identity<QVFileProviderShareOperationServiceSource>());
   const char kind = identifier.empty() ? '\0' : identifier.front();
   const bool mayBeShared = kind == 'd'   ? DocumentMayBeShared(URLForItemWithPersistentIdentifier(identifier))
                            : kind == 'i' ? FolderMayBeShared(identifier)
                                          : false;
   if (!mayBeShared) return sources;
-  // What is offered on shareable items alone comes here, documents' services before everybody's.
+  if (kind == 'd') offer(std::type_identity<QVFileProviderPlendaCollaborationServiceSource>());
+  offer(std::type_identity<QVSharingClient>());
   return sources;
 }
 

@@ -7,6 +7,7 @@
 
 #include "fileproviderd/Host.h"
 #include "fileproviderd/HostArguments.h"
+#include "platform/foundation/DescriptorLimit.h"
 #include "platform/foundation/Paths.h"
 #include "platform/foundation/ProcessLock.h"
 
@@ -67,6 +68,7 @@ int main(int argc, char *argv[]) {
   if (arguments->wantsHelp) return std::fputs(kUsage, stdout) < 0 ? EX_IOERR : EX_OK;
 
   const sigset_t endSignals = blockEndSignals();
+  DroxaRaiseDescriptorLimit();
   DroxaSetProcessHome(DroxaHome::resolve(arguments->home));
   if (!DroxaProcessHome().create(&problem)) return fail(EX_CANTCREAT, problem);
   int holder = 0;

@@ -1,5 +1,7 @@
 #include "keld/ItemPresenter.h"
 
+#include <vector>
+
 #include "keld/TypeIdentifiers.h"
 
 namespace droxa::keld {
@@ -33,6 +35,25 @@ const std::string &ItemPresenter::shownName(const ItemRecord &record) const {
   return entry ? entry->shownName : record.name;
 }
 
+bool ItemPresenter::isInShared(ItemNumber folder) const {
+  std::vector<ItemNumber> asked;
+  bool isShared = false;
+  while (folder != kReplicaFolder && folder != kLimboFolder && !isShared) {
+    const auto known = shared_.find(folder);
+    if (known != shared_.end()) {
+      isShared = known->second;
+      break;
+    }
+    asked.push_back(folder);
+    const auto record = queries_.byID(folder);
+    if (!record) break;
+    isShared = (record->flags & kSharedFlag) != 0;
+    folder = record->parent;
+  }
+  for (const ItemNumber each : asked) shared_[each] = isShared;
+  return isShared;
+}
+
 std::shared_ptr<const QVQueryItem> ItemPresenter::item(const ItemRecord &record) const {
   const QVFileObjectID fileObjectID = FileObjectID(record.id, record.facts.kind);
   NSFileProviderItemFields fields;
@@ -50,6 +71,7 @@ std::shared_ptr<const QVQueryItem> ItemPresenter::item(const ItemRecord &record)
   fields.isExcludedFromSync = (record.flags & kExcludedFlag) != 0;
   fields.isDownloaded = (record.flags & kDatalessFlag) == 0;
   fields.isUploaded = (record.flags & kUploadedFlag) != 0;
+  fields.isShared = (record.flags & kSharedFlag) != 0 || isInShared(record.parent);
   if (record.metadata.lastUsed != 0)
     fields.lastUsedDate = NSDate::dateWithNanosecondsSince1970(record.metadata.lastUsed);
   if (!record.metadata.tags.empty()) fields.tagData = QVTagDataOfNames(record.metadata.tags);

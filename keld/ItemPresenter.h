@@ -1,18 +1,22 @@
 #pragma once
 
 #include <memory>
+#include <string>
+#include <unordered_map>
 
 #include "keld/ContainerList.h"
+#include "keld/ItemQueries.h"
 #include "keld/ItemRecord.h"
 #include "tessaly/QVQueryItem.h"
 
 namespace droxa::keld {
 
-// Makes what clients see of a row.
-// Thread contract: immutable.
+// Makes what clients see of a row. What a folder's contents inherit is found out once a folder, so make one
+// for each read. Thread contract: one thread at a time, as the queries.
 class ItemPresenter {
  public:
-  explicit ItemPresenter(std::shared_ptr<const Containers> containers) : containers_(std::move(containers)) {}
+  ItemPresenter(std::shared_ptr<const Containers> containers, ItemQueries &queries)
+      : containers_(std::move(containers)), queries_(queries) {}
 
   std::shared_ptr<const QVQueryItem> item(const ItemRecord &record) const;
   static std::shared_ptr<const QVQueryItem> deadItem(ItemNumber id, NSFileProviderItemKind kind);
@@ -23,7 +27,11 @@ class ItemPresenter {
 
  private:
   std::string parentIdentifier(const ItemRecord &record) const;
+  // Whether the folder, or one that it is below, is the root of a share.
+  bool isInShared(ItemNumber folder) const;
   const std::shared_ptr<const Containers> containers_;
+  ItemQueries &queries_;
+  mutable std::unordered_map<ItemNumber, bool> shared_;  // the folders looked at so far
 };
 
 }  // namespace droxa::keld

@@ -208,4 +208,12 @@ std::string ItemQueries::metaText(const std::string &key) {
   return scope->step() ? std::string(scope->bytes(0)) : std::string();
 }
 
+std::optional<ItemRecord> RecordOf(ItemQueries &queries, const QVFileObjectID &fileObjectID) {
+  auto record = queries.byID(fileObjectID.number());
+  if (!record || record->parent == kLimboFolder ||
+      FileObjectID(record->id, record->facts.kind) != fileObjectID)
+    return std::nullopt;
+  return record;
+}
+
 }  // namespace droxa::keld

@@ -71,6 +71,9 @@ class ItemQueries {
   std::map<const char *, std::unique_ptr<SqlStatement>> statements_;  // by the literal's address
 };
 
+// The item of that number, if it is of that kind too, and its file isn't missing.
+std::optional<ItemRecord> RecordOf(ItemQueries &queries, const QVFileObjectID &fileObjectID);
+
 // Reads the columns that every query of items selects, in their order.
 ItemRecord ReadItemRecord(const SqlStatement &row);
 

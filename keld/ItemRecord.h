@@ -29,8 +29,10 @@ inline constexpr std::uint32_t kExcludedFlag = 4;    // kept local, by its name 
 inline constexpr std::uint32_t kUnreadableFlag = 8;  // a folder that the file system refused to show
 inline constexpr std::uint32_t kDatalessFlag = 16;   // a document whose contents are in the cloud alone
 inline constexpr std::uint32_t kUploadedFlag = 32;   // the cloud has it as it is
+inline constexpr std::uint32_t kSharedFlag = 64;     // the root of a share; what is below it has no flag
 inline constexpr std::uint32_t kSyncFlags = kDatalessFlag | kUploadedFlag;
-inline constexpr std::uint32_t kOwnFlags = kUnreadableFlag | kSyncFlags;  // not inherited from where it is
+inline constexpr std::uint32_t kOwnFlags =
+    kUnreadableFlag | kSharedFlag | kSyncFlags;  // not inherited from where it is
 
 // What the file system says of a file.
 struct FileFacts {

@@ -11,7 +11,8 @@
 #include "keld/TrashNotes.h"
 #include "keld/contents/ContentsStorage.h"
 #include "keld/sync/DeviceName.h"
-#include "platform/cloudkit/EmbeddedCloud.h"
+#include "keld/sync/DriveAccount.h"
+#include "keld/sync/DriveCloud.h"
 #include "platform/fileprovider/FPReplacements.h"
 #include "platform/foundation/NSDate.h"
 #include "tessaly/QVErrors.h"
@@ -43,6 +44,12 @@ std::shared_ptr<Keld> Keld::start(const DroxaHome &home, KeldOptions options, st
   if (!problem->empty()) return nullptr;
   daemon->removeAbandonedActions();
   try {
+    daemon->driveAccount_ = DriveAccount(home, daemon->options_.sync.account);
+  } catch (const std::exception &refused) {
+    *problem = refused.what();
+    return nullptr;
+  }
+  try {
     daemon->open();
   } catch (const std::exception &error) {
     *problem = error.what();
@@ -67,7 +74,7 @@ void Keld::open() {
   openSync();
   const NSError error = account_->load();
   if (error) os_log_error(qvc_default_log(), "[ERROR] can't read the account: %@", error);
-  offerLocalAccount(!wasDamaged && !error);
+  offerAccount(!wasDamaged && !error);
   accountChanged();
 }
 
@@ -94,15 +101,16 @@ void Keld::openSync() {
   if (!cloud) {
     const std::string folder = options.cloudFolder.empty() ? home_.root() + "/cloud" : options.cloudFolder;
     NSError error;
-    cloud = EmbeddedCloud::open(folder, AccountKeeper::localUserName(), options.device, &error);
+    cloud = OpenDriveCloud(home_, folder, driveAccount_, options.device, &error);
     if (!cloud) throw std::runtime_error(error.localizedDescription());
   }
   const auto readItems = [this](const std::function<void(ItemQueries &)> &work) {
     return read([&](ItemQueries &queries, const ItemPresenter &) { work(queries); });
   };
   sync_ = std::make_shared<SyncEngine>(
-      replicaPath_, home_.state() + "/sync.sqlite", std::move(cloud), [this] { return keeper_.get(); },
-      readItems, options);
+      replicaPath_, home_.state() + "/sync.sqlite", cloud, [this] { return keeper_.get(); }, readItems,
+      options);
+  RememberDriveAccount(sync_->store(), driveAccount_);
   ContentsServiceHost host;
   host.replicaPath = replicaPath_;
   host.keeper = [this]() -> Keeper & { return *keeper_; };
@@ -110,9 +118,23 @@ void Keld::openSync() {
   host.pathBelowReplica = [this](const NSURL &url) { return pathBelowReplica(url); };
   host.isSignedIn = [this] { return account_->isSignedIn(); };
   contents_ = std::make_shared<ContentsService>(std::move(host), sync_);
+  openSharing(cloud);
   std::string itemDatabase;
   (void)readItems([&](ItemQueries &queries) { itemDatabase = queries.metaText("uuid"); });
   sync_->start(itemDatabase);
+}
+
+void Keld::openSharing(const std::shared_ptr<CKCloud> &cloud) {
+  SharingHost host;
+  host.replicaPath = replicaPath_;
+  host.keeper = [this]() -> Keeper & { return *keeper_; };
+  host.read = [this](const std::function<void(ItemQueries &)> &work) {
+    return read([&](ItemQueries &queries, const ItemPresenter &) { work(queries); });
+  };
+  host.pathBelowReplica = [this](const NSURL &url) { return pathBelowReplica(url); };
+  host.isSignedIn = [this] { return account_->isSignedIn(); };
+  sharing_ = std::make_shared<SharingService>(std::move(host), sync_, SharingPlaces(cloud, driveAccount_),
+                                              options_.sharing);
 }
 
 void Keld::accountChanged() {
@@ -121,15 +143,15 @@ void Keld::accountChanged() {
 
 // A home that is used for the first time works at once. Who signed out there stays signed out: the database
 // knows that the account was offered, and one that replaces a damaged one doesn't offer it again.
-void Keld::offerLocalAccount(bool mayOffer) {
+void Keld::offerAccount(bool mayOffer) {
   bool wasOffered = false;
   (void)read([&](ItemQueries &queries, const ItemPresenter &) {
     wasOffered = queries.metaNumber("accountOffered") != 0;
   });
   if (wasOffered) return;
   if (mayOffer && !account_->isSignedIn()) {
-    const NSError error = account_->signIn(AccountKeeper::localUserName());
-    if (error) os_log_error(qvc_default_log(), "[ERROR] can't sign the local account in: %@", error);
+    const NSError error = account_->signIn(driveAccount_);
+    if (error) os_log_error(qvc_default_log(), "[ERROR] can't sign the drive's account in: %@", error);
   }
   performAndWait([](ItemEdits &edits) { edits.setMeta("accountOffered", 1); });
 }
@@ -158,6 +180,7 @@ std::string Keld::identifierForAccount(const std::string &name) {
 
 void Keld::stop() {
   if (stopped_.exchange(true)) return;
+  if (sharing_) sharing_->queue().stop();
   if (sync_) sync_->stop();
   if (keeper_) keeper_->stop();
 }
@@ -169,7 +192,8 @@ std::shared_ptr<QVProtocol> Keld::newSession() {
 NSError Keld::read(const Read &work) {
   if (stopped_) return qvc_error(QVErrorShuttingDown, "the daemon is shutting down");
   try {
-    readers_->read([&](ItemQueries &queries) { work(queries, ItemPresenter(containers_.current())); });
+    readers_->read(
+        [&](ItemQueries &queries) { work(queries, ItemPresenter(containers_.current(), queries)); });
     return NSError();
   } catch (const SqlError &error) {
     os_log_error(qvc_default_log(), "[ERROR] the item database can't be read: %s", error.what());

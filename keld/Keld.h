@@ -14,6 +14,7 @@
 #include "keld/NotificationHub.h"
 #include "keld/ReaderPool.h"
 #include "keld/UpdateSenders.h"
+#include "keld/sharing/SharingService.h"
 #include "keld/sync/ContentsService.h"
 #include "platform/foundation/Paths.h"
 #include "tessaly/QVProtocol.h"
@@ -23,6 +24,7 @@ namespace droxa::keld {
 struct KeldOptions {
   KeeperOptions keeper;
   SyncOptions sync;
+  SharingOptions sharing;
   // Called once, on a thread of the daemon, when it can't go on: its program ends then.
   std::function<void(const std::string &why)> failed;
 };
@@ -56,6 +58,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   UpdateSenders &senders() { return senders_; }
   QVContentsProtocol &contents() { return *contents_; }
   SyncEngine &sync() { return *sync_; }
+  SharingService &sharing() { return *sharing_; }
   // Whether anybody is signed in has changed.
   void accountChanged();
   std::shared_ptr<const Containers> containers() const { return containers_.current(); }
@@ -83,8 +86,9 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   void open();
   void removeAbandonedActions();
   void openSync();
+  void openSharing(const std::shared_ptr<CKCloud> &cloud);
   bool replicaHasPromises() const;
-  void offerLocalAccount(bool mayOffer);
+  void offerAccount(bool mayOffer);
   std::string identifierForAccount(const std::string &name);
   void performAndWait(const std::function<void(ItemEdits &edits)> &edit);
 
@@ -93,6 +97,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   const std::string replicaPath_;
   const std::string databasePath_;
   const std::int64_t startedNanoseconds_;
+  std::string driveAccount_;  // constant after start()
   std::unique_ptr<HomeLock> lock_;
   ContainerList containers_;
   ListingCursors cursors_;
@@ -103,6 +108,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   std::unique_ptr<Keeper> keeper_;
   std::shared_ptr<SyncEngine> sync_;
   std::shared_ptr<QVContentsProtocol> contents_;
+  std::shared_ptr<SharingService> sharing_;
   std::atomic<bool> stopped_{false};
 };
 

@@ -24,15 +24,6 @@ std::string named(const std::optional<QVFileObjectID> &folder) {
   return folder ? folder->asString() : "the root";
 }
 
-// The item of that number, if it is of that kind too.
-std::optional<ItemRecord> recordOf(ItemQueries &queries, const QVFileObjectID &fileObjectID) {
-  auto record = queries.byID(fileObjectID.number());
-  if (!record || record->parent == kLimboFolder ||
-      FileObjectID(record->id, record->facts.kind) != fileObjectID)
-    return std::nullopt;
-  return record;
-}
-
 }  // namespace
 
 void KeldSession::end() {
@@ -44,6 +35,7 @@ void KeldSession::end() {
     senders.swap(senders_);
     subscriptions.swap(subscriptions_);
   }
+  daemon_->sharing().queue().end(sharing_);
   for (const auto &weak : senders)
     if (const auto sender = weak.lock()) sender->invalidate();
   for (const std::uint64_t subscription : subscriptions) daemon_->notifications().unsubscribe(subscription);
@@ -180,7 +172,7 @@ void KeldSession::getURLForItemIdentifier(const std::string &identifier, QVURLRe
 void KeldSession::getURLForFileObjectID(const QVFileObjectID &fileObjectID, QVURLReply reply) {
   std::string path;
   const NSError error = daemon_->read([&](ItemQueries &queries, const ItemPresenter &) {
-    if (const auto record = recordOf(queries, fileObjectID)) path = queries.pathBelowReplica(*record);
+    if (const auto record = RecordOf(queries, fileObjectID)) path = queries.pathBelowReplica(*record);
   });
   if (error) return reply(NSURL(), error);
   if (path.empty()) return reply(NSURL(), qvc_errorNoSuchItem(fileObjectID.asString()));

@@ -11,7 +11,8 @@
 
 namespace droxa::keld {
 
-// One client's daemon: answers from the item database, and owns the client's senders and subscriptions.
+// One client's daemon: answers from the item database, and owns the client's senders, subscriptions
+// and sharing operations.
 // Thread contract: any thread. Questions of what is known are answered before the call returns; those that
 // the keeper has to look at first, later on the pool.
 class KeldSession final : public QVProtocol, public std::enable_shared_from_this<KeldSession> {
@@ -19,7 +20,8 @@ class KeldSession final : public QVProtocol, public std::enable_shared_from_this
   explicit KeldSession(std::shared_ptr<Keld> daemon) : daemon_(std::move(daemon)) {}
   ~KeldSession() override { end(); }
 
-  // Ends the client's senders and subscriptions: its connection has ended.
+  // Ends the client's senders and subscriptions, and cancels its sharing operations: its connection has
+  // ended.
   void end();
 
   void enumerateItemsInFolder(const std::optional<QVFileObjectID> &folder, std::int64_t sortOrder,
@@ -99,9 +101,12 @@ class KeldSession final : public QVProtocol, public std::enable_shared_from_this
   Found findAtPath(const std::string &pathBelowReplica);
   void listPage(ListingRequest request, std::uint64_t offset, std::uint64_t limit,
                 const QVItemsCompletion &completion);
+  std::optional<ItemRecord> itemWithIdentifier(const std::string &identifier, NSError *error);
   NSError checkListing(std::uint64_t limit) const;
+  SharingCaller caller(std::shared_ptr<QVOperationClient> client) { return {sharing_, std::move(client)}; }
 
   const std::shared_ptr<Keld> daemon_;
+  const std::shared_ptr<SharingOwner> sharing_ = std::make_shared<SharingOwner>();
   Mutex mutex_;
   bool ended_ GUARDED_BY(mutex_) = false;
   std::vector<std::weak_ptr<UpdateSender>> senders_ GUARDED_BY(mutex_);

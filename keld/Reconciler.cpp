@@ -309,6 +309,14 @@ void Reconciler::setSyncFlags(ItemNumber id, std::uint32_t flags) {
   changes_.push_back({record->id, record->facts.kind, record->parent, record->parent, false});
 }
 
+void Reconciler::setShared(ItemNumber id, bool isShared) {
+  auto record = queries_.byID(id);
+  const std::uint32_t flag = isShared ? kSharedFlag : 0U;
+  if (!record || record->parent == kLimboFolder || (record->flags & kSharedFlag) == flag) return;
+  edits_.setFlags(*record, (record->flags & ~kSharedFlag) | flag);
+  changes_.push_back({record->id, record->facts.kind, record->parent, record->parent, false});
+}
+
 // --- What is missing.
 
 void Reconciler::putIntoLimbo(ItemRecord record) {

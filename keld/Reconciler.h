@@ -70,6 +70,8 @@ class Reconciler {
   void touch(ItemNumber id);
   // Shows what the sync has found out of the item: kSyncFlags.
   void setSyncFlags(ItemNumber id, std::uint32_t flags);
+  // Shows whether the item is the root of a share.
+  void setShared(ItemNumber id, bool isShared);
   // Notes it on the item's file, or in its row where the file can't bear it. nil, QVErrorNoSuchItem or a
   // POSIX error.
   NSError applyMetadata(ItemNumber id, const QVItemMetadataChange &change);

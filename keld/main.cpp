@@ -1,6 +1,7 @@
 // keld, the sync daemon of one home.
 
 #include <CLI/CLI.hpp>
+#include <filesystem>
 #include <iostream>
 #include <malloc.h>
 #include <optional>
@@ -16,7 +17,10 @@
 #include "keld/KeldListener.h"
 #include "keld/sync/CloudImport.h"
 #include "keld/sync/DeviceName.h"
+#include "keld/sync/DriveAccount.h"
+#include "keld/sync/SyncStore.h"
 #include "platform/cloudkit/EmbeddedCloud.h"
+#include "platform/foundation/DescriptorLimit.h"
 #include "platform/foundation/Paths.h"
 #include "tessaly/QVLog.h"
 
@@ -28,6 +32,7 @@ struct Arguments {
   std::string cloud;       // "": the home's own
   std::string importFrom;  // "": serve
   std::string device;
+  std::string account;
   WatcherKind watcher = WatcherKind::best;
   bool foreground = true;
 };
@@ -53,6 +58,7 @@ int serve(const Arguments &arguments, int signals) {
   options.keeper.watcher = arguments.watcher;
   options.sync.cloudFolder = arguments.cloud;
   options.sync.device = arguments.device;
+  options.sync.account = arguments.account;
   options.failed = [failure](const std::string &) {
     const std::uint64_t one = 1;
     (void)!::write(failure, &one, sizeof one);
@@ -75,6 +81,26 @@ int serve(const Arguments &arguments, int signals) {
   return wasAsked ? EX_OK : EX_SOFTWARE;
 }
 
+// The daemon makes them, of the files that the documents came from. Without its database there are none.
+ThumbnailsWanted noteThumbnails(const DroxaHome &home) {
+  std::shared_ptr<SyncStore> store;
+  try {
+    store = std::make_shared<SyncStore>(home.state() + "/sync.sqlite");
+  } catch (const SqlError &error) {
+    std::cerr << "keld: thumbnails won't be made: " << error.what() << "\n";
+    return nullptr;
+  }
+  return [store](const std::vector<WantedThumbnail> &wanted) {
+    try {
+      store->transaction([&] {
+        for (const WantedThumbnail &each : wanted) store->wantThumbnail(each);
+      });
+    } catch (const SqlError &error) {
+      std::cerr << "keld: " << wanted.size() << " thumbnails won't be made: " << error.what() << "\n";
+    }
+  };
+}
+
 // Puts a folder's documents into the home's cloud, and says what it did, the last line in full.
 int importFolder(const Arguments &arguments) {
   const DroxaHome home = DroxaHome::resolve(arguments.home);
@@ -82,14 +108,21 @@ int importFolder(const Arguments &arguments) {
   if (!home.create(&problem)) return fail(problem, EX_CANTCREAT);
   const std::string folder = arguments.cloud.empty() ? home.root() + "/cloud" : arguments.cloud;
   const std::string device = arguments.device.empty() ? DeviceName(home) : arguments.device;
+  std::string account;
+  try {
+    account = DriveAccount(home, arguments.account);
+  } catch (const std::runtime_error &refused) {
+    return fail(refused.what(), EX_CONFIG);
+  }
   NSError error;
-  const auto cloud = EmbeddedCloud::open(folder, AccountKeeper::localUserName(), device, &error);
+  const auto cloud = EmbeddedCloud::open(folder, account, device, &error);
   if (!cloud) return fail(folder + ": " + error.localizedDescription(), EX_UNAVAILABLE);
+  const auto progress = [](const ImportReport &so) {
+    std::cout << so.documents << " documents, " << so.folders << " folders, " << so.bytes << " bytes"
+              << std::endl;
+  };
   const ImportReport report =
-      ImportIntoCloud(*cloud, arguments.importFrom, {home.root(), folder}, [](const ImportReport &so) {
-        std::cout << so.documents << " documents, " << so.folders << " folders, " << so.bytes << " bytes"
-                  << std::endl;
-      });
+      ImportIntoCloud(*cloud, arguments.importFrom, {home.root(), folder}, progress, noteThumbnails(home));
   for (const std::string &left : report.problems) std::cerr << "keld: left out " << left << "\n";
   if (report.error) return fail(report.error.localizedDescription(), EX_IOERR);
   return EX_OK;
@@ -115,6 +148,10 @@ int run(int argc, char **argv) {
       ->option_text("DIR");
   app.add_option("--device", arguments.device, "What this device is called (default: the machine's name)")
       ->option_text("NAME");
+  app.add_option(
+         "--account", arguments.account,
+         "The account in the cloud that the drive belongs to (default: as before, else who runs this)")
+      ->option_text("NAME");
   app.add_option("--import", arguments.importFrom,
                  "Put the documents of a folder into the cloud, and end; the folder is only read")
       ->option_text("FOLDER");
@@ -126,7 +163,10 @@ int run(int argc, char **argv) {
     return app.exit(error) == 0 ? EX_OK : 2;
   }
   if (homeOption->count() > 0) arguments.home = home;
-  if (!arguments.importFrom.empty()) return importFolder(arguments);
+  if (!arguments.importFrom.empty()) {
+    arguments.importFrom = std::filesystem::absolute(arguments.importFrom).lexically_normal().string();
+    return importFolder(arguments);
+  }
 
   // Blocked before the first thread is made, so that they are taken from the descriptor alone.
   sigset_t ending;
@@ -134,6 +174,7 @@ int run(int argc, char **argv) {
   for (const int signal : {SIGTERM, SIGINT, SIGHUP}) sigaddset(&ending, signal);
   ::pthread_sigmask(SIG_BLOCK, &ending, nullptr);
   ::signal(SIGPIPE, SIG_IGN);
+  DroxaRaiseDescriptorLimit();
   ::mallopt(M_ARENA_MAX, 4);  // many short-lived threads would each keep memory of their own
   return serve(arguments, ::signalfd(-1, &ending, SFD_CLOEXEC));
 }

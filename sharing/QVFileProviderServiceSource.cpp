@@ -2,6 +2,9 @@
 
 #include <utility>
 
+#include "additions/QVPersonaAdoption.h"
+#include "tessaly/QVPersona.h"
+
 namespace droxa {
 
 QVFileProviderServiceSource::QVFileProviderServiceSource(std::shared_ptr<NSFileProviderExtension> extension,
@@ -49,6 +52,14 @@ bool QVFileProviderServiceSource::listenerShouldAcceptNewConnection(
       });
   connection->resume();
   return true;
+}
+
+std::function<void(const std::function<void()> &)> QVFileProviderServiceSource::underCurrentPersona() {
+  return
+      [persona = qv_currentPersonaID(UMUserManager::sharedManager())](const std::function<void()> &handler) {
+        const QVPersonaAdoption adoption(persona);
+        handler();
+      };
 }
 
 std::vector<std::shared_ptr<NSXPCListener>> QVFileProviderServiceSource::listeners() const {

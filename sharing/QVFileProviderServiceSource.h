@@ -54,6 +54,9 @@ class QVFileProviderServiceSource : public NSFileProviderServiceSource,
   // The connection's interface and an object made for it alone. `connection` isn't null.
   virtual void exportObject(NSXPCConnection &connection) = 0;
   virtual ConnectionHandlers connectionHandlers() const = 0;
+  // Runs handlers under the calling thread's persona as it is now; where that can't be adopted then, under
+  // whichever the handler's thread has.
+  static std::function<void(const std::function<void()> &handler)> underCurrentPersona();
 
   const std::shared_ptr<NSFileProviderExtension> _fileProviderExtension;
   const std::string _itemIdentifier;

@@ -32,15 +32,6 @@ void LogReply(const char *name, const Values &...values) {
   }
 }
 
-// The daemon never gets a client's operation itself.
-std::shared_ptr<QVOperationClient> Wrapped(std::shared_ptr<QVOperationClient> operation) {
-  return std::make_shared<_QVFileProviderShareOperationWrapper>(std::move(operation));
-}
-template <class Argument>
-const Argument &Wrapped(const Argument &argument) {
-  return argument;
-}
-
 }  // namespace
 
 struct QVFileProviderShareOperationProxy::Privilege {
@@ -65,7 +56,25 @@ QVFileProviderShareOperationProxy::QVFileProviderShareOperationProxy(
       _operationQueue(std::move(operationQueue)),
       _clientPriviledgesDescriptor(std::move(clientPriviledgesDescriptor)) {}
 
-QVFileProviderShareOperationProxy::~QVFileProviderShareOperationProxy() = default;
+// The client's connection has ended, which nobody else of whom the daemon knows would tell it.
+QVFileProviderShareOperationProxy::~QVFileProviderShareOperationProxy() {
+  std::vector<std::weak_ptr<_QVFileProviderShareOperationWrapper>> operations;
+  {
+    const Lock lock(_lock);
+    operations.swap(_operations);
+  }
+  for (const auto &one : operations)
+    if (const auto operation = one.lock()) operation->abandon();
+}
+
+std::shared_ptr<QVOperationClient> QVFileProviderShareOperationProxy::wrapped(
+    const Operation &operation) const {
+  auto wrapper = std::make_shared<_QVFileProviderShareOperationWrapper>(operation);
+  const Lock lock(_lock);
+  std::erase_if(_operations, [](const auto &one) { return one.expired(); });
+  _operations.push_back(wrapper);
+  return wrapper;
+}
 
 std::shared_ptr<QVFileProviderXPCAutomaticErrorProxy> QVFileProviderShareOperationProxy::remoteObject() {
   constexpr char name[] = "deamon connection";  // so spelt on purpose: logs are searched for it
@@ -95,7 +104,15 @@ void QVFileProviderShareOperationProxy::forward(const char *name, const char *re
     std::apply(answer, nothing);
     return;
   }
-  remoteObject()->call(method, answer, Wrapped(std::forward<Arguments>(arguments))...);
+  // The daemon never gets a client's operation itself.
+  [[maybe_unused]] const auto passed = [this]<class Argument>(const Argument &argument) -> decltype(auto) {
+    if constexpr (std::is_same_v<Argument, Operation>) {
+      return wrapped(argument);
+    } else {
+      return (argument);
+    }
+  };
+  remoteObject()->call(method, answer, passed(arguments)...);
 }
 
 void QVFileProviderShareOperationProxy::startOperation_toCopySharingInfoAtURL(Operation op, const NSURL &url,

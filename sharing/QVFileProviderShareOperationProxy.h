@@ -2,14 +2,18 @@
 
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "platform/fileprovider/NSFileProviderExtension.h"
 #include "platform/foundation/NSOperationQueue.h"
+#include "platform/foundation/ThreadSafety.h"
 #include "sharing/QVFileProviderXPCAutomaticErrorProxy.h"
 #include "tessaly/QVCClientPrivilegesDescriptor.h"
 #include "tessaly/QVShareOperationProtocol.h"
 
 namespace droxa {
+
+class _QVFileProviderShareOperationWrapper;
 
 // One client's way to the daemon's sharing operations: each call is refused at once when the client isn't
 // entitled to it, and otherwise goes to the daemon as it is, as does its answer back. A refused call never
@@ -17,10 +21,11 @@ namespace droxa {
 // to the item that the service was offered on: privileges are the only gate.
 //
 // Refusals: QVTessalyErrorDomain, QVErrorPrivilegeRequired, with the missing privilege's name. A daemon that
-// goes away: the connection's error, as it is.
+// goes away: the connection's error, as it is. When the client goes away, and this with its connection, what
+// the daemon still does for it is cancelled.
 //
-// Thread contract: immutable; any thread, any number of calls under way. A refusal replies before the call
-// returns, an answer of the daemon where the daemon's connection delivers it.
+// Thread contract: any thread, any number of calls under way; the lock guards the operations alone. A refusal
+// replies before the call returns, an answer of the daemon where the daemon's connection delivers it.
 class QVFileProviderShareOperationProxy final : public QVShareOperationProtocol {
  public:
   QVFileProviderShareOperationProxy(
@@ -67,11 +72,18 @@ class QVFileProviderShareOperationProxy final : public QVShareOperationProtocol 
   void forward(const char *name, const char *replyName, const Privilege &privilege, Method method,
                const std::function<void(Values...)> &reply, Arguments &&...arguments) const;
 
+  // What the daemon gets instead of the client's operation.
+  std::shared_ptr<QVOperationClient> wrapped(const Operation &operation) const;
+
   // Kept for as long as the client's connection; no call needs the first three.
   const std::shared_ptr<NSFileProviderExtension> _fileProviderExtension;
   const std::string _itemIdentifier;
   const std::shared_ptr<NSOperationQueue> _operationQueue;
   const std::shared_ptr<const QVCClientPrivilegesDescriptor> _clientPriviledgesDescriptor;
+
+  mutable Mutex _lock;
+  // The operations that the daemon has, or had a moment ago.
+  mutable std::vector<std::weak_ptr<_QVFileProviderShareOperationWrapper>> _operations GUARDED_BY(_lock);
 };
 
 }  // namespace droxa

@@ -23,11 +23,24 @@ void _QVFileProviderShareOperationWrapper::setRemoteOperationProxy(std::shared_p
                                                                    const NSUserInfo &userInfo) {
   const auto wrapper = std::make_shared<_QVFileProviderShareCancellableWrapper>(std::move(proxy));
   std::shared_ptr<_QVFileProviderShareCancellableWrapper> earlier = wrapper;  // released without the lock
+  bool isAbandoned = false;
   {
     const Lock lock(_lock);
     _remoteOperationProxy.swap(earlier);
+    isAbandoned = isAbandoned_;
   }
+  if (isAbandoned) wrapper->invalidate();
   if (_wrapped) _wrapped->setRemoteOperationProxy(wrapper, userInfo);
+}
+
+void _QVFileProviderShareOperationWrapper::abandon() {
+  std::shared_ptr<_QVFileProviderShareCancellableWrapper> remote;
+  {
+    const Lock lock(_lock);
+    isAbandoned_ = true;
+    remote = _remoteOperationProxy;
+  }
+  if (remote) remote->invalidate();
 }
 
 }  // namespace droxa

@@ -25,10 +25,14 @@ class _QVFileProviderShareOperationWrapper final : public _QVFileProviderShareCa
   void progressCallbackWithTopic(const std::string &topic, const NSUserInfo &userInfo) override;
   void setRemoteOperationProxy(std::shared_ptr<QVCancellable> proxy, const NSUserInfo &userInfo) override;
 
+  // The client has gone: cancels the daemon's side, now or when it is handed over, since nobody else can.
+  void abandon();
+
  private:
   const std::shared_ptr<QVOperationClient> _wrapped;
   Mutex _lock;
   std::shared_ptr<_QVFileProviderShareCancellableWrapper> _remoteOperationProxy GUARDED_BY(_lock);
+  bool isAbandoned_ GUARDED_BY(_lock) = false;
 };
 
 }  // namespace droxa

@@ -11,6 +11,7 @@
 #include "tessaly/QVContainer.h"
 #include "tessaly/QVDaemonConnection.h"
 #include "tessaly/QVErrors.h"
+#include "tessaly/QVQueryItem.h"
 
 namespace droxa {
 
@@ -124,6 +125,15 @@ NSURL qv_documentURLFromFileObjectID(const QVFileObjectID &fileObjectID, NSError
   const NSURL url = proxy->result<NSURL>();
   if (!url && error) *error = proxy->error() ? proxy->error() : qvc_errorNoSuchItem(fileObjectID.asString());
   return url;
+}
+
+std::optional<std::string> qv_typeIdentifierWithError(const NSURL &url, NSError *error) {
+  if (!url) {
+    if (error) *error = qvc_error(QVErrorInvalidArgument, "there is no URL whose type could be told");
+    return std::nullopt;
+  }
+  const auto item = QVQueryItem::askDaemonQueryItemForURL(url, false, error);
+  return item ? std::optional(item->fields().typeIdentifier) : std::nullopt;
 }
 
 bool qv_isExternalDocumentReference(const NSURL &url) {

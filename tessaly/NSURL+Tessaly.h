@@ -16,6 +16,10 @@ namespace droxa {
 // Where the document or folder is on disk; nil with `error` (may be null) set. Blocks on the daemon.
 NSURL qv_documentURLFromFileObjectID(const QVFileObjectID &fileObjectID, NSError *error);
 
+// What kind of item is there, as the daemon tells it ("text/plain", "inode/directory"); nullopt with `error`
+// (may be null) set: 22 for a nil URL, 14 when there is nothing. Blocks on the daemon.
+std::optional<std::string> qv_typeIdentifierWithError(const NSURL &url, NSError *error);
+
 // Whether it is an alias (bookmark): a symbolic link whose target is in a synced location.
 bool qv_isExternalDocumentReference(const NSURL &url);
 // The alias's target, through further aliases; nil with `error` (may be null) set for a dangling or circular

@@ -34,6 +34,8 @@ inline constexpr std::uint64_t QVDownloadForReader =
     1;  // somebody waits: before everything that nobody waits for
 inline constexpr std::uint64_t QVDownloadInBackground = 2;
 inline constexpr std::uint64_t QVDownloadForThumbnail = 4;
+// What is here isn't good enough while the cloud has something newer: it is asked first.
+inline constexpr std::uint64_t QVDownloadCurrentVersion = 8;
 
 // One document, or what lies below one folder taken together.
 struct QVContentsStatus {

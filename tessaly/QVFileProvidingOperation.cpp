@@ -8,28 +8,8 @@
 #include "platform/dispatch/dispatch.h"
 #include "tessaly/QVDaemonConnection.h"
 #include "tessaly/QVErrors.h"
-#include "tessaly/QVPersona.h"
 
 namespace droxa {
-
-// The completion on its way to being called, once and in any case: a persona that can't be adopted keeps the
-// block that was remembered under it from running.
-struct QVFileProvidingOperation::Delivery {
-  explicit Delivery(Completion block) : completion(std::move(block)) {
-    if (qvc_block_remember_persona) underPersona = qvc_block_remember_persona([this] { call(); });
-  }
-  void deliver(const NSError &error) {
-    outcome = error;
-    if (underPersona) underPersona();
-    call();
-  }
-  void call() {
-    if (const Completion once = std::exchange(completion, nullptr)) once(outcome);
-  }
-  Completion completion;
-  NSError outcome;
-  QVBlock underPersona;
-};
 
 namespace {
 
@@ -58,7 +38,7 @@ void QVFileProvidingOperation::setFileProvidingCompletion(Completion completion)
     }
     outcome = outcome_;
   }
-  dispatch_async_global([delivery, outcome] { delivery->deliver(outcome); });
+  dispatch_async_global([delivery, outcome] { delivery->deliver({outcome}); });
 }
 
 void QVFileProvidingOperation::main() {
@@ -72,9 +52,10 @@ void QVFileProvidingOperation::main() {
   if (isOver) return finish();  // ended before this, which left it to be finished here
   const auto self = shared_from_this();
   if (isCancelled()) return end(cancelledError(url_));
+  const std::uint64_t version = wantsCurrentVersion_ ? QVDownloadCurrentVersion : 0;
   QVDaemonConnection::defaultConnection()
       ->remoteObjectProxyWithErrorHandler([self](const NSError &error) { self->end(error); })
-      ->startDownloadAtURL(url_, QVDownloadForReader,
+      ->startDownloadAtURL(url_, QVDownloadForReader | version,
                            [self](const std::shared_ptr<QVTransfer> &transfer, const NSError &error) {
                              self->transferStarted(transfer, error);
                            });
@@ -129,7 +110,7 @@ void QVFileProvidingOperation::end(const NSError &error) {
     released.swap(transfer_);
     mainRan = mainRan_;
   }
-  if (delivery) delivery->deliver(error);
+  if (delivery) delivery->deliver({error});
   if (mainRan) finish();  // otherwise the queue does, which never runs it, or main()
 }
 

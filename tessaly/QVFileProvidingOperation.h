@@ -1,5 +1,6 @@
 #pragma once
 
+#include <atomic>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -9,6 +10,7 @@
 #include "platform/foundation/NSURL.h"
 #include "platform/foundation/ThreadSafety.h"
 #include "tessaly/QVContents.h"
+#include "tessaly/QVRememberedCompletion.h"
 
 namespace droxa {
 
@@ -40,6 +42,11 @@ class QVFileProvidingOperation final : public NSOperation,
   const NSURL &url() const { return url_; }
   std::uint64_t readingOptions() const { return readingOptions_; }
 
+  // Whether contents that are here are good enough (the default), or the cloud is asked for newer ones first.
+  // Set before it is given to a queue.
+  void setWantsCurrentVersion(bool wants) { wantsCurrentVersion_ = wants; }
+  bool wantsCurrentVersion() const { return wantsCurrentVersion_; }
+
   // Set once; when everything is over already, it is called at once, on the pool.
   void setFileProvidingCompletion(Completion completion);
   // How far it is. Blocks on the daemon while the download is under way.
@@ -52,7 +59,7 @@ class QVFileProvidingOperation final : public NSOperation,
  private:
   enum class Stage : std::uint8_t { fresh, starting, waiting, ended };
 
-  struct Delivery;
+  using Delivery = QVRememberedCompletion<NSError>;
 
   void transferStarted(const std::shared_ptr<QVTransfer> &transfer, const NSError &error);
   void end(const NSError &error);
@@ -60,6 +67,8 @@ class QVFileProvidingOperation final : public NSOperation,
   // Constant after construction.
   const NSURL url_;
   const std::uint64_t readingOptions_;
+  // Constant once a queue has it.
+  std::atomic<bool> wantsCurrentVersion_ = false;
 
   Mutex mutex_;
   Stage stage_ GUARDED_BY(mutex_) = Stage::fresh;

@@ -13,6 +13,7 @@
 #include "tessaly/QVDaemonConnection.h"
 #include "tessaly/QVLog.h"
 #include "tessaly/QVPhysicalURL.h"
+#include "tessaly/QVQueryItem.h"
 
 namespace droxa {
 
@@ -32,6 +33,12 @@ class DaemonItems final : public NSUbiquitousItemProviding {
     return daemon->error();
   }
   bool isDataless(const NSURL &url) override { return qv_isDataless(url); }
+
+  bool isShared(const NSURL &url, bool *value, NSError *error) override {
+    const auto item = QVQueryItem::askDaemonQueryItemForURL(url, false, error);
+    if (item) *value = item->fields().isShared;
+    return item != nullptr;
+  }
 
   // Beside the daemon's own temporaries: nothing there is shown to anybody, and the daemon clears it away.
   NSURL itemReplacementDirectoryForURL(const NSURL &url) override {

@@ -14,7 +14,8 @@ inline constexpr char QVPrivateStorageName[] = ".droxa-private";
 inline constexpr char QVActionsFolderName[] = "actions";
 
 // Makes the daemon this process's sync service: NSFileManager evicts through it, and the reachability of a
-// URL counts dataless documents out. May be called again. Any thread.
+// URL counts dataless documents out. Whether an item is shared is asked of the daemon. May be called again.
+// Any thread.
 void QVInstallUbiquitousItemProvider();
 
 }  // namespace droxa

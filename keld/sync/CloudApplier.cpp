@@ -40,7 +40,7 @@ std::string DigestOfFile(int descriptor) {
 }
 
 CloudApplier::CloudApplier(const SyncContext &context, ConflictCopies &conflicts)
-    : context_(context), conflicts_(conflicts) {}
+    : context_(context), conflicts_(conflicts), shares_(context.store, context.states) {}
 
 NSError CloudApplier::fetchAndApply(const CKCallContext &call) {
   undoUnfinished();
@@ -57,6 +57,7 @@ bool CloudApplier::hasFetchedAll() {
 void CloudApplier::beginFetchOfAll() {
   fetchesAll_ = true;
   seen_.clear();
+  seenShares_.clear();
   context_.store.setText(kToken, "");
   context_.store.setNumber(kFetchesAll, 1);
 }
@@ -95,7 +96,7 @@ NSError CloudApplier::fetchPages(const CKCallContext &call) {
 NSError CloudApplier::applyPage(const CKZoneChanges &page) {
   std::vector<DocumentRecord> documents;
   for (const CKRecord &record : page.changedRecords) {
-    if (record.recordType == CKRecordTypeShare) continue;  // is no item
+    if (record.recordType == CKRecordTypeShare) continue;  // is no item: noteShares()
     // One that makes no sense isn't one that was deleted.
     if (fetchesAll_) seen_.insert(record.recordID.recordName);
     auto document = ReadRecord(record);
@@ -113,9 +114,12 @@ NSError CloudApplier::applyPage(const CKZoneChanges &page) {
   beginUnfinished(documents);
   context_.store.transaction([&] {
     applyAll(documents);
-    for (const CKDeletedRecord &deleted : page.deletedRecords) remove(deleted.recordID.recordName);
+    noteShares(page);
+    for (const CKDeletedRecord &deleted : page.deletedRecords)
+      if (deleted.recordType != CKRecordTypeShare) remove(deleted.recordID.recordName);
     if (endsAll) {
       removeUnseen();
+      shares_.forgetUnseen(DriveZone(), seenShares_);
       context_.store.setNumber(kFetchesAll, 0);
     }
     if (!page.moreComing) removeFolders();
@@ -127,9 +131,24 @@ NSError CloudApplier::applyPage(const CKZoneChanges &page) {
   if (endsAll) {
     fetchesAll_ = false;
     seen_.clear();
+    seenShares_.clear();
   }
   finishBatch();
   return NSError();
+}
+
+void CloudApplier::noteShares(const CKZoneChanges &page) {
+  for (const CKRecord &record : page.changedRecords) {
+    if (record.recordType != CKRecordTypeShare) continue;
+    if (fetchesAll_) seenShares_.insert(record.recordID.recordName);
+    if (const auto share = CKShare::shareWithRecord(record))
+      shares_.note(*share);
+    else
+      os_log_error(qvc_default_log(), "[ERROR] the cloud's share %s makes no sense and is left alone",
+                   record.recordID.recordName);
+  }
+  for (const CKDeletedRecord &deleted : page.deletedRecords)
+    if (deleted.recordType == CKRecordTypeShare) shares_.forget(deleted.recordID);
 }
 
 // What the cloud doesn't have any more was deleted while nobody could tell. A cloud that has nothing at all
@@ -273,7 +292,8 @@ void CloudApplier::apply(const DocumentRecord &document) {
   if (row && row->hasNewer() && row->newerTag == document.tag && context_.files.item(row->item) &&
       !context_.store.queued(row->item))
     return;
-  if (row && isOwnSaveOfDead(document, *row)) return followOwnSave(document, std::move(*row));
+  if (row && (isOwnSaveOfDead(document, *row) || isKnownOfDead(document, *row)))
+    return followOwnSave(document, std::move(*row));
   Place place;
   if (!openPlace(document.parent, &place)) {
     waitForPlace(document);
@@ -303,6 +323,15 @@ bool CloudApplier::isOwnSaveOfDead(const DocumentRecord &document, const SyncRow
     return false;
   return document.content.digest == row.content.digest ||
          context_.store.wasSent(document.record, document.content.digest);
+}
+
+// Whether the record says no more of an item that is gone here than was known when it was deleted: it was
+// given a thumbnail.
+bool CloudApplier::isKnownOfDead(const DocumentRecord &document, const SyncRow &row) {
+  return row.item != 0 && !row.tag.empty() && !row.hasNewer() &&
+         document.kind == NSFileProviderItemKind::document && document.parent == row.parent &&
+         document.name == row.name && document.content == row.content && document.metadata == row.metadata &&
+         !context_.files.item(row.item);
 }
 
 // Nobody has changed it elsewhere, so that the deletion is newer and is to be sent. It isn't brought back.

@@ -8,6 +8,7 @@
 
 #include "keld/sync/ConflictCopies.h"
 #include "keld/sync/DocumentRecord.h"
+#include "keld/sync/KnownShares.h"
 #include "keld/sync/SyncContext.h"
 
 namespace droxa::keld {
@@ -43,6 +44,7 @@ class CloudApplier {
 
   NSError fetchPages(const CKCallContext &call);
   NSError applyPage(const CKZoneChanges &page);
+  void noteShares(const CKZoneChanges &page);
   void applyAll(const std::vector<DocumentRecord> &documents);
   NSError fetchAgain(const CKCallContext &call);
   void applyFetched(const std::vector<CKRecordResult> &results);
@@ -61,6 +63,7 @@ class CloudApplier {
   void findLink(SyncRow *row);
   void waitForPlace(const DocumentRecord &document);
   bool isOwnSaveOfDead(const DocumentRecord &document, const SyncRow &row);
+  bool isKnownOfDead(const DocumentRecord &document, const SyncRow &row);
   void followOwnSave(const DocumentRecord &document, SyncRow row);
   bool openPlace(const std::string &parentRecord, Place *place);
 
@@ -104,6 +107,7 @@ class CloudApplier {
 
   const SyncContext &context_;
   ConflictCopies &conflicts_;
+  KnownShares shares_;
   std::vector<std::string> touched_;          // paths that the keeper is to look at
   std::map<std::string, PutBack> early_;      // by the names in the trash, until the folder is known
   std::vector<std::string> foldersToRemove_;  // records
@@ -111,7 +115,7 @@ class CloudApplier {
   std::function<bool()> isSameCloud_;
   bool isReplicaSeen_ = false;
   bool fetchesAll_ = false;
-  std::set<std::string> seen_;  // while everything is fetched anew
+  std::set<std::string> seen_, seenShares_;  // while everything is fetched anew
 };
 
 // SHA-256 of an open file, in hexadecimal; "" when it can't be read.

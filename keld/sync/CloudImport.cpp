@@ -9,9 +9,11 @@
 #include <utility>
 
 #include "keld/FolderReading.h"
+#include "keld/TypeIdentifiers.h"
 #include "keld/sync/AssetUploads.h"
 #include "keld/sync/DocumentRecord.h"
 #include "keld/sync/ReplicaFiles.h"
+#include "keld/thumbnails/ThumbnailTypes.h"
 #include "platform/cloudkit/CKDigest.h"
 #include "tessaly/NSURL+Tessaly.h"
 #include "tessaly/QVContainer.h"
@@ -34,8 +36,8 @@ std::string recordFor(const std::string &path) {
 class Import {
  public:
   Import(CKCloud &cloud, const std::vector<std::string> &except,
-         const std::function<void(const ImportReport &)> &progress)
-      : cloud_(cloud), progress_(progress) {
+         const std::function<void(const ImportReport &)> &progress, const ThumbnailsWanted &thumbnailsWanted)
+      : cloud_(cloud), progress_(progress), thumbnailsWanted_(thumbnailsWanted) {
     for (const std::string &path : except) {
       struct stat status = {};
       if (::stat(path.c_str(), &status) == 0) except_.emplace(status.st_dev, status.st_ino);
@@ -48,6 +50,7 @@ class Import {
       report_.error = NSError::errorWithPOSIXCode(errno, root);
       return report_;
     }
+    root_ = root;
     report_.error = cloud_.saveZone(DriveZone(), CKCallContext());
     if (!report_.error) readFolder(folder.get(), "", ContainerRecord(QVUbiquitousDefaultContainerID));
     if (!report_.error) flush();
@@ -117,6 +120,8 @@ class Import {
     document.content.digest = sent.digest;
     ++report_.documents;
     report_.bytes += facts.size;
+    if (thumbnailsWanted_ && facts.size > 0 && CanMakeThumbnailOfType(TypeIdentifierForName(document.name)))
+      wanted_.push_back({document.record, sent.digest, root_ + "/" + path, LocalFileOf(facts)});
     save(MakeRecordWithContent(document));
   }
 
@@ -132,6 +137,8 @@ class Import {
     if (!request.recordsToSave.empty()) {
       const CKModifyReply reply = cloud_.modifyRecords(request, CKCallContext());
       if (reply.error && !CKErrorIs(reply.error, CKErrorCode::partialFailure)) report_.error = reply.error;
+      if (!report_.error && !wanted_.empty()) thumbnailsWanted_(wanted_);
+      wanted_.clear();
       for (const CKRecordResult &result : reply.saved) {
         // What is there already came with an earlier run, and may have been changed since.
         const bool isThere = CKErrorIs(result.error, CKErrorCode::serverRecordChanged);
@@ -149,16 +156,20 @@ class Import {
   CKCloud &cloud_;
   std::set<std::pair<dev_t, ino_t>> except_;
   const std::function<void(const ImportReport &)> &progress_;
+  const ThumbnailsWanted &thumbnailsWanted_;
+  std::string root_;
   ImportReport report_;
   std::vector<CKRecord> waiting_;
+  std::vector<WantedThumbnail> wanted_;  // of the records that wait
 };
 
 }  // namespace
 
 ImportReport ImportIntoCloud(CKCloud &cloud, const std::string &folder,
                              const std::vector<std::string> &except,
-                             const std::function<void(const ImportReport &)> &progress) {
-  return Import(cloud, except, progress).run(folder);
+                             const std::function<void(const ImportReport &)> &progress,
+                             const ThumbnailsWanted &thumbnailsWanted) {
+  return Import(cloud, except, progress, thumbnailsWanted).run(folder);
 }
 
 }  // namespace droxa::keld

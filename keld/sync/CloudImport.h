@@ -5,6 +5,7 @@
 #include <string>
 #include <vector>
 
+#include "keld/sync/SyncStore.h"
 #include "platform/cloudkit/CKCloud.h"
 
 namespace droxa::keld {
@@ -17,11 +18,16 @@ struct ImportReport {
   NSError error;                      // why the import ended early; nil when it didn't
 };
 
+// Told of documents that are in the cloud now and are to have thumbnails, with the files to make them of.
+using ThumbnailsWanted = std::function<void(const std::vector<WantedThumbnail> &wanted)>;
+
 // Puts everything below a folder into the cloud, as the contents of the default container. The folder is only
 // read, and what lies in one of the `except` folders isn't. Done again after it was cut short, it goes on:
-// what is in the cloud already stays as it is. Blocks; `progress` is called on the calling thread.
+// what is in the cloud already stays as it is. Thumbnails aren't made here, since they take longer than all
+// the rest. Blocks; both functions are called on the calling thread.
 ImportReport ImportIntoCloud(CKCloud &cloud, const std::string &folder,
                              const std::vector<std::string> &except,
-                             const std::function<void(const ImportReport &)> &progress);
+                             const std::function<void(const ImportReport &)> &progress,
+                             const ThumbnailsWanted &thumbnailsWanted = nullptr);
 
 }  // namespace droxa::keld

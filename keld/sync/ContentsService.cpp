@@ -94,6 +94,15 @@ std::vector<ItemRecord> ContentsService::documentsBelow(
 // --- Downloads.
 
 void ContentsService::startDownloadAtURL(const NSURL &url, std::uint64_t options, QVTransferReply reply) {
+  if ((options & QVDownloadCurrentVersion) == 0) return startDownload(url, options, std::move(reply));
+  engine_->fetchNow(
+      [self = shared_from_this(), url, options, reply = std::move(reply)](const NSError &error) {
+        if (error) return reply(nullptr, error);
+        self->startDownload(url, options, reply);
+      });
+}
+
+void ContentsService::startDownload(const NSURL &url, std::uint64_t options, QVTransferReply reply) {
   const auto priority = (options & QVDownloadForReader) != 0      ? DownloadPriority::reader
                         : (options & QVDownloadInBackground) != 0 ? DownloadPriority::background
                                                                   : DownloadPriority::asked;

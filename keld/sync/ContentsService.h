@@ -42,6 +42,7 @@ class ContentsService final : public QVContentsProtocol,
   using Found = std::function<void(const ItemRecord *item, const NSError &error)>;
   // Finds the item at the URL, looking on disk where it isn't known. `found` comes once, on any thread.
   void find(const NSURL &url, Found found);
+  void startDownload(const NSURL &url, std::uint64_t options, QVTransferReply reply);
   std::optional<ItemRecord> known(const std::string &path, NSError *error);
   // Calls `each` with what is below the folder, and with nothing for another item.
   void forEachBelow(const ItemRecord &item, const std::function<void(ItemRecord &child)> &each);

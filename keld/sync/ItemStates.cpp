@@ -33,20 +33,28 @@ void ItemStates::show(const ItemState &state) {
   if (isMany) flush();
 }
 
+void ItemStates::showShared(ItemNumber item, bool isShared) {
+  const Lock lock(mutex_);
+  shared_[item] = isShared;
+}
+
 void ItemStates::flush(std::function<void()> done) {
   std::vector<ItemState> states;
+  std::map<ItemNumber, bool> shared;
   {
     const Lock lock(mutex_);
     states.swap(states_);
+    shared.swap(shared_);
   }
   Keeper *keeper = keeper_();
   if (!done) {
-    if (states.empty()) return;
+    if (states.empty() && shared.empty()) return;
     done = [] {};
   }
   if (!keeper) return done();
   keeper->perform(
-      [states = std::move(states)](Reconciler &reconciler, ItemQueries &queries, ItemEdits &) {
+      [states = std::move(states), shared = std::move(shared)](Reconciler &reconciler, ItemQueries &queries,
+                                                               ItemEdits &) {
         // The table has to know the files that the states are of.
         for (const ItemState &state : states) {
           const auto record = state.hasFile ? queries.byID(state.item) : std::nullopt;
@@ -57,6 +65,7 @@ void ItemStates::flush(std::function<void()> done) {
         }
         reconciler.settle();
         for (const ItemState &state : states) apply(state, reconciler, queries);
+        for (const auto &[item, isShared] : shared) reconciler.setShared(item, isShared);
       },
       std::move(done));
 }

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <functional>
+#include <map>
 #include <vector>
 
 #include "keld/Keeper.h"
@@ -25,6 +26,8 @@ class ItemStates {
   explicit ItemStates(std::function<Keeper *()> keeper) : keeper_(std::move(keeper)) {}
 
   void show(const ItemState &state);
+  // Whether the item is the root of a share.
+  void showShared(ItemNumber item, bool isShared);
   // Hands over what was collected; `done` is called on the pool when that, and what was handed over before,
   // is committed.
   void flush(std::function<void()> done = nullptr);
@@ -36,6 +39,7 @@ class ItemStates {
   const std::function<Keeper *()> keeper_;
   Mutex mutex_;
   std::vector<ItemState> states_ GUARDED_BY(mutex_);
+  std::map<ItemNumber, bool> shared_ GUARDED_BY(mutex_);
 };
 
 }  // namespace droxa::keld

@@ -195,6 +195,8 @@ void LocalExaminer::examineLive(const ItemRecord &item) {
     if (!bind(item, parent)) queue(item.id, false);
     return;
   }
+  const bool isShared = store_.shareOfRoot(row->record).has_value();
+  if (isShared != ((item.flags & kSharedFlag) != 0)) states_.showShared(item.id, isShared);
   if (isClean(item, *row, parent)) {
     store_.dropQueued(item.id);
     const std::uint32_t wanted = (row->isDataless ? kDatalessFlag : 0U) | kUploadedFlag;

@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "tessaly/QVContainer.h"
+#include "tessaly/QVErrors.h"
 
 namespace droxa::keld {
 
@@ -18,7 +19,8 @@ constexpr std::chrono::seconds kLongestWait{30};
 constexpr std::chrono::milliseconds kBetween{2};
 }  // namespace
 
-NSError WaitUntilReplicaIsSeen(const std::string &replicaPath, const ReplicaFiles::Read &read) {
+NSError WaitUntilReplicaIsSeen(const std::string &replicaPath, const ReplicaFiles::Read &read,
+                               const std::function<bool()> &isGivenUp) {
   static std::atomic<std::uint64_t> last{0};
   const std::string mark = std::string(QVUbiquitousDefaultContainerID) + "/.mark-" +
                            std::to_string(::getpid()) + "-" + std::to_string(++last);
@@ -32,7 +34,9 @@ NSError WaitUntilReplicaIsSeen(const std::string &replicaPath, const ReplicaFile
   NSError problem;
   while (!isSeen && !problem && std::chrono::steady_clock::now() < end) {
     problem = read([&](ItemQueries &queries) { isSeen = queries.byPathBelowReplica(mark).has_value(); });
-    if (!isSeen) std::this_thread::sleep_for(kBetween);
+    if (!isSeen && isGivenUp && isGivenUp())
+      problem = qvc_error(QVErrorCancelled, "nobody waits for it any more");
+    if (!isSeen && !problem) std::this_thread::sleep_for(kBetween);
   }
   ::unlink(path.c_str());
   if (problem || isSeen) return problem;

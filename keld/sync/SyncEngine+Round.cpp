@@ -18,7 +18,6 @@ constexpr std::chrono::milliseconds kCallTimeout{60'000};
 constexpr std::chrono::milliseconds kNoPause{0}, kFirstAgain{25}, kLongestAgain{5'000};
 constexpr std::uint64_t kVersionsAtATime = 1000;
 constexpr std::chrono::milliseconds kScanPoll{100};
-constexpr char kCloudIdentifier[] = "cloudIdentifier";
 
 }  // namespace
 
@@ -45,6 +44,7 @@ void SyncEngine::run() {
     } catch (const SqlError &error) {
       os_log_fault(qvc_default_log(), "[CRIT] the sync's database failed: %s", error.what());
       noteCloudProblem(fetching, qvc_error(QVErrorDatabase, error.what()));
+      answerFetches(qvc_error(QVErrorDatabase, error.what()));
     }
     waitForWork();
   }
@@ -63,6 +63,8 @@ void SyncEngine::round() {
     // What they wait for is examined now, and not before.
     for (Waiter &waiter : waiters_) waiting_.push_back(std::move(waiter));
     waiters_.clear();
+    for (auto &fetch : fetches_) fetching_.push_back(std::move(fetch));
+    fetches_.clear();
   }
   moreIsDue_ = false;
   // Asked for first: what it has seen by then is in the feed.
@@ -72,12 +74,14 @@ void SyncEngine::round() {
   if (isReplicaSeen) afterFirstScan();
   for (const auto &task : work) task();
   if (!isSignedIn || !prepareCloud()) {
+    answerFetches(isSignedIn ? problems_[fetching] : qvc_errorLoggedOut());
     answerWaiters();
     return;
   }
   const bool isPoll = std::chrono::steady_clock::now() >= nextPoll_;
   const std::uint64_t applied = applier_.applied();
   if (fetches) fetch();
+  if (fetches) answerFetches(problems_[fetching]);
   if (isPoll) bringBackUnseen();
   // What is new here may be known there, until all of that was seen.
   if (applier_.hasFetchedAll()) {
@@ -120,7 +124,7 @@ void SyncEngine::afterFirstScan() {
 }
 
 bool SyncEngine::isSameCloud() {
-  const std::string known = store_.text(kCloudIdentifier);
+  const std::string known = store_.text(kSyncCloudIdentifier);
   return known.empty() || cloud_->cloudIdentifier().description() == known;
 }
 
@@ -133,7 +137,7 @@ bool SyncEngine::prepareCloud() {
     return false;
   }
   // Each time: it may have been replaced while this runs.
-  const std::string known = store_.text(kCloudIdentifier);
+  const std::string known = store_.text(kSyncCloudIdentifier);
   if (!known.empty() && known != text) {
     noteCloudProblem(fetching,
                      CKErrorMake(CKErrorCode::invalidArguments,
@@ -142,7 +146,7 @@ bool SyncEngine::prepareCloud() {
     return false;
   }
   if (isCloudReady_) return true;
-  if (known.empty()) store_.setText(kCloudIdentifier, text);
+  if (known.empty()) store_.setText(kSyncCloudIdentifier, text);
   const NSError problem = cloud_->saveZone(DriveZone(), call(kCallTimeout));
   if (problem) {
     noteCloudProblem(fetching, problem);
@@ -216,6 +220,14 @@ void SyncEngine::startWaitingVersions() {
     if (row.item != 0) downloads_->fetchInBackground(row.item, row.newer.size);
 }
 
+void SyncEngine::answerFetches(const NSError &error) {
+  // A fetch that was cut off by the end is told as the end.
+  const bool isEnd = stopping_->isCancelled();
+  const NSError told = isEnd ? qvc_error(QVErrorShuttingDown, "the daemon is shutting down") : error;
+  for (auto &done : std::exchange(fetching_, {}))
+    dispatch_async_global([done = std::move(done), told] { done(told); });
+}
+
 void SyncEngine::answerWaiters() {
   if (waiting_.empty()) return;
   std::vector<Waiter> waiters = std::exchange(waiting_, {});
@@ -232,6 +244,8 @@ void SyncEngine::answerWaiters() {
       if (upload.isHeld)
         failure = qvc_error(QVErrorUnsentChanges, "deletions wait for an answer: droxa deletions");
     }
+    if (waiter.cancellation && waiter.cancellation->isCancelled())
+      failure = qvc_error(QVErrorCancelled, "nobody waits for it any more");
     if (isWaiting && !failure) {
       waiting_.push_back(std::move(waiter));
       continue;

@@ -69,6 +69,7 @@ SyncEngine::SyncEngine(const std::string &replicaPath, const std::string &databa
   downloads_->setRetryHandler([this] { itemsChanged(); });
   examiner_.setBoundHandler([this](ItemNumber item, const SyncRow &row) {
     if (row.isDataless && isPinnedOrBelowPin(item)) downloads_->fetchInBackground(item, row.content.size);
+    if (!row.content.digest.empty()) thumbnails_->lookAgain();
   });
   examiner_.setReplicaCheck([this] { return isReplicaItself(); });
   applier_.setCloudCheck([this] { return isSameCloud(); });
@@ -118,12 +119,15 @@ void SyncEngine::stop() {
   {
     const Lock lock(mutex_);
     waiters.swap(waiters_);
+    for (auto &fetch : fetches_) fetching_.push_back(std::move(fetch));
+    fetches_.clear();
   }
   for (Waiter &waiter : waiting_) waiters.push_back(std::move(waiter));
   waiting_.clear();
   const NSError error = qvc_error(QVErrorShuttingDown, "the daemon is shutting down");
   for (Waiter &waiter : waiters)
     dispatch_async_global([done = std::move(waiter.done), error] { done(error); });
+  answerFetches(error);
 }
 
 // Another folder in the replica's place has none of its documents, and nobody has deleted them. The folder is
@@ -181,6 +185,25 @@ void SyncEngine::itemsChanged() {
   const Lock lock(mutex_);
   hasLocalNews_ = true;
   wake_.notify_all();
+}
+
+void SyncEngine::cloudChanged() {
+  const Lock lock(mutex_);
+  hasCloudNews_ = true;
+  wake_.notify_all();
+}
+
+void SyncEngine::fetchNow(std::function<void(const NSError &)> done) {
+  {
+    const Lock lock(mutex_);
+    if (!stop_) {
+      fetches_.push_back(std::move(done));
+      hasCloudNews_ = true;
+      wake_.notify_all();
+      return;
+    }
+  }
+  done(qvc_error(QVErrorShuttingDown, "the daemon is shutting down"));
 }
 
 void SyncEngine::setSignedIn(bool isSignedIn) {
@@ -250,12 +273,13 @@ ContentsResult SyncEngine::keepBoth(const FileLocation &location, PreparedFile &
   return result;
 }
 
-void SyncEngine::whenUploaded(std::vector<ItemNumber> items, std::function<void(const NSError &)> done) {
+void SyncEngine::whenUploaded(std::vector<ItemNumber> items, std::function<void(const NSError &)> done,
+                              std::shared_ptr<const CKCancellation> cancellation) {
   {
     const Lock lock(mutex_);
     if (!stop_) {
       const bool isAll = items.empty();
-      waiters_.push_back({std::move(items), isAll, std::move(done)});
+      waiters_.push_back({std::move(items), isAll, std::move(done), std::move(cancellation)});
       hasLocalNews_ = true;
       wake_.notify_all();
       return;

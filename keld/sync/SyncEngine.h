@@ -27,6 +27,7 @@ struct SyncOptions {
   // The cloud that the drive is in; tests give one of their own. Null: EmbeddedCloud in `cloudFolder`.
   std::shared_ptr<CKCloud> cloud;
   std::string cloudFolder;  // "": the folder "cloud" of the home
+  std::string account;      // whose drive it is; "": as before, else who runs the process
   std::string device;       // "": the machine's name, and the home's where it isn't the usual one
   DeletionGuard deletionGuard;
   DownloadOptions downloads;
@@ -50,6 +51,9 @@ class SyncEngine {
   void stop();
 
   void itemsChanged();  // there is something new in the feed
+  void cloudChanged();  // this daemon itself has changed something there
+  // Fetches the cloud's changes and applies them; `done` (on the pool) tells how that went, once.
+  void fetchNow(std::function<void(const NSError &error)> done);
   void setSignedIn(bool isSignedIn);
 
   SyncStore &store() { return store_; }
@@ -66,8 +70,10 @@ class SyncEngine {
   // The same, and returns when it was run; false when it wasn't. Not to be called on the sync's thread.
   bool performAndWait(std::function<void()> work);
   // Calls `done` (on the pool) when nothing of `items` (empty: nothing at all) waits to be sent any more, or
-  // with why one of them can't be.
-  void whenUploaded(std::vector<ItemNumber> items, std::function<void(const NSError &error)> done);
+  // with why one of them can't be. Once `cancellation` (may be null) is cancelled nobody waits any more:
+  // `done` is called with QVErrorCancelled at the latest in the next round.
+  void whenUploaded(std::vector<ItemNumber> items, std::function<void(const NSError &error)> done,
+                    std::shared_ptr<const CKCancellation> cancellation = nullptr);
   void answerDeletions(bool carryOut);
   // A person asked for the deletion of these, which is about to be done.
   void announceDeletions(const std::vector<ItemNumber> &items);
@@ -86,6 +92,7 @@ class SyncEngine {
     std::vector<ItemNumber> items;
     bool isAll = false;
     std::function<void(const NSError &)> done;
+    std::shared_ptr<const CKCancellation> cancellation;
   };
 
   void run();
@@ -104,6 +111,7 @@ class SyncEngine {
   enum Direction { fetching, sending };
   void noteCloudProblem(Direction direction, const NSError &error);
   void answerWaiters();
+  void answerFetches(const NSError &error);
   void startWaitingVersions();
   void bringBackUnseen();
   void waitForWork();
@@ -132,7 +140,8 @@ class SyncEngine {
   bool isCloudReady_ = false;
   bool moreIsDue_ = false;
   std::vector<Waiter> waiting_;
-  std::set<std::string> unbound_;  // records at the last poll
+  std::vector<std::function<void(const NSError &)>> fetching_;  // who is to be told of the fetch
+  std::set<std::string> unbound_;                               // records at the last poll
   std::chrono::milliseconds retryPause_{0};
   std::chrono::steady_clock::time_point pauseEnd_;  // after the last problem
   std::chrono::milliseconds againPause_{0};         // before what couldn't be applied is fetched again
@@ -148,6 +157,7 @@ class SyncEngine {
   bool hasCloudNews_ GUARDED_BY(mutex_) = true;
   std::vector<std::function<void()>> work_ GUARDED_BY(mutex_);
   std::vector<Waiter> waiters_ GUARDED_BY(mutex_);  // asked since the round began
+  std::vector<std::function<void(const NSError &)>> fetches_ GUARDED_BY(mutex_);  // likewise
   std::string cloudProblem_ GUARDED_BY(mutex_);
   TransferRate uploadRate_ GUARDED_BY(mutex_);
   std::thread thread_;

@@ -83,6 +83,21 @@ constexpr char kMeantUntil[] = R"sql(
 ALTER TABLE meant ADD COLUMN until INTEGER NOT NULL DEFAULT 1;
 )sql";
 
+// Shares. Those that were made before this device looked at them have been passed over, so that everything
+// is read once more.
+constexpr char kShares[] = R"sql(
+CREATE TABLE shares(
+  zone TEXT NOT NULL,
+  zoneOwner TEXT NOT NULL,
+  record TEXT NOT NULL,
+  root TEXT NOT NULL,
+  owner TEXT NOT NULL,
+  PRIMARY KEY(zone, zoneOwner, record)
+) WITHOUT ROWID;
+CREATE INDEX shares_root ON shares(root);
+DELETE FROM meta WHERE key = 'changeToken';
+)sql";
+
 // Thumbnails that are still to be made.
 constexpr char kThumbnails[] = R"sql(
 CREATE TABLE thumbnails(
@@ -96,7 +111,7 @@ CREATE TABLE thumbnails(
 )sql";
 
 // Each step leads from the version of its place to the next; version 0 is an empty database.
-constexpr const char *kSteps[] = {kTables, kUnfinished, kMeant, kMeantUntil, kThumbnails};
+constexpr const char *kSteps[] = {kTables, kUnfinished, kMeant, kMeantUntil, kShares, kThumbnails};
 
 }  // namespace
 

@@ -11,10 +11,14 @@
 
 #include "keld/ItemRecord.h"
 #include "keld/Sql.h"
+#include "platform/cloudkit/CKRecordID.h"
 #include "platform/foundation/NSError.h"
 #include "platform/foundation/ThreadSafety.h"
 
 namespace droxa::keld {
+
+// The key of the text that tells which cloud the drive is in; "" before it met one.
+inline constexpr char kSyncCloudIdentifier[] = "cloudIdentifier";
 
 // What a document's contents are, as the cloud tells them.
 struct ContentVersion {
@@ -70,6 +74,14 @@ struct QueuedUpload {
 struct UnfinishedRecord {
   std::string record, parent, name;
   NSFileProviderItemKind kind = NSFileProviderItemKind::document;
+};
+
+// A share that this account sees: the zone that it is in, and the record that it shares with all below it.
+struct KnownShare {
+  CKRecordID record;
+  std::string root;   // its record's name
+  std::string owner;  // the account's name; "" when the share didn't tell
+  bool operator==(const KnownShare &) const = default;
 };
 
 // A document that is to have a thumbnail, once its record has exactly these contents.
@@ -132,6 +144,13 @@ class SyncStore {
   std::optional<UnfinishedRecord> unfinished(const std::string &record);
   void forgetUnfinished();  // all
 
+  // Shares, as the feeds of changes tell them.
+  void putShare(const KnownShare &share);
+  void eraseShare(const CKRecordID &record);
+  std::optional<KnownShare> share(const CKRecordID &record);
+  std::optional<KnownShare> shareOfRoot(const std::string &root);
+  std::vector<KnownShare> shares();  // all
+
   // Contents whose save was begun, and may have been carried out without this device being told.
   void noteSent(const std::string &record, const std::string &digest);
   void forgetSent(const std::string &record);
@@ -192,6 +211,7 @@ class SyncStore {
   std::optional<SyncRow> one(SqlStatement &statement);
   std::vector<SyncRow> all(SqlStatement &statement);
   static std::vector<UnfinishedRecord> readUnfinished(SqlStatement &asked);
+  static std::vector<KnownShare> readShares(SqlStatement &asked);
   QueuedUpload readQueued(const SqlStatement &row);
   std::vector<QueuedUpload> queuedOf(SqlStatement &statement);
   SqlStatement &statement(const char *sql) REQUIRES(mutex_);

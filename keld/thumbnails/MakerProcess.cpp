@@ -69,7 +69,8 @@ std::string reasonOf(const MakerReply &reply, const MakerLimits &limits) {
     return "its thumbnail wasn't made within " + std::to_string(limits.wallMilliseconds) + " ms";
   if (WIFSIGNALED(reply.waitStatus)) {
     const int signal = WTERMSIG(reply.waitStatus);
-    if (signal == SIGXCPU || signal == SIGKILL)
+    if (signal == SIGKILL) return "its thumbnail's maker was killed, perhaps for want of memory";
+    if (signal == SIGXCPU)
       return "its thumbnail took more than " + std::to_string(limits.cpuSeconds) + " s of the processor";
     return std::string("its thumbnail's maker crashed (") + ::strsignal(signal) + ")";
   }
@@ -106,7 +107,7 @@ MakerProcess::~MakerProcess() {
 
 bool MakerProcess::hear(std::string *problem) {
   MakerHello hello;
-  const CKCancellation never;
+  const CKCancellation never{};
   const bool isThere = waitFor(socket_.get(), Clock::now() + kStartTimeout, never) == Wait::ready &&
                        ::recv(socket_.get(), &hello, sizeof hello, MSG_DONTWAIT) == sizeof hello &&
                        hello.version == kMakerVersion;

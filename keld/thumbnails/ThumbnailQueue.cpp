@@ -47,6 +47,7 @@ bool ThumbnailQueue::isFor(const std::string &name) const {
 std::vector<CKRecord> ThumbnailQueue::work(bool isPoll, const CKCallContext &call) {
   std::vector<CKRecord> newer = saveMade(call);
   if (!call.isCancelled()) startMore(isPoll);
+  restIfIdle();
   return newer;
 }
 
@@ -58,9 +59,17 @@ void ThumbnailQueue::stop() {
   while (jobs_ > 0) idle_.wait(mutex_);
 }
 
-void ThumbnailQueue::forget(const std::string &record) {
+void ThumbnailQueue::lookAgain() {
   const Lock lock(mutex_);
-  underWay_.erase(record);
+  looksAgain_ = true;
+}
+
+// If the record has other contents by now, what is wanted of those was passed over while this was under way.
+void ThumbnailQueue::forget(const WantedThumbnail &wanted) {
+  const auto row = context_.store.byRecord(wanted.record);
+  const Lock lock(mutex_);
+  underWay_.erase(wanted.record);
+  if (row && row->content.digest != wanted.digest) looksAgain_ = true;
 }
 
 // --- Saving. What can't be saved now waits here.
@@ -78,7 +87,7 @@ std::vector<CKRecord> ThumbnailQueue::saveMade(const CKCallContext &call) {
   for (Made &made : std::exchange(unsaved_, {})) {
     const auto row = context_.store.byRecord(made.wanted.record);
     if (!belongsTo(made, row)) {
-      forget(made.wanted.record);
+      forget(made.wanted);
       continue;
     }
     request.recordsToSave.push_back(MakeRecordWithThumbnail(row->record, row->tag, made.asset));
@@ -132,7 +141,7 @@ bool ThumbnailQueue::isSettled(const Made &made, const CKRecord &sent, const CKR
   if (!isGone && !isCollected)
     os_log_error(qvc_default_log(), "[ERROR] can't save the thumbnail of the record %s: %@", record,
                  result.error);
-  forget(record);
+  forget(made.wanted);
   return true;
 }
 
@@ -143,56 +152,53 @@ void ThumbnailQueue::saved(const Made &made, const std::string &sentTag, const C
     context_.store.put(*row);
   }
   context_.store.thumbnailSettled(made.wanted.record, made.wanted.digest);
-  forget(made.wanted.record);
+  forget(made.wanted);
 }
 
 // --- Making.
 
 void ThumbnailQueue::startMore(bool isPoll) {
   const std::uint64_t news = context_.store.thumbnailNews();
-  if (news == wantsSeen_ && !isPoll) return;
   std::size_t known = 0;
   {
     const Lock lock(mutex_);
+    if (news == wantsSeen_ && !isPoll && !std::exchange(looksAgain_, false)) return;
     if (stopped_ || isUnavailable_ || ready_.size() >= kAtATime / 2) return;
     known = underWay_.size();
   }
   if (isPoll) context_.store.dropStaleThumbnails();
   const auto due = context_.store.dueThumbnails(known + kAtATime);
   // With all that there was taken, only news are a reason to look again.
-  if (due.size() < known + kAtATime) wantsSeen_ = news;
+  wantsSeen_ = due.size() < known + kAtATime ? news : UINT64_MAX;
   const Lock lock(mutex_);
   for (const WantedThumbnail &wanted : due)
     if (underWay_.insert(wanted.record).second) ready_.push_back(wanted);
-  for (std::size_t jobs = jobs_; jobs < std::min<std::size_t>(mostJobs_, ready_.size() + jobs_); ++jobs) {
+  while (workers_ < mostJobs_ && workers_ < ready_.size()) {
+    ++workers_;
     ++jobs_;
     dispatch_async_global([self = shared_from_this()] { self->runJobs(); });
   }
 }
 
+std::optional<WantedThumbnail> ThumbnailQueue::next(bool *isMuchMade) {
+  const Lock lock(mutex_);
+  *isMuchMade = made_.size() >= kSavedAtATime;
+  if (ready_.empty()) {
+    --workers_;
+    return std::nullopt;
+  }
+  WantedThumbnail wanted = std::move(ready_.front());
+  ready_.pop_front();
+  return wanted;
+}
+
 void ThumbnailQueue::runJobs() {
-  for (;;) {
-    WantedThumbnail wanted;
-    bool isMuchMade = false, isLast = false;
-    {
-      const Lock lock(mutex_);
-      isLast = ready_.empty();
-      isMuchMade = made_.size() >= kSavedAtATime;
-      if (!isLast) {
-        wanted = std::move(ready_.front());
-        ready_.pop_front();
-      }
-    }
-    if (isLast || isMuchMade) wake_();
-    if (isLast) break;
-    runJob(wanted);
+  for (bool isMuchMade = false;;) {
+    const auto wanted = next(&isMuchMade);
+    if (!wanted || isMuchMade) wake_();
+    if (!wanted) break;
+    runJob(*wanted);
   }
-  bool isAtRest = false;
-  {
-    const Lock lock(mutex_);
-    isAtRest = jobs_ == 1;
-  }
-  if (isAtRest) thumbnailer_->rest();
   const Lock lock(mutex_);
   --jobs_;
   idle_.notify_all();
@@ -200,13 +206,25 @@ void ThumbnailQueue::runJobs() {
 
 void ThumbnailQueue::runJob(const WantedThumbnail &wanted) {
   Made made;
-  const End end = stopping_->isCancelled() ? End::later : make(wanted, &made);
-  if (end == End::never) context_.store.thumbnailSettled(wanted.record, wanted.digest);
+  End end = End::later;
+  try {
+    if (!stopping_->isCancelled()) end = make(wanted, &made);
+    if (end == End::never) context_.store.thumbnailSettled(wanted.record, wanted.digest);
+    if (end != End::made) forget(wanted);
+  } catch (const SqlError &error) {
+    os_log_error(qvc_default_log(), "[ERROR] the sync's database failed: %s", error.what());
+    end = End::later;
+  }
   const Lock lock(mutex_);
-  if (end == End::made)
-    made_.push_back(std::move(made));
-  else
-    underWay_.erase(wanted.record);
+  if (end == End::made) made_.push_back(std::move(made));
+}
+
+void ThumbnailQueue::restIfIdle() {
+  {
+    const Lock lock(mutex_);
+    if (workers_ > 0 || !ready_.empty()) return;
+  }
+  thumbnailer_->rest();
 }
 
 // The item's own file, or the source; none when neither has these contents any more.

@@ -6,6 +6,7 @@
 #include <deque>
 #include <functional>
 #include <memory>
+#include <optional>
 #include <set>
 #include <string>
 #include <vector>
@@ -34,6 +35,8 @@ class ThumbnailQueue : public std::enable_shared_from_this<ThumbnailQueue> {
   // Saves what was made, and has more made. Answers records that the cloud has in another state: they are to
   // be applied. `isPoll`: also looks for what nobody has told of.
   std::vector<CKRecord> work(bool isPoll, const CKCallContext &call);
+  // Something that wasn't there when wanted ones were looked for may be there now.
+  void lookAgain();
   void stop();  // returns when the jobs under way have ended, which is soon
 
  private:
@@ -49,12 +52,14 @@ class ThumbnailQueue : public std::enable_shared_from_this<ThumbnailQueue> {
   bool isSettled(const Made &made, const CKRecord &sent, const CKRecordResult &result,
                  std::vector<CKRecord> *newer);
   void startMore(bool isPoll);
+  std::optional<WantedThumbnail> next(bool *isMuchMade);
   void runJobs();
+  void restIfIdle();
   void runJob(const WantedThumbnail &wanted);
   End make(const WantedThumbnail &wanted, Made *made);
   OwnedDescriptor open(const WantedThumbnail &wanted, const SyncRow &row, LocalFile *file, std::string *name);
   OwnedDescriptor openSource(const WantedThumbnail &wanted, LocalFile *file) const;
-  void forget(const std::string &record);
+  void forget(const WantedThumbnail &wanted);
 
   const SyncContext &context_;
   const std::shared_ptr<Thumbnailer> thumbnailer_;
@@ -71,7 +76,9 @@ class ThumbnailQueue : public std::enable_shared_from_this<ThumbnailQueue> {
   std::deque<WantedThumbnail> ready_ GUARDED_BY(mutex_);
   std::set<std::string> underWay_ GUARDED_BY(mutex_);  // records: ready, being made, or made and not saved
   std::vector<Made> made_ GUARDED_BY(mutex_);
-  unsigned jobs_ GUARDED_BY(mutex_) = 0;
+  unsigned workers_ GUARDED_BY(mutex_) = 0;  // that take what is ready
+  unsigned jobs_ GUARDED_BY(mutex_) = 0;     // the same, until they have ended
+  bool looksAgain_ GUARDED_BY(mutex_) = false;
   bool isUnavailable_ GUARDED_BY(mutex_) = false;  // until the next start
   bool stopped_ GUARDED_BY(mutex_) = false;
 };

@@ -3,6 +3,7 @@
 #include <chrono>
 #include <cstdio>
 #include <ctime>
+#include <limits>
 
 namespace droxa {
 namespace {
@@ -21,6 +22,10 @@ NSDate NSDate::now() {
   const auto since1970 = std::chrono::system_clock::now().time_since_epoch();
   return dateWithNanosecondsSince1970(
       std::chrono::duration_cast<std::chrono::nanoseconds>(since1970).count());
+}
+
+NSDate NSDate::distantFuture() {
+  return dateWithNanosecondsSince1970(std::numeric_limits<std::int64_t>::max());
 }
 
 std::string NSDate::description() const {

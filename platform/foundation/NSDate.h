@@ -13,6 +13,8 @@ class NSDate {
   NSDate() = default;  // nil
   static NSDate dateWithNanosecondsSince1970(std::int64_t nanoseconds);
   static NSDate now();
+  // The last date that there is: what never expires expires then.
+  static NSDate distantFuture();
 
   explicit operator bool() const { return nanoseconds_.has_value(); }
   std::int64_t nanosecondsSince1970() const { return nanoseconds_.value_or(0); }

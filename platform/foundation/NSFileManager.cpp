@@ -6,6 +6,11 @@
 
 namespace droxa {
 
+bool NSUbiquitousItemProviding::isShared(const NSURL & /*url*/, bool *value, NSError * /*error*/) {
+  *value = false;
+  return true;
+}
+
 NSURL NSUbiquitousItemProviding::itemReplacementDirectoryForURL(const NSURL & /*url*/) {
   return {};
 }

@@ -20,6 +20,10 @@ class NSUbiquitousItemProviding {
   // Whether there is a document at `url` whose contents aren't here. Asks the file system alone.
   virtual bool isDataless(const NSURL &url) = 0;
 
+  // Whether the item at `url` is shared with other people, in `value`; false with `error` (may be null) set
+  // when that can't be told. May ask the service's daemon. Nothing is, unless the service says so.
+  virtual bool isShared(const NSURL &url, bool *value, NSError *error);
+
   // The folder where work on the item at `url` may be prepared: on the same file system, unseen by others,
   // and there already. nil: beside the item, under a hidden name.
   virtual NSURL itemReplacementDirectoryForURL(const NSURL &url);

@@ -18,14 +18,25 @@ std::shared_ptr<NSProgress> NSProgress::progressWithTotalUnitCount(std::int64_t 
   return progress;
 }
 
+void NSProgress::tell(const std::shared_ptr<const Handlers> &handlers) {
+  if (!handlers) return;
+  for (const auto &handler : *handlers) handler();
+}
+
 std::int64_t NSProgress::totalUnitCount() const {
   const Lock lock(mutex_);
   return total_;
 }
 
 void NSProgress::setTotalUnitCount(std::int64_t count) {
-  const Lock lock(mutex_);
-  total_ = count;
+  std::shared_ptr<const Handlers> handlers;
+  {
+    const Lock lock(mutex_);
+    if (total_ == count) return;
+    total_ = count;
+    handlers = changeHandlers_;
+  }
+  tell(handlers);
 }
 
 std::int64_t NSProgress::completedUnitCount() const {
@@ -34,8 +45,21 @@ std::int64_t NSProgress::completedUnitCount() const {
 }
 
 void NSProgress::setCompletedUnitCount(std::int64_t count) {
+  std::shared_ptr<const Handlers> handlers;
+  {
+    const Lock lock(mutex_);
+    if (completed_ == count) return;
+    completed_ = count;
+    handlers = changeHandlers_;
+  }
+  tell(handlers);
+}
+
+void NSProgress::addChangeHandler(std::function<void()> handler) {
   const Lock lock(mutex_);
-  completed_ = count;
+  auto handlers = changeHandlers_ ? *changeHandlers_ : Handlers();
+  handlers.push_back(std::move(handler));
+  changeHandlers_ = std::make_shared<const Handlers>(std::move(handlers));
 }
 
 bool NSProgress::isCancellable() const {

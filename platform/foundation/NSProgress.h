@@ -3,6 +3,7 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <vector>
 
 #include "platform/foundation/ThreadSafety.h"
 
@@ -10,7 +11,8 @@ namespace droxa {
 
 // How far a piece of work has come, and the way to stop it. Work that can be watched takes the progress that
 // is current on the thread that begins it. Thread contract: any thread; the cancellation handler runs on the
-// thread that cancels, once, and without a lock held.
+// thread that cancels, once, and without a lock held; those who watch are told on the thread that changed it,
+// without a lock held.
 class NSProgress final {
  public:
   NSProgress() = default;
@@ -23,8 +25,10 @@ class NSProgress final {
   void setTotalUnitCount(std::int64_t count);
   std::int64_t completedUnitCount() const;
   void setCompletedUnitCount(std::int64_t count);
+  // Called after each change of a count, for as long as this lives.
+  void addChangeHandler(std::function<void()> handler);
 
-  // Whether cancelling it stops anything; for those who offer that to people.
+  // Whether cancelling makes sense, for who shows it; cancel() doesn't ask.
   bool isCancellable() const;
   void setCancellable(bool isCancellable);
   void cancel();
@@ -36,10 +40,15 @@ class NSProgress final {
   static std::shared_ptr<NSProgress> currentProgress();
 
  private:
+  using Handlers = std::vector<std::function<void()>>;
+
+  static void tell(const std::shared_ptr<const Handlers> &handlers);
+
   mutable Mutex mutex_;
+  std::shared_ptr<const Handlers> changeHandlers_ GUARDED_BY(mutex_);  // null: none
+  bool isCancellable_ GUARDED_BY(mutex_) = true;
   std::int64_t total_ GUARDED_BY(mutex_) = -1;
   std::int64_t completed_ GUARDED_BY(mutex_) = 0;
-  bool isCancellable_ GUARDED_BY(mutex_) = true;
   bool isCancelled_ GUARDED_BY(mutex_) = false;
   std::function<void()> cancellationHandler_ GUARDED_BY(mutex_);
 };

@@ -94,6 +94,9 @@ bool checkResourceIsReachableAndReturnError(const NSURL &url, NSError *error) {
 }
 
 bool getResourceValue(const NSURL &url, bool *value, const std::string &key, NSError *error) {
+  // A document that a promise stands for has no file of its own, and can be shared all the same.
+  const auto provider = NSFileManager::defaultManager()->ubiquitousItemProvider();
+  if (key == NSURLUbiquitousItemIsSharedKey && provider) return provider->isShared(url, value, error);
   struct stat status {};
   if (!look(url, &status, error)) return false;
   const bool isDirectory = S_ISDIR(status.st_mode);
@@ -103,6 +106,8 @@ bool getResourceValue(const NSURL &url, bool *value, const std::string &key, NSE
     *value = isDirectory && (hasPackageAttribute(url.path()) || hasPackageName(url.lastPathComponent()));
   } else if (key == NSURLIsAliasFileKey) {
     *value = S_ISLNK(status.st_mode);
+  } else if (key == NSURLUbiquitousItemIsSharedKey) {
+    *value = false;
   } else {
     if (error) *error = NSError::errorWithPOSIXCode(EINVAL, "there is no resource value " + key);
     return false;

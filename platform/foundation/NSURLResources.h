@@ -24,6 +24,10 @@ inline constexpr char NSURLIsPackageKey[] = "NSURLIsPackageKey";
 // A symbolic link: what stands for another item.
 inline constexpr char NSURLIsAliasFileKey[] = "NSURLIsAliasFileKey";
 
+// Shared with other people: what the sync service says of it (NSFileManager::ubiquitousItemProvider), which
+// may take a question to its daemon. Without a service nothing is shared.
+inline constexpr char NSURLUbiquitousItemIsSharedKey[] = "NSURLUbiquitousItemIsSharedKey";
+
 // Whether `key` is known and there is a file; `value` is its resource value then. Otherwise `value` stays,
 // and `error` (may be null) is set.
 bool getResourceValue(const NSURL &url, bool *value, const std::string &key, NSError *error);

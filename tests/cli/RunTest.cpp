@@ -166,12 +166,12 @@ TEST_F(Import, aFailureHasTheLastWordsOfTheProgram) {
 
 TEST_F(Setup, aHomeRemembersItsCloudAndItsDevice) {
   ASSERT_TRUE(home().create(&problem));
-  const auto first = resolveHomeCloud(home(), root / "cloud", "laptop", &problem);
+  const auto first = resolveHomeCloud(home(), root / "cloud", "laptop", {}, &problem);
   ASSERT_TRUE(first) << problem;
   EXPECT_EQ(first->keldOptions(),
             (std::vector<std::string>{"--cloud", (root / "cloud").native(), "--device", "laptop"}));
   ASSERT_TRUE(rememberHomeCloud(home(), *first, &problem)) << problem;
-  const auto later = resolveHomeCloud(home(), {}, {}, &problem);
+  const auto later = resolveHomeCloud(home(), {}, {}, {}, &problem);
   ASSERT_TRUE(later) << problem;
   EXPECT_EQ(later->keldOptions(), first->keldOptions());
 }
@@ -179,25 +179,43 @@ TEST_F(Setup, aHomeRemembersItsCloudAndItsDevice) {
 TEST_F(Setup, aDriveStaysInItsCloudOnceItWasServed) {
   ASSERT_TRUE(home().create(&problem));
   ASSERT_TRUE(rememberHomeCloud(home(), HomeCloud(), &problem));
-  EXPECT_TRUE(resolveHomeCloud(home(), root / "other", {}, &problem))
+  EXPECT_TRUE(resolveHomeCloud(home(), root / "other", {}, {}, &problem))
       << "nothing was served yet: " << problem;
   write(home().state() + "/sync.sqlite", "");
-  EXPECT_FALSE(resolveHomeCloud(home(), root / "other", {}, &problem));
+  EXPECT_FALSE(resolveHomeCloud(home(), root / "other", {}, {}, &problem));
   EXPECT_NE(problem.find((root / "other").native()), std::string::npos) << problem;
   EXPECT_NE(problem.find(home().root() + "/cloud"), std::string::npos) << problem;
-  EXPECT_TRUE(resolveHomeCloud(home(), home().root() + "/cloud/", {}, &problem)) << problem;
+  EXPECT_TRUE(resolveHomeCloud(home(), home().root() + "/cloud/", {}, {}, &problem)) << problem;
+}
+
+TEST_F(Setup, aDriveStaysItsAccountsOnceItWasServed) {
+  ASSERT_TRUE(home().create(&problem));
+  const auto first = resolveHomeCloud(home(), {}, {}, "anna", &problem);
+  ASSERT_TRUE(first) << problem;
+  EXPECT_EQ(first->keldOptions(), (std::vector<std::string>{"--account", "anna"}));
+  ASSERT_TRUE(rememberHomeCloud(home(), *first, &problem)) << problem;
+  EXPECT_EQ(rememberedAccount(home()), "anna");
+  EXPECT_TRUE(resolveHomeCloud(home(), {}, {}, "ben", &problem)) << "nothing was served yet: " << problem;
+  write(home().state() + "/sync.sqlite", "");
+  EXPECT_FALSE(resolveHomeCloud(home(), {}, {}, "ben", &problem));
+  EXPECT_NE(problem.find("\"anna\""), std::string::npos) << problem;
+  EXPECT_NE(problem.find("name another --home"), std::string::npos) << problem;
+  const auto later = resolveHomeCloud(home(), {}, {}, {}, &problem);
+  ASSERT_TRUE(later) << problem;
+  EXPECT_EQ(later->keldOptions(), first->keldOptions());
+  EXPECT_FALSE(resolveHomeCloud(home(), {}, {}, "", &problem));
 }
 
 TEST_F(Setup, aCloudAmongTheDocumentsIsRefused) {
   ASSERT_TRUE(home().create(&problem));
-  EXPECT_FALSE(resolveHomeCloud(home(), home().replica() + "/cloud", {}, &problem));
-  EXPECT_FALSE(resolveHomeCloud(home(), home().root(), {}, &problem));
+  EXPECT_FALSE(resolveHomeCloud(home(), home().replica() + "/cloud", {}, {}, &problem));
+  EXPECT_FALSE(resolveHomeCloud(home(), home().root(), {}, {}, &problem));
 }
 
 TEST_F(Setup, aSettingThatCantBeReadIsNamed) {
   ASSERT_TRUE(home().create(&problem));
   write(home().configuration() + "/cloud.json", "no JSON");
-  EXPECT_FALSE(resolveHomeCloud(home(), {}, {}, &problem));
+  EXPECT_FALSE(resolveHomeCloud(home(), {}, {}, {}, &problem));
   EXPECT_NE(problem.find("cloud.json"), std::string::npos) << problem;
 }
 

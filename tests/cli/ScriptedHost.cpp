@@ -1,5 +1,6 @@
 #include "tests/cli/ScriptedHost.h"
 
+#include "platform/foundation/NSFileManager.h"
 #include "platform/xpc/NSXPCConnection.h"
 #include "tessaly/QVUnreachableDaemon.h"
 
@@ -108,6 +109,14 @@ void ScriptedHost::startProvidingItemWithIdentifier(const std::string &identifie
   }
   const NSURL url = NSURL::fileURLWithPath(urls[identifier]);
   completion(provide(url, readingOptions), url, NSError());
+}
+
+void ScriptedHost::listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
+                                                  FPDServiceCompletion completion) {
+  const auto found = services.find(name);
+  if (found == services.end())
+    return completion(nullptr, NSError(NSCocoaErrorDomain, NSFeatureUnsupportedError));
+  completion(found->second(itemIdentifier), NSError());
 }
 
 void ScriptedHost::performAction(const FPDActionRequest &request, FPDActionCompletion completion) {

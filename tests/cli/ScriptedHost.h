@@ -50,10 +50,6 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
   }
   // Done by `act`, as the extension would.
   void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
-  void listenerEndpointForServiceName(const std::string &, const std::string &,
-                                      FPDServiceCompletion completion) override {
-    completion(nullptr, NSError(NSPOSIXErrorDomain, ENOSYS));
-  }
   void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers, CGSize size,
                                          FPDThumbnailsCompletion completion) override {
     if (!fetchThumbnails) return completion(nullptr, NSError(NSPOSIXErrorDomain, ENOSYS));
@@ -69,6 +65,9 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
     filled.push_back(identifier);
     completion(NSError());
   }
+  // As the item offers them: `services` by name.
+  void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
+                                      FPDServiceCompletion completion) override;
 
   std::map<std::string, NSFileProviderItemFields> items;  // by identifier
   std::map<std::string, std::string> paths;               // to identifiers
@@ -83,6 +82,7 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
   std::vector<std::string> filled;  // the containers whose thumbnails the desktop was given
   std::function<void(const std::optional<std::string> &, const NSFileProviderItemCompletion &)>
       defaultContainer;
+  std::map<std::string, std::function<std::shared_ptr<FPDService>(const std::string &identifier)>> services;
   std::vector<FPDActionRequest> requests;                                      // of actions
   std::function<void(const std::string &container, std::size_t page)> onPage;  // before it is answered
   std::shared_ptr<FPDWatchObserver> observer;

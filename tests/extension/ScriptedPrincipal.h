@@ -2,6 +2,7 @@
 
 #include <deque>
 #include <functional>
+#include <map>
 #include <memory>
 #include <optional>
 #include <string>
@@ -18,6 +19,8 @@ namespace droxa {
 class ScriptedPrincipal final : public NSFileProviderExtension {
  public:
   NSURL URLForItemWithPersistentIdentifier(const std::string &identifier) override {
+    const auto found = urls.find(identifier);
+    if (found != urls.end()) return found->second;
     return identifier == "d1" ? url : NSURL();
   }
   std::optional<std::string> persistentIdentifierForItemAtURL(const NSURL &asked) override {
@@ -169,6 +172,7 @@ class ScriptedPrincipal final : public NSFileProviderExtension {
   NSFileProviderThumbnailHandler thumbnailHandler GUARDED_BY(mutex);
   NSFileProviderErrorCompletion thumbnailCompletion GUARDED_BY(mutex);
   const std::shared_ptr<NSProgress> thumbnailProgress = std::make_shared<NSProgress>();
+  std::map<std::string, NSURL> urls;  // by identifier; besides "d1", which is at `url`
   const NSURL url = NSURL::fileURLWithPath("/replica/a");
   std::shared_ptr<const NSFileProviderItem> item;
   std::shared_ptr<NSFileProviderEnumerator> enumerator;

@@ -7,6 +7,8 @@ namespace droxa {
 namespace {
 
 constexpr char kShareOperations[] = "com.quorva.Tessaly.private.SharingOperation";
+const Lines kOfDocuments{kShareOperations, "com.quorva.PlendaCollaboration", "com.quorva.Tessaly.SharingV1"};
+const Lines kOfFolders{kShareOperations, "com.quorva.Tessaly.SharingV1"};
 
 class SupportedServiceSources : public ExtensionTest {
  protected:
@@ -51,7 +53,7 @@ TEST_F(SupportedServiceSources, anyOtherIdentifierHasTheShareOperationsAlone) {
 TEST_F(SupportedServiceSources, aDocumentIsOfferedWithoutAnyLine) {
   std::string identifier;
   std::ofstream(addDocument("a.txt", &identifier)) << "contents";
-  EXPECT_EQ(names(identifier), Lines{kShareOperations});
+  EXPECT_EQ(names(identifier), kOfDocuments);
   EXPECT_EQ(serviceLines(), Lines());
 }
 
@@ -67,7 +69,7 @@ TEST_F(SupportedServiceSources, anAliasIsNotShared) {
 TEST_F(SupportedServiceSources, aDocumentWhoseFileCantBeLookedAtIsToldOfAndOfferedAllTheSame) {
   std::string identifier;
   const std::string path = addDocument("gone.txt", &identifier);
-  EXPECT_EQ(names(identifier), Lines{kShareOperations});
+  EXPECT_EQ(names(identifier), kOfDocuments);
   const Lines lines = serviceLines();
   ASSERT_EQ(lines.size(), 1U);
   EXPECT_EQ(lines[0].find("error: [ERROR] Failed to get alias file key at " + path + " - Error Domain="), 0U)
@@ -75,14 +77,14 @@ TEST_F(SupportedServiceSources, aDocumentWhoseFileCantBeLookedAtIsToldOfAndOffer
 }
 
 TEST_F(SupportedServiceSources, aDocumentThatDoesntExistIsToldOf) {
-  EXPECT_EQ(names("d4711"), Lines{kShareOperations});
+  EXPECT_EQ(names("d4711"), kOfDocuments);
   ASSERT_EQ(serviceLines().size(), 1U);
   EXPECT_EQ(serviceLines()[0].find("error: [ERROR] Failed to get alias file key at  - Error Domain="), 0U);
 }
 
 TEST_F(SupportedServiceSources, aFolderIsAskedOfTheDaemon) {
   const QVFileObjectID folder = daemon.addFolder("Plans");
-  EXPECT_EQ(names(folder.asString()), Lines{kShareOperations});
+  EXPECT_EQ(names(folder.asString()), kOfFolders);
   EXPECT_EQ(asked(), Lines{"checkIfItemIsShareableWithInode(" + std::to_string(folder.number()) + ")"});
   EXPECT_EQ(serviceLines(), Lines());
 }

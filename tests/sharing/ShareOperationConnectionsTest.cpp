@@ -162,12 +162,32 @@ TEST_F(ShareOperationConnections, aClientThatIsKilledLeavesNothingBehind) {
   ASSERT_EQ(process.read(true), "called");
   process.killNow();
   ASSERT_TRUE(eventually([this] { return logged(kInvalidated) == 1; }));
+  EXPECT_TRUE(remote->log.waitFor("invalidate")) << "the daemon needn't go on";
+  const auto late = std::make_shared<RecordingCancellable>();
+  daemon.sharing().lastOperation()->setRemoteOperationProxy(late, {});
+  EXPECT_TRUE(late->log.waitFor("invalidate")) << "nor what it begins later";
   daemon.sharing().lastOperation()->progressCallbackWithTopic("nobody listens", {});
   daemon.replies().release(name);
   EXPECT_TRUE(eventually([this] { return !delegate->lastConnection(); }));
   daemon.sharing().forgetOperations();
   const std::weak_ptr<RecordingCancellable> released = remote;
   EXPECT_TRUE(eventually([&remote] { return remote.use_count() == 1; })) << "the daemon's own is let go of";
+}
+
+TEST_F(ShareOperationConnections, whatHasEndedBeforeTheClientGoesIsNotCancelled) {
+  daemon.replies().hold(kSave);
+  Reply reply;
+  shareCall(kSave).make(*proxyOf(client()), std::make_shared<RecordingOperation>(), reply.block());
+  ASSERT_TRUE(eventually([this] { return daemon.sharing().lastOperation() != nullptr; }));
+  const auto remote = std::make_shared<RecordingCancellable>();
+  daemon.sharing().lastOperation()->setRemoteOperationProxy(remote, {});
+  daemon.replies().release(kSave);
+  ASSERT_TRUE(reply.came());
+  daemon.sharing().forgetOperations();
+  EXPECT_TRUE(eventually([&remote] { return remote.use_count() == 1; }));
+  client()->invalidate();
+  ASSERT_TRUE(eventually([this] { return logged(kInvalidated) == 1; }));
+  EXPECT_EQ(remote->log.calls(), Lines());
 }
 
 TEST_F(ShareOperationConnections, aProcessHasItsOwnPrivilegesAndNotThoseOfTheOneThatGaveItTheEndpoint) {

@@ -58,5 +58,18 @@ TEST(_QVFileProviderShareOperationWrapper, nothingHappensWithoutAnOperationOrARe
   EXPECT_EQ(operation->log.calls(), Lines{"remote"});
 }
 
+TEST(_QVFileProviderShareOperationWrapper, abandonedItCancelsWhatTheDaemonHandsOverNowAndLater) {
+  const auto operation = std::make_shared<RecordingOperation>();
+  _QVFileProviderShareOperationWrapper wrapper(operation);
+  const auto first = std::make_shared<RecordingCancellable>();
+  wrapper.setRemoteOperationProxy(first, {});
+  wrapper.abandon();
+  EXPECT_EQ(first->log.calls(), Lines{"invalidate"});
+  const auto second = std::make_shared<RecordingCancellable>();
+  wrapper.setRemoteOperationProxy(second, {});
+  EXPECT_EQ(second->log.calls(), Lines{"invalidate"});
+  EXPECT_EQ(operation->log.calls(), (Lines{"remote", "remote"})) << "the client is told as ever";
+}
+
 }  // namespace
 }  // namespace droxa

@@ -1,6 +1,7 @@
 // The sharing operations: each is recorded with its arguments, keeps the operation that came along, and is
 // answered with what the test put into sharing(), next to the failure that the test asked for.
 
+#include <gtest/gtest.h>
 #include <utility>
 
 #include "tests/support/FakeDaemon.h"
@@ -27,6 +28,13 @@ std::string list(const Values &...values) {
 }
 
 }  // namespace
+
+void FakeDaemon::setShared(const std::string &path, bool shared) {
+  const Lock lock(mutex_);
+  const std::uint64_t number = drive_.numberAtPath(path);
+  ASSERT_NE(number, 0U) << "nothing at " << path;
+  drive_.contents(number).isShared = shared;
+}
 
 void FakeDaemon::startOperation_toCopySharingInfoAtURL(std::shared_ptr<QVOperationClient> op,
                                                        const NSURL &url, QVShareAndURLReply reply) {

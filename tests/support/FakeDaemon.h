@@ -57,6 +57,8 @@ class FakeDaemon final : public QVProtocol, public std::enable_shared_from_this<
   // Who is signed in, without a notification.
   void setAccount(std::optional<QVAccountDescription> account);
 
+  // What an item shows; without a new rank.
+  void setShared(const std::string &path, bool shared);
   // What makes an eviction refused.
   void setUnsent(const std::string &path, bool unsent);
   void setInUse(const std::string &path, bool inUse);

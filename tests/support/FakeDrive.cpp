@@ -306,6 +306,7 @@ std::shared_ptr<const QVQueryItem> FakeDrive::itemOf(const Node &node) const {
   fields.isTrashed = !node.isContainer && containerOf(node) == QVUbiquitousTrashContainerID;
   fields.isExcludedFromSync = isExcluded(node);
   fields.isDownloaded = !node.contents.isDataless;
+  fields.isShared = node.contents.isShared;
   const std::int64_t lastUsed = node.metadata.lastUsed;
   if (lastUsed != 0) fields.lastUsedDate = NSDate::dateWithNanosecondsSince1970(lastUsed);
   fields.tagData = QVTagDataOfNames(node.metadata.tags);

@@ -58,6 +58,7 @@ class FakeDrive {
     bool isPinned = false;
     bool isUnsent = false;  // the cloud doesn't have them
     bool isInUse = false;
+    bool isShared = false;
     NSError lastFailure;
   };
   Contents &contents(std::uint64_t number) { return nodes_.at(number).contents; }

@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include "tessaly/NSURL+Tessaly.h"
+#include "tessaly/QVErrors.h"
 #include "tests/support/FakeDaemonConnection.h"
 #include "tests/support/ScratchHome.h"
 
@@ -251,6 +252,26 @@ TEST_F(Alias, nilResolvesToNilWithAnError) {
   NSError error;
   EXPECT_FALSE(resolve(NSURL(), &error));
   EXPECT_TRUE(error);
+}
+
+TEST_F(TessalyURL, hasTheTypeThatTheDaemonTells) {
+  const FakeDaemonScope fake;
+  fake.daemon->addDocument("a");
+  fake.daemon->addFolder("b");
+  NSError error;
+  EXPECT_EQ(qv_typeIdentifierWithError(fake.daemon->url("a"), &error), "application/octet-stream");
+  EXPECT_EQ(qv_typeIdentifierWithError(fake.daemon->url("b"), &error), "inode/directory");
+  EXPECT_FALSE(error);
+}
+
+TEST_F(TessalyURL, hasNoTypeWhereNothingIs) {
+  const FakeDaemonScope fake;
+  NSError error;
+  EXPECT_FALSE(qv_typeIdentifierWithError(in("Documents/none"), &error));
+  EXPECT_TRUE(error.is(QVTessalyErrorDomain, QVErrorNoSuchItem));
+  EXPECT_FALSE(qv_typeIdentifierWithError(NSURL(), &error));
+  EXPECT_TRUE(error.is(QVTessalyErrorDomain, QVErrorInvalidArgument));
+  EXPECT_FALSE(qv_typeIdentifierWithError(NSURL(), nullptr));
 }
 
 }  // namespace droxa

@@ -71,6 +71,15 @@ TEST_F(StartedProvidingOperation, asksTheDaemonForAReaderAndEndsWithTheDownload)
   operation_->waitUntilFinished();
 }
 
+TEST_F(StartedProvidingOperation, whereTheCurrentVersionIsWantedTheCloudIsAskedFirst) {
+  EXPECT_FALSE(operation_->wantsCurrentVersion());
+  operation_->setWantsCurrentVersion(true);
+  addAndWaitUntil("transfer 1: waitWithReply");
+  EXPECT_EQ(daemon_.calls()[0], "startDownloadAtURL(" + daemon_.url("a").path() + ", options 9)");
+  daemon_.finishDownload("a");
+  EXPECT_EQ(done_.value<0>(), NSError());
+}
+
 TEST_F(StartedProvidingOperation, keepsNoThreadWhileItWaits) {
   addAndWaitUntil("transfer 1: waitWithReply");
   EXPECT_EQ(queue_.operationCount(), 1U);

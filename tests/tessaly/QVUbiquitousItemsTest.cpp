@@ -111,4 +111,24 @@ TEST_F(UbiquitousItems, thatArePromisedCantBeRenamedToANameThatLeavesNoRoom) {
   }
 }
 
+// Also of one that has no file of its own.
+TEST_F(UbiquitousItems, areSharedWhenTheDaemonSaysSo) {
+  fake_.daemon->addDocument("b");
+  for (const bool expected : {false, true}) {
+    fake_.daemon->setShared("b", expected);
+    bool isShared = !expected;
+    EXPECT_TRUE(getResourceValue(fake_.daemon->url("b"), &isShared, NSURLUbiquitousItemIsSharedKey, nullptr));
+    EXPECT_EQ(isShared, expected);
+  }
+}
+
+TEST_F(UbiquitousItems, thatTheDaemonDoesntKnowHaveNoSharedState) {
+  bool isShared = true;
+  NSError error;
+  EXPECT_FALSE(getResourceValue(NSURL::fileURLWithPath(home_.replica() + "/none"), &isShared,
+                                NSURLUbiquitousItemIsSharedKey, &error));
+  EXPECT_TRUE(error.is(QVTessalyErrorDomain, QVErrorNoSuchItem));
+  EXPECT_TRUE(isShared) << "it stays";
+}
+
 }  // namespace droxa

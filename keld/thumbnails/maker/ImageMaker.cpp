@@ -20,6 +20,7 @@ constexpr const char *kPhotographLoaders[] = {"VipsForeignLoadJpeg",  "VipsForei
                                               "VipsForeignLoadWebp",  "VipsForeignLoadTiff",
                                               "VipsForeignLoadNsgif", "VipsForeignLoadHeif"};
 constexpr char kDrawingLoader[] = "VipsForeignLoadSvg";
+constexpr char kStrict[] = "[fail_on=error]";  // half an image is none
 
 [[noreturn]] void refuse() {
   std::string why = vips_error_buffer();
@@ -50,12 +51,22 @@ void checkKind(VipsSource *source, MakerKind kind) {
   if (!isKind) throw MakerRefusal("its contents aren't of the type that its name says");
 }
 
-void checkSize(VipsSource *source, const MakerLimits &limits) {
+struct Header {
+  std::uint64_t width = 0, height = 0;
+  bool hasColoursOfItsOwn = false;  // that have to be turned into those of screens
+};
+
+Header readHeader(VipsSource *source) {
   const auto header = take(vips_image_new_from_source(source, "", "access", VIPS_ACCESS_SEQUENTIAL, nullptr));
-  const auto width = static_cast<std::uint64_t>(vips_image_get_width(header.get()));
-  const auto height = static_cast<std::uint64_t>(vips_image_get_height(header.get()));
-  if (width * height <= limits.pixels) return;
-  throw MakerRefusal("it has " + std::to_string(width) + " x " + std::to_string(height) +
+  return {static_cast<std::uint64_t>(vips_image_get_width(header.get())),
+          static_cast<std::uint64_t>(vips_image_get_height(header.get())),
+          vips_image_get_typeof(header.get(), VIPS_META_ICC_NAME) != 0 ||
+              vips_image_get_interpretation(header.get()) == VIPS_INTERPRETATION_CMYK};
+}
+
+void checkSize(const Header &header, const MakerLimits &limits) {
+  if (header.width * header.height <= limits.pixels) return;
+  throw MakerRefusal("it has " + std::to_string(header.width) + " x " + std::to_string(header.height) +
                      " pixels, more than a thumbnail is made of (" +
                      std::to_string(limits.pixels / 1'000'000) + " megapixels)");
 }
@@ -99,12 +110,18 @@ std::string MakeImageThumbnail(const MakerJob &job) {
   const Object<VipsSource> source(vips_source_new_from_descriptor(job.contents));
   if (!source) refuse();
   checkKind(source.get(), job.kind);
-  checkSize(source.get(), job.limits);
+  const Header header = readHeader(source.get());
+  checkSize(header, job.limits);
   VipsImage *small = nullptr;
   const int side = static_cast<int>(kThumbnailSide);
-  if (vips_thumbnail_source(source.get(), &small, side, "height", side, "size", VIPS_SIZE_DOWN,
-                            "export_profile", "srgb", "fail_on", VIPS_FAIL_ON_ERROR, nullptr) != 0)
-    refuse();
+  // A profile that isn't needed would shift the colours.
+  const int problem =
+      header.hasColoursOfItsOwn
+          ? vips_thumbnail_source(source.get(), &small, side, "height", side, "size", VIPS_SIZE_DOWN,
+                                  "option_string", kStrict, "export_profile", "srgb", nullptr)
+          : vips_thumbnail_source(source.get(), &small, side, "height", side, "size", VIPS_SIZE_DOWN,
+                                  "option_string", kStrict, nullptr);
+  if (problem != 0) refuse();
   return asPNG(inEightBits(take(small)).get());
 }
 

@@ -170,7 +170,9 @@ void Sandbox::makeFilter() {
 }
 
 bool Sandbox::applyLimits(const MakerLimits &limits) {
-  return setLimit(RLIMIT_CORE, 0) && setLimit(RLIMIT_CPU, limits.cpuSeconds) &&
+  // The first signal of the two says that it was this limit; the second can't be ignored.
+  const rlimit processor{limits.cpuSeconds, limits.cpuSeconds + 1};
+  return setLimit(RLIMIT_CORE, 0) && ::setrlimit(RLIMIT_CPU, &processor) == 0 &&
          setLimit(RLIMIT_AS, limits.memoryBytes) && setLimit(RLIMIT_NOFILE, 256) &&
          ::prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0;
 }

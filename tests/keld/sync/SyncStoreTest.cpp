@@ -281,7 +281,8 @@ TEST_F(SyncStoreTest, aDatabaseOfTheFirstVersionIsBroughtUpToDate) {
   {
     SqlDatabase database(old, SqlDatabase::Access::readWrite, 100);
     database.execute(
-        "DROP TABLE unfinished; DROP TABLE meant; ALTER TABLE rows DROP COLUMN tags;"
+        "DROP TABLE unfinished; DROP TABLE meant; DROP TABLE shares; DROP TABLE thumbnails;"
+        "ALTER TABLE rows DROP COLUMN tags;"
         "ALTER TABLE rows DROP COLUMN lastUsed; ALTER TABLE rows DROP COLUMN favoriteRank;"
         "PRAGMA user_version = 1");
   }
@@ -294,7 +295,47 @@ TEST_F(SyncStoreTest, aDatabaseOfTheFirstVersionIsBroughtUpToDate) {
     again.allowDeletions({7}, 1000, 2000);
     EXPECT_TRUE(again.isDeletionAllowed(7, 1000));
     EXPECT_TRUE(again.unfinished().empty());
+    again.wantThumbnail({"r", "digest", "", {}});
+    EXPECT_EQ(again.countThumbnails(), 1U);
   }
+}
+
+TEST_F(SyncStoreTest, aThumbnailIsDueWhenTheCloudHasTheContentsItIsOf) {
+  SyncRow document = row("r", 7);
+  document.newerTag.clear();
+  document.newer = {};
+  const WantedThumbnail wanted{"r", document.content.digest, "/source", {1, 2, 3, 0}};
+  store.wantThumbnail(wanted);
+  EXPECT_TRUE(store.dueThumbnails(10).empty()) << "there is no such record yet";
+  store.put(document);
+  ASSERT_EQ(store.dueThumbnails(10).size(), 1U);
+  EXPECT_EQ(store.dueThumbnails(10)[0].source, "/source");
+  EXPECT_EQ(store.dueThumbnails(10)[0].sourceFile, wanted.sourceFile);
+  document.content.digest = "other";
+  store.put(document);
+  EXPECT_TRUE(store.dueThumbnails(10).empty());
+  store.thumbnailSettled("r", "other");
+  EXPECT_EQ(store.countThumbnails(), 1U) << "that was another one";
+  store.enqueue(7, false, false);
+  store.dropStaleThumbnails();
+  EXPECT_EQ(store.countThumbnails(), 1U) << "its contents may still be on their way";
+  store.dropQueued(7);
+  store.dropStaleThumbnails();
+  EXPECT_EQ(store.countThumbnails(), 0U);
+}
+
+TEST_F(SyncStoreTest, theLastWantOfAThumbnailCountsAndGoesWithItsRecord) {
+  SyncRow document = row("r", 7);
+  document.newerTag.clear();
+  store.put(document);
+  const std::uint64_t news = store.thumbnailNews();
+  store.wantThumbnail({"r", "older", "", {}});
+  store.wantThumbnail({"r", document.content.digest, "", {}});
+  EXPECT_GT(store.thumbnailNews(), news);
+  EXPECT_EQ(store.countThumbnails(), 1U);
+  EXPECT_EQ(store.dueThumbnails(10).size(), 1U);
+  store.erase("r");
+  EXPECT_EQ(store.countThumbnails(), 0U);
 }
 
 TEST_F(SyncStoreTest, aDatabaseOfANewerVersionIsRefused) {
@@ -372,6 +413,33 @@ TEST_F(SyncStoreTest, onlyRecordsWithATagAreInTheCloud) {
   store.put(row("unsent", 2, ""));
   EXPECT_EQ(store.recordsInCloud(), std::vector<std::string>{"sent"});
   EXPECT_EQ(store.countRows(), 2U);
+}
+
+TEST_F(SyncStoreTest, sharesAreFoundByTheirRootsAndSurviveANewItemDatabase) {
+  const KnownShare own{{"s1", {"drive"}}, "root", "anna"};
+  const KnownShare others{{"s1", {"drive", "ben"}}, "other", "ben"};
+  store.putShare(own);
+  store.putShare(others);
+  store.unbindAll();
+  EXPECT_EQ(store.share(own.record), own);
+  EXPECT_EQ(store.shareOfRoot("other"), others);
+  EXPECT_EQ(store.shares().size(), 2U);
+  KnownShare moved = own;
+  moved.root = "elsewhere";
+  store.putShare(moved);
+  EXPECT_FALSE(store.shareOfRoot("root"));
+  store.eraseShare(own.record);
+  EXPECT_EQ(store.shares(), std::vector<KnownShare>{others});
+}
+
+TEST_F(SyncStoreTest, aDatabaseThatHasPassedOverSharesReadsEverythingOnceMore) {
+  store.setText("changeToken", "t");
+  store.transaction([] {});
+  SqlDatabase(path, SqlDatabase::Access::readWrite, 100)
+      .execute("DROP TABLE shares; DROP TABLE thumbnails; PRAGMA user_version = 4");
+  SyncStore upgraded(path);
+  EXPECT_EQ(upgraded.text("changeToken"), "");
+  EXPECT_TRUE(upgraded.shares().empty());
 }
 
 }  // namespace

@@ -23,6 +23,11 @@ TEST(NSDate, isOrderedByTime) {
   EXPECT_LE(NSDate::dateWithNanosecondsSince1970(5), NSDate::now());
 }
 
+TEST(NSDate, theDistantFutureIsAfterEveryOtherDate) {
+  EXPECT_GT(NSDate::distantFuture(), NSDate::now());
+  EXPECT_EQ(NSDate::distantFuture().nanosecondsSince1970(), std::numeric_limits<std::int64_t>::max());
+}
+
 TEST(NSDate, isDescribedInUTCWithNanoseconds) {
   EXPECT_EQ(described(1'769'860'800'123'456'789), "2026-01-31 12:00:00.123456789 +0000");
   EXPECT_EQ(described(0), "1970-01-01 00:00:00.000000000 +0000");

@@ -103,5 +103,16 @@ TEST_F(URLResources, withoutASyncServiceNothingIsEvicted) {
   EXPECT_TRUE(error.is(NSCocoaErrorDomain, NSFeatureUnsupportedError));
 }
 
+TEST_F(URLResources, withoutASyncServiceNothingIsShared) {
+  bool isShared = true;
+  EXPECT_TRUE(getResourceValue(NSURL::fileURLWithPath(folder_.path()), &isShared,
+                               NSURLUbiquitousItemIsSharedKey, nullptr));
+  EXPECT_FALSE(isShared);
+  NSError error;
+  EXPECT_FALSE(getResourceValue(NSURL::fileURLWithPath(folder_.path() + "/none"), &isShared,
+                                NSURLUbiquitousItemIsSharedKey, &error));
+  EXPECT_TRUE(error);
+}
+
 }  // namespace
 }  // namespace droxa
