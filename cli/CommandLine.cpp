@@ -14,6 +14,7 @@
 #include "cli/ItemArgument.h"
 #include "cli/Run.h"
 #include "cli/ShareCommands.h"
+#include "cli/ThumbnailCommands.h"
 #include "platform/foundation/Paths.h"
 #include "tessaly/QVDaemonConnection.h"
 
@@ -65,6 +66,7 @@ class CommandLine {
     addItemCommands();
     contents_.emplace(app_);
     actions_.emplace(app_);
+    thumbnails_.emplace(app_);
     sharing_.emplace(app_);
     addSystemCommands();
   }
@@ -72,6 +74,7 @@ class CommandLine {
   CLI::App &app() { return app_; }
   const ContentsCommands &contents() const { return *contents_; }
   const ActionCommands &actions() const { return *actions_; }
+  const ThumbnailCommands &thumbnails() const { return *thumbnails_; }
   const ShareCommands &sharing() const { return *sharing_; }
   bool has(const char *command) const { return app_.got_subcommand(command); }
   bool hasAccount(const char *command) const { return account_->got_subcommand(command); }
@@ -187,6 +190,7 @@ class CommandLine {
   CLI::App app_;
   std::optional<ContentsCommands> contents_;
   std::optional<ActionCommands> actions_;
+  std::optional<ThumbnailCommands> thumbnails_;
   std::optional<ShareCommands> sharing_;
   CLI::App *account_ = nullptr;
   CLI::Option *depth_ = nullptr;
@@ -234,11 +238,13 @@ int runCommand(const CommandLine &line, const Words &words, std::ostream &out, s
     return runTree(context, options);
   }
   // Before there are threads that could take the signal.
-  if (line.has("watch") || line.contents().canBeStopped() || line.actions().canBeStopped())
+  if (line.has("watch") || line.contents().canBeStopped() || line.actions().canBeStopped() ||
+      line.thumbnails().canBeStopped())
     waitForStopSignal(std::chrono::milliseconds(0));
   if (line.has("watch")) return runWatch(context, words.argument, words.json);
   if (line.contents().isChosen()) return line.contents().run(context);
   if (line.actions().isChosen()) return line.actions().run(context);
+  if (line.thumbnails().isChosen()) return line.thumbnails().run(context);
   if (line.sharing().isChosen()) return line.sharing().run(context);
   if (line.has("status"))
     return words.items.empty() ? runStatus(context, words.json)

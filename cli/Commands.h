@@ -48,6 +48,18 @@ int runDownload(CommandContext &context, const std::vector<std::string> &argumen
 int runEvict(CommandContext &context, const std::vector<std::string> &arguments, bool json);
 int runPin(CommandContext &context, const std::vector<std::string> &arguments, bool isPinned, bool json);
 
+struct ThumbnailOptions {
+  std::vector<std::string> arguments;
+  std::uint32_t size = 256;  // the longest side, in pixels
+  std::string folder = ".";  // where the pictures go
+  bool fillsCache = false;   // into the desktop's cache instead, those of folders
+  bool json = false;
+};
+int runThumbnail(CommandContext &context, const ThumbnailOptions &options);
+
+// Without an application: the folder of everybody's documents.
+int runDefaultFolder(CommandContext &context, const std::optional<std::string> &application, bool json);
+
 struct WaitOptions {
   std::vector<std::string> arguments;  // none: the whole drive
   std::optional<std::chrono::milliseconds> timeout;

@@ -23,10 +23,14 @@ std::shared_ptr<Host> Host::create(const std::string &extensionProgram) {
   host->signals_ = std::make_shared<HostSignalReceiver>(host->followed_, listings);
   host->launcher_->setHost(host->signals_);
   host->control_ = std::make_shared<ControlService>(
-      calls, host->followed_, listings, DroxaProcessHome().replica(), [weak = std::weak_ptr<Host>(host)] {
+      calls, host->followed_, listings, DroxaProcessHome().replica(),
+      [weak = std::weak_ptr<Host>(host)] {
         const auto self = weak.lock();
         return self ? self->status() : FPDStatus();
-      });
+      },
+      std::make_shared<DesktopThumbnailFiller>(
+          calls, DesktopThumbnails(DesktopThumbnails::userFolder()),
+          std::vector<ShownFolder>{{DroxaProcessHome().replica(), DroxaProcessHome().replica()}}));
   return host;
 }
 

@@ -9,6 +9,7 @@
 
 #include "platform/fileprovider/FPDActionRequest.h"
 #include "platform/fileprovider/NSFileProviderItem.h"
+#include "platform/foundation/CGSize.h"
 #include "platform/foundation/NSData.h"
 #include "platform/foundation/NSError.h"
 #include "platform/foundation/NSURL.h"
@@ -104,6 +105,36 @@ class FPDService {
 using FPDServiceCompletion =
     std::function<void(const std::shared_ptr<FPDService> &service, const NSError &error)>;
 
+// What one item was answered: its picture, or none; what kind of picture it is, where that isn't a plain one;
+// and why there is none, which is nil also where there just isn't one.
+struct FPDThumbnail {
+  std::string identifier;
+  NSData imageData;
+  std::optional<std::string> contentType;
+  NSError error;
+};
+
+// Those that came since the last reply; at least one, unless they are the last ones, which come with the
+// outcome of the whole.
+using FPDThumbnailsReply =
+    std::function<void(const std::vector<FPDThumbnail> &thumbnails, bool isLast, const NSError &error)>;
+
+// Thumbnails that are being fetched. It begins when the next ones are first asked for. Each item is told at
+// most once; to clients of the host exactly once. Cancelling it, or releasing the last reference, ends what
+// can be ended. A received one makes proxies (NSXPCProxyWithErrorHandler).
+class FPDThumbnails {
+ public:
+  virtual ~FPDThumbnails() = default;
+  // Asked for again when it has replied, and no more after the last ones.
+  virtual void nextWithReply(FPDThumbnailsReply reply) = 0;
+  virtual void getProgress(FPDProgressCompletion completion) = 0;  // items
+  // Ends it with NSUserCancelledError (NSCocoaErrorDomain), unless it was too late.
+  virtual void cancel() = 0;
+};
+
+using FPDThumbnailsCompletion =
+    std::function<void(const std::shared_ptr<FPDThumbnails> &thumbnails, const NSError &error)>;
+
 // What the extension's process exports to the host.
 class NSFileProviderExtensionProtocol {
  public:
@@ -129,6 +160,12 @@ class NSFileProviderExtensionProtocol {
 
   virtual void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
                                               FPDServiceCompletion completion) = 0;
+
+  // The size is in points.
+  virtual void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers, CGSize size,
+                                                 FPDThumbnailsCompletion completion) = 0;
+  virtual void defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                                   NSFileProviderItemCompletion completion) = 0;
 };
 
 // What the host exports to the extension's process.
@@ -179,6 +216,8 @@ struct FPDStatus {
 using FPDStatusCompletion = std::function<void(const FPDStatus &status)>;
 using FPDWatchCompletion = std::function<void(const std::shared_ptr<FPDWatch> &watch, const NSError &error)>;
 
+inline constexpr std::size_t FPDMostThumbnailsAtOnce = 10000;
+
 // What the host exports to its clients (the droxa command).
 class FPDControlProtocol {
  public:
@@ -214,6 +253,20 @@ class FPDControlProtocol {
   // NSPOSIXErrorDomain EMFILE for a client that holds too many.
   virtual void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
                                               FPDServiceCompletion completion) = 0;
+
+  // Every item is answered, and once, however often it is named and whatever becomes of the extension: those
+  // that were lost with the error of the whole. NSPOSIXErrorDomain E2BIG for more than
+  // FPDMostThumbnailsAtOnce.
+  virtual void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers, CGSize size,
+                                                 FPDThumbnailsCompletion completion) = 0;
+  // The folder in which an application's documents go, made where it is missing; nullopt: the top-level
+  // documents folder, the one that is there already where there is one.
+  virtual void defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                                   NSFileProviderItemCompletion completion) = 0;
+  // Puts the thumbnails of the documents in the container that aren't here into the cache that the desktop's
+  // programs share, where they aren't yet; completes when it is done, however long that takes.
+  virtual void fillDesktopThumbnailsForContainer(const std::string &identifier,
+                                                 NSFileProviderErrorCompletion completion) = 0;
 };
 
 }  // namespace droxa
