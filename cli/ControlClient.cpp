@@ -86,6 +86,21 @@ CallResult<std::shared_ptr<FPDAction>> ControlClient::performAction(const FPDAct
   });
 }
 
+CallResult<std::string> ControlClient::mount(const std::string &path) {
+  return ask<std::string>(*connecting_, timeout_, [&](FPDControlProtocol &control, auto slot) {
+    control.mountAtPath(path, [slot](const std::string &mountPoint, const NSError &error) {
+      slot->put({mountPoint, error});
+    });
+  });
+}
+
+NSError ControlClient::unmount() {
+  return ask<bool>(*connecting_, timeout_, [](FPDControlProtocol &control, auto slot) {
+           control.unmount([slot](const NSError &error) { slot->put({!error, error}); });
+         })
+      .error;
+}
+
 CallResult<ControlClient::Page> ControlClient::page(const Enumerator &enumerator, const NSData &page) {
   auto slot = std::make_shared<AnswerSlot<Page>>();
   enumerator->enumerateItems(

@@ -45,6 +45,9 @@ class ControlClient {
   // An action that hasn't begun: it does when it is waited for (cli/Acting.h).
   CallResult<std::shared_ptr<FPDAction>> performAction(const FPDActionRequest &request);
 
+  CallResult<std::string> mount(const std::string &path);  // where it is mounted now
+  NSError unmount();
+
   CallResult<Page> page(const Enumerator &enumerator, const NSData &page);
   CallResult<NSData> anchor(const Enumerator &enumerator);
   CallResult<Changes> changes(const Enumerator &enumerator, const NSData &anchor);

@@ -23,7 +23,7 @@ std::shared_ptr<Host> Host::create(const std::string &extensionProgram) {
   host->signals_ = std::make_shared<HostSignalReceiver>(host->followed_, listings);
   host->launcher_->setHost(host->signals_);
   host->control_ = std::make_shared<ControlService>(
-      calls, host->followed_, listings, DroxaProcessHome().replica(), [weak = std::weak_ptr<Host>(host)] {
+      calls, host->followed_, listings, DroxaProcessHome(), [weak = std::weak_ptr<Host>(host)] {
         const auto self = weak.lock();
         return self ? self->status() : FPDStatus();
       });
@@ -35,11 +35,13 @@ bool Host::start(NSError *error) {
   if (!listener_) return false;
   listener_->setDelegate(weak_from_this());
   listener_->resume();
+  control_->mount().begin();
   return true;
 }
 
 void Host::stop() {
   if (listener_) listener_->invalidate();
+  control_->mount().end();
   std::map<const NSXPCConnection *, std::shared_ptr<NSXPCConnection>> clients;
   {
     Lock held(lock_);

@@ -1,5 +1,7 @@
 #include "fileproviderd/HostServices.h"
 
+#include <cerrno>
+
 #include "fileproviderd/HostErrors.h"
 #include "platform/dispatch/dispatch.h"
 #include "platform/fileprovider/NSFileProviderError.h"
@@ -16,15 +18,16 @@ void HostSignalReceiver::signalEnumerator(const std::string &containerIdentifier
 
 ControlService::ControlService(std::shared_ptr<ExtensionCalls> calls,
                                std::shared_ptr<FollowedContainers> followed,
-                               std::shared_ptr<OpenListings> listings, std::string replica,
+                               std::shared_ptr<OpenListings> listings, const DroxaHome &home,
                                StatusSource status)
     : calls_(std::move(calls)),
       followed_(std::move(followed)),
       listings_(std::move(listings)),
-      paths_(std::make_shared<PathResolver>(calls_, std::move(replica))),
+      paths_(std::make_shared<PathResolver>(calls_, home.replica())),
       providings_(std::make_shared<Providings>(calls_)),
       actions_(calls_, followed_, listings_),
       services_(std::make_shared<Services>(calls_)),
+      mount_(std::make_shared<HostMount>(calls_, providings_, home)),
       status_(std::move(status)) {}
 
 void ControlService::getStatus(FPDStatusCompletion completion) {
@@ -32,6 +35,9 @@ void ControlService::getStatus(FPDStatusCompletion completion) {
   status.cachedItems = followed_->cachedItemCount();
   status.followedContainers = followed_->followedCount();
   status.watchers = followed_->watcherCount();
+  const HostMount::State mount = mount_->state();
+  status.mountPoint = mount.path;
+  status.mountProblem = mount.problem;
   completion(status);
 }
 
@@ -45,7 +51,7 @@ void ControlService::itemForIdentifier(const std::string &identifier,
 
 void ControlService::itemAtPath(const std::string &path, NSFileProviderItemCompletion completion) {
   // A thread of its own: the search waits for the extension several times.
-  dispatch_async_global([paths = paths_, path, completion = std::move(completion)] {
+  dispatch_async_global([paths = paths_, path = mount_->drivePath(path), completion = std::move(completion)] {
     NSError error;
     const auto item = paths->itemAtPath(path, &error);
     completion(item, item ? NSError() : error);
@@ -123,6 +129,22 @@ void ControlService::listenerEndpointForServiceName(const std::string &name,
                                                     FPDServiceCompletion completion) {
   const auto client = NSXPCConnection::currentConnection();
   services_->open(name, itemIdentifier, client ? client->peer().processIdentifier : 0, completion);
+}
+
+// Threads of their own: both wait for the kernel, and the first for the extension.
+void ControlService::mountAtPath(const std::string &path, FPDMountCompletion completion) {
+  dispatch_async_global([mount = mount_, path, completion = std::move(completion)] {
+    const std::string problem = mount->mount(path);
+    completion(problem.empty() ? mount->state().path : std::string(),
+               problem.empty() ? NSError() : NSError::errorWithPOSIXCode(ENODEV, problem));
+  });
+}
+
+void ControlService::unmount(NSFileProviderErrorCompletion completion) {
+  dispatch_async_global([mount = mount_, completion = std::move(completion)] {
+    mount->unmount();
+    completion(NSError());
+  });
 }
 
 }  // namespace droxa

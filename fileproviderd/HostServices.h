@@ -7,6 +7,7 @@
 
 #include "fileproviderd/Actions.h"
 #include "fileproviderd/FollowedContainers.h"
+#include "fileproviderd/HostMount.h"
 #include "fileproviderd/OpenListings.h"
 #include "fileproviderd/PathResolver.h"
 #include "fileproviderd/Providings.h"
@@ -38,7 +39,7 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   using StatusSource = std::function<FPDStatus()>;
 
   ControlService(std::shared_ptr<ExtensionCalls> calls, std::shared_ptr<FollowedContainers> followed,
-                 std::shared_ptr<OpenListings> listings, std::string replica, StatusSource status);
+                 std::shared_ptr<OpenListings> listings, const DroxaHome &home, StatusSource status);
 
   void getStatus(FPDStatusCompletion completion) override;
   void itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion) override;
@@ -59,6 +60,10 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
   void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
                                       FPDServiceCompletion completion) override;
+  void mountAtPath(const std::string &path, FPDMountCompletion completion) override;
+  void unmount(NSFileProviderErrorCompletion completion) override;
+
+  HostMount &mount() { return *mount_; }
 
  private:
   const std::shared_ptr<ExtensionCalls> calls_;
@@ -68,6 +73,7 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   const std::shared_ptr<Providings> providings_;
   const Actions actions_;
   const std::shared_ptr<Services> services_;
+  const std::shared_ptr<HostMount> mount_;
   const StatusSource status_;
 };
 

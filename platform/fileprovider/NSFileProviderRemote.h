@@ -174,9 +174,12 @@ struct FPDStatus {
   std::uint64_t watchers = 0;
   std::uint64_t signals = 0;     // received since the host started
   std::string lastExtensionEnd;  // why the extension last ended, "" if it never did
+  std::string mountPoint;        // where the drive is mounted, "" if it isn't
+  std::string mountProblem;      // why it isn't though it is to be, "" otherwise
 };
 
 using FPDStatusCompletion = std::function<void(const FPDStatus &status)>;
+using FPDMountCompletion = std::function<void(const std::string &mountPoint, const NSError &error)>;
 using FPDWatchCompletion = std::function<void(const std::shared_ptr<FPDWatch> &watch, const NSError &error)>;
 
 // What the host exports to its clients (the droxa command).
@@ -214,6 +217,12 @@ class FPDControlProtocol {
   // NSPOSIXErrorDomain EMFILE for a client that holds too many.
   virtual void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
                                               FPDServiceCompletion completion) = 0;
+
+  // Shows the drive as a folder: `path` is absolute, "" where it is mounted by default. One that is mounted
+  // elsewhere moves. NSPOSIXErrorDomain ENODEV, with words, when it can't be.
+  virtual void mountAtPath(const std::string &path, FPDMountCompletion completion) = 0;
+  // Not mounted isn't an error.
+  virtual void unmount(NSFileProviderErrorCompletion completion) = 0;
 };
 
 }  // namespace droxa

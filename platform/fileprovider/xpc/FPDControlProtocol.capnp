@@ -27,6 +27,8 @@ interface FPDControlProtocol {
   performAction @11 (request :Action.FPDActionRequest) -> (action :Action.FPDAction, error :Values.Error);
   listenerEndpointForServiceName @12 (name :Data, identifier :Data)
       -> (service :Service.FPDService, error :Values.Error);
+  mountAtPath @13 (path :Data) -> (mountPoint :Data, error :Values.Error);
+  unmount @14 () -> (error :Values.Error);
 }
 
 interface FPDWatch {
@@ -55,4 +57,6 @@ struct FPDStatus {
   watchers @7 :UInt64;
   signals @8 :UInt64;
   lastExtensionEnd @9 :Data;
+  mountPoint @10 :Data;
+  mountProblem @11 :Data;
 }
