@@ -8,8 +8,9 @@
 
 namespace droxa {
 
-std::shared_ptr<Host> Host::create(const std::string &extensionProgram) {
+std::shared_ptr<Host> Host::create(const std::string &extensionProgram, const std::string &ownProgram) {
   std::shared_ptr<Host> host(new Host());
+  host->ownProgram_ = ownProgram;
   host->startedNanoseconds_ = NSDate::now().nanosecondsSince1970();
   ExtensionLauncher::Configuration configuration;
   configuration.program = extensionProgram;
@@ -35,7 +36,7 @@ bool Host::start(NSError *error) {
   if (!listener_) return false;
   listener_->setDelegate(weak_from_this());
   listener_->resume();
-  control_->mount().begin();
+  control_->mount().begin(ownProgram_);
   return true;
 }
 

@@ -5,6 +5,7 @@
 #include <fstream>
 #include <utility>
 
+#include "fileproviderd/mount/Announcer.h"
 #include "fileproviderd/mount/Mount.h"
 #include "platform/dispatch/dispatch.h"
 #include "platform/oslog/os_log.h"
@@ -46,7 +47,8 @@ HostMount::HostMount(std::shared_ptr<ExtensionCalls> calls, std::shared_ptr<Prov
 
 HostMount::~HostMount() = default;
 
-void HostMount::begin() {
+void HostMount::begin(const std::string &program) {
+  if (!program.empty()) announcer_ = Announcer::start(program);
   const std::string path = firstLine(home_.mountFile());
   if (!path.empty()) dispatch_async_global([self = shared_from_this(), path] { self->keepTrying(path); });
 }
@@ -71,6 +73,7 @@ std::string HostMount::tryToMount(const std::string &path, bool *isForNow) {
   settings.source = "droxa:" + home_.root();
   settings.replica = home_.replica();
   settings.patience = patienceOf(home_);
+  settings.announcer = announcer_;
   auto mount = std::make_shared<Mount>(calls_, providings_, settings);
   std::string problem = mount->start(isForNow);
   if (!problem.empty()) return problem;

@@ -10,6 +10,7 @@
 
 namespace droxa {
 
+class Announcer;
 class Mount;
 
 // The home's mount: where it is to be is noted in the home (DroxaHome::mountFile), so that a host which is
@@ -29,7 +30,8 @@ class HostMount final : public std::enable_shared_from_this<HostMount> {
   HostMount &operator=(const HostMount &) = delete;
 
   // Mounts in the background what is noted, and tries for as long as it takes the extension to answer.
-  void begin();
+  // `program` is the host's own, which can be started as the announcer ("": none is). On the main thread.
+  void begin(const std::string &program);
   void end();  // unmounts; the note stays
 
   // "" or why it can't be. Wait for the kernel and the extension.
@@ -49,6 +51,7 @@ class HostMount final : public std::enable_shared_from_this<HostMount> {
   const std::shared_ptr<ExtensionCalls> calls_;
   const std::shared_ptr<Providings> providings_;
   const DroxaHome home_;
+  std::shared_ptr<Announcer> announcer_;  // constant after begin()
   Mutex working_;
   mutable Mutex lock_;
   std::shared_ptr<Mount> mount_ GUARDED_BY(lock_);

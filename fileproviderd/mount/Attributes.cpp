@@ -93,6 +93,8 @@ void getAttributes(fuse_req_t request, fuse_ino_t node, fuse_file_info * /*info*
 void setAttributes(fuse_req_t request, fuse_ino_t node, struct stat *wanted, int which,
                    fuse_file_info * /*info*/) {
   MountedDrive &drive = driveOf(request);
+  // The announcer asks for what has been done already.
+  if (drive.playing.isAnnouncer(fuse_req_ctx(request)->pid)) return replyWithAttributes(request, node);
   if (!needsContents(drive, node, *wanted, which)) return setAll(request, node, *wanted, which);
   int error = 0;
   Descriptor placeholder = drive.open(node, O_RDONLY, &error);

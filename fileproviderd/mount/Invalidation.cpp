@@ -3,6 +3,8 @@
 #include <cerrno>
 #include <chrono>
 
+#include "fileproviderd/mount/HiddenNames.h"
+
 namespace droxa {
 
 Invalidation::Invalidation(std::shared_ptr<MountedDrive> drive, std::shared_ptr<KernelNotices> notices)
@@ -83,7 +85,7 @@ void Invalidation::run() {
 void Invalidation::compare(const Name &name) {
   const auto &[folder, child] = name;
   if (child.empty()) return compareFolder(folder);
-  if (drive_->isOwnName(folder, child)) return;
+  if (isHiddenName(child)) return;
   const NodeId node = drive_->nodes.find(folder, child);
   // What is being done through the mount is looked at when it is done.
   if (drive_->busy.contains(folder, child) || (node != 0 && drive_->nodes.isBeingChanged(node))) {

@@ -31,6 +31,12 @@ void replyWithEntry(fuse_req_t request, NodeId parent, const std::string &name) 
 
 void lookUp(fuse_req_t request, fuse_ino_t parent, const char *name) {
   MountedDrive &drive = driveOf(request);
+  const pid_t process = fuse_req_ctx(request)->pid;
+  // What is played as being made isn't there yet.
+  if (drive.playing.isPlayed(process, parent, name, true)) {
+    fuse_reply_err(request, ENOENT);
+    return;
+  }
   struct stat status;
   const int error = drive.look(parent, name, &status);
   if (error == ENOENT) {

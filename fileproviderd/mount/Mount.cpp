@@ -126,6 +126,7 @@ class Mount::Session {
     if (loop_.joinable()) loop_.join();
     drive_->watch.stop();
     invalidation_->stop();
+    if (settings_.announcer) settings_.announcer->watchOver(0);
     // A session with a request that never ends is left as it is: somebody may answer it yet.
     if (awaitPending()) fuse_session_destroy(fuse_);
     fuse_ = nullptr;
@@ -151,7 +152,8 @@ class Mount::Session {
     fuse_ = fuse_session_new(&arguments, &ops, sizeof(ops), &shared_);
     fuse_opt_free_args(&arguments);
     if (!fuse_) return "the session with the kernel can't be made";
-    invalidation_ = std::make_shared<Invalidation>(drive_, std::make_shared<FuseNotices>(fuse_));
+    invalidation_ = std::make_shared<Invalidation>(drive_, std::make_shared<FuseNotices>(
+                                                                fuse_, drive_, settings_.announcer, point_.path()));
     drive_->news = invalidation_.get();
     drive_->watch.start([this](NodeId folder, const std::string &child) { seen(folder, child); },
                         [this] { invalidation_->missed(); });
@@ -162,6 +164,10 @@ class Mount::Session {
       fuse_session_destroy(fuse_);
       fuse_ = nullptr;
       return problem;
+    }
+    if (settings_.announcer) {
+      drive_->playing.setProcess(settings_.announcer->process());
+      settings_.announcer->watchOver(point_.connection());
     }
     invalidation_->start();
     isMounted_ = true;
@@ -190,17 +196,21 @@ class Mount::Session {
     // A container may have come or gone; its documents folder, and what the extension knows, come a moment
     // later.
     for (const auto delay : {std::chrono::milliseconds(100), std::chrono::milliseconds(1500)})
-      dispatch_after_global(delay, [drive = drive_, pending = shared_.pending, name = child,
-                                    tell = std::weak_ptr<Invalidation>(invalidation_)] {
-        drive->roots->refresh([drive, pending, tell, before = drive->roots->folders()](bool) {
-          const auto invalidation = tell.lock();
-          if (!invalidation) return;
-          for (const auto &[folderName, path] : drive->roots->folders())
-            if (!before.contains(folderName)) invalidation->fixedChanged(folderName);
-          for (const auto &[folderName, path] : before)
-            if (!drive->roots->folderNamed(folderName)) invalidation->fixedChanged(folderName);
-        });
+      dispatch_after_global(delay, [drive = drive_, told = std::weak_ptr<Invalidation>(invalidation_)] {
+        refreshRoots(drive, told);
       });
+  }
+
+  static void refreshRoots(const std::shared_ptr<MountedDrive> &drive,
+                           const std::weak_ptr<Invalidation> &told) {
+    drive->roots->refresh([drive, told, before = drive->roots->folders()](bool) {
+      const auto invalidation = told.lock();
+      if (!invalidation) return;
+      auto names = drive->roots->folders();
+      for (const auto &folder : before)
+        if (!names.erase(folder.first)) names.insert(folder);
+      for (const auto &[name, path] : names) invalidation->seen(kRootNode, name);
+    });
   }
 
   // Until the session ends, here or because somebody unmounts the folder.

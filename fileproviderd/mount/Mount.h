@@ -9,11 +9,14 @@
 
 namespace droxa {
 
+class Announcer;
+
 struct MountSettings {
   std::string path;    // absolute
   std::string source;  // what the mount is known by in the system's table
   std::string replica;
   std::chrono::milliseconds patience{60'000};  // of a read that waits for contents
+  std::shared_ptr<Announcer> announcer;        // null: programs that watch folders aren't told
 };
 
 // The drive as a folder: a session with the kernel, from start() to stop(), or until somebody unmounts it.

@@ -98,6 +98,11 @@ std::optional<MountPoint::Mounted> MountPoint::mounted() const {
   return found;
 }
 
+unsigned MountPoint::connection() const {
+  const auto there = mounted();
+  return there && there->isOurs ? there->device : 0;
+}
+
 void MountPoint::takeOff() const {
   for (int mounts = 0; mounts < 16; ++mounts) {
     const auto there = mounted();

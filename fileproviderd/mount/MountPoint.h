@@ -18,6 +18,8 @@ class MountPoint {
   const std::string &source() const { return source_; }
   // Makes the folder, and removes what a killed host left mounted there. "" or why it can't be used.
   std::string prepare() const;
+  // The number of the connection of what is mounted; 0: nothing of ours.
+  unsigned connection() const;
   // Takes whatever of this source is mounted there off, also when nobody serves it any more, and ends the
   // requests that wait for it.
   void takeOff() const;

@@ -11,6 +11,7 @@
 #include "fileproviderd/mount/MountRoots.h"
 #include "fileproviderd/mount/NodeTable.h"
 #include "fileproviderd/mount/OpenFiles.h"
+#include "fileproviderd/mount/Playing.h"
 #include "fileproviderd/mount/ReplicaWatch.h"
 
 namespace droxa {
@@ -60,6 +61,7 @@ class MountedDrive {
   FolderDescriptors folders;
   OpenFiles openFiles;
   BusyNames busy;
+  Playing playing;
   ReplicaWatch watch;
   const std::shared_ptr<MountRoots> roots;
   const std::shared_ptr<Materialising> materialising;

@@ -14,7 +14,9 @@ namespace {
 // Makes `name` by `make(folder's descriptor)`, and answers with what is there then.
 void makeNamed(fuse_req_t request, NodeId parent, const char *name, const std::function<int(int)> &make) {
   MountedDrive &drive = driveOf(request);
-  int error = drive.isOwnName(parent, name) ? EPERM : 0;
+  const pid_t process = fuse_req_ctx(request)->pid;
+  if (drive.playing.isPlayed(process, parent, name, true)) return replyWithEntry(request, parent, name);
+  int error = drive.isOwnName(parent, name) || drive.playing.isAnnouncer(process) ? EPERM : 0;
   const SharedDescriptor folder = error == 0 ? drive.folder(parent, &error) : nullptr;
   if (!folder) {
     fuse_reply_err(request, error);
@@ -35,6 +37,11 @@ bool isFixed(MountedDrive &drive, NodeId parent, const char *name) {
 
 void removeNamed(fuse_req_t request, NodeId parent, const char *name, int flags) {
   MountedDrive &drive = driveOf(request);
+  const pid_t process = fuse_req_ctx(request)->pid;
+  if (drive.playing.isAnnouncer(process)) {
+    fuse_reply_err(request, drive.playing.isPlayed(process, parent, name, false) ? 0 : EPERM);
+    return;
+  }
   int error = isFixed(drive, parent, name) ? EBUSY : drive.isOwnName(parent, name) ? ENOENT : 0;
   const SharedDescriptor folder = error == 0 ? drive.folder(parent, &error) : nullptr;
   if (folder) {
