@@ -1,3 +1,4 @@
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <dirent.h>
@@ -70,13 +71,15 @@ int nextEntry(MountedDrive &drive, NodeId node, OpenFolder &folder, Entry *entry
       break;
     }
     folder.kept = read;
+    // Some file systems have the last entry followed by the greatest offset that there is.
+    const off_t next = std::min<off_t>(read->d_off, kFixedBase);
     const bool isSelf = std::strcmp(read->d_name, ".") == 0 || std::strcmp(read->d_name, "..") == 0;
     if (isSelf || !drive.isOwnName(node, read->d_name)) {
-      *entry = {read->d_name, static_cast<mode_t>(DTTOIF(read->d_type)), read->d_ino, read->d_off};
+      *entry = {read->d_name, static_cast<mode_t>(DTTOIF(read->d_type)), read->d_ino, next};
       return 0;
     }
     folder.kept = nullptr;
-    folder.offset = read->d_off;
+    folder.offset = next;
   }
   takeFixed(folder, entry);
   return 0;
