@@ -95,9 +95,10 @@ CallResult<std::string> ControlClient::mount(const std::string &path) {
 }
 
 NSError ControlClient::unmount() {
-  return ask<bool>(*connecting_, timeout_, [](FPDControlProtocol &control, auto slot) {
-           control.unmount([slot](const NSError &error) { slot->put({!error, error}); });
-         })
+  return ask<bool>(*connecting_, timeout_,
+                   [](FPDControlProtocol &control, auto slot) {
+                     control.unmount([slot](const NSError &error) { slot->put({!error, error}); });
+                   })
       .error;
 }
 

@@ -24,10 +24,12 @@ std::shared_ptr<Host> Host::create(const std::string &extensionProgram, const st
   host->signals_ = std::make_shared<HostSignalReceiver>(host->followed_, listings);
   host->launcher_->setHost(host->signals_);
   host->control_ = std::make_shared<ControlService>(
-      calls, host->followed_, listings, DroxaProcessHome(), [weak = std::weak_ptr<Host>(host)] {
+      calls, host->followed_, listings, DroxaProcessHome().replica(), [weak = std::weak_ptr<Host>(host)] {
         const auto self = weak.lock();
         return self ? self->status() : FPDStatus();
       });
+  host->control_->setMount(
+      std::make_shared<HostMount>(calls, host->control_->providings(), DroxaProcessHome()));
   return host;
 }
 

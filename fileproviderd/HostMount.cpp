@@ -63,8 +63,7 @@ void HostMount::keepTrying(const std::string &path) {
   bool isForNow = false;
   const std::string problem = tryToMount(path, &isForNow);
   tell(isForNow ? std::string() : problem);
-  if (isForNow)
-    dispatch_after_global(kRetry, [self = shared_from_this(), path] { self->keepTrying(path); });
+  if (isForNow) dispatch_after_global(kRetry, [self = shared_from_this(), path] { self->keepTrying(path); });
 }
 
 std::string HostMount::tryToMount(const std::string &path, bool *isForNow) {

@@ -18,16 +18,15 @@ void HostSignalReceiver::signalEnumerator(const std::string &containerIdentifier
 
 ControlService::ControlService(std::shared_ptr<ExtensionCalls> calls,
                                std::shared_ptr<FollowedContainers> followed,
-                               std::shared_ptr<OpenListings> listings, const DroxaHome &home,
+                               std::shared_ptr<OpenListings> listings, std::string replica,
                                StatusSource status)
     : calls_(std::move(calls)),
       followed_(std::move(followed)),
       listings_(std::move(listings)),
-      paths_(std::make_shared<PathResolver>(calls_, home.replica())),
+      paths_(std::make_shared<PathResolver>(calls_, std::move(replica))),
       providings_(std::make_shared<Providings>(calls_)),
       actions_(calls_, followed_, listings_),
       services_(std::make_shared<Services>(calls_)),
-      mount_(std::make_shared<HostMount>(calls_, providings_, home)),
       status_(std::move(status)) {}
 
 void ControlService::getStatus(FPDStatusCompletion completion) {
@@ -35,7 +34,7 @@ void ControlService::getStatus(FPDStatusCompletion completion) {
   status.cachedItems = followed_->cachedItemCount();
   status.followedContainers = followed_->followedCount();
   status.watchers = followed_->watcherCount();
-  const HostMount::State mount = mount_->state();
+  const HostMount::State mount = mount_ ? mount_->state() : HostMount::State();
   status.mountPoint = mount.path;
   status.mountProblem = mount.problem;
   completion(status);
@@ -51,11 +50,12 @@ void ControlService::itemForIdentifier(const std::string &identifier,
 
 void ControlService::itemAtPath(const std::string &path, NSFileProviderItemCompletion completion) {
   // A thread of its own: the search waits for the extension several times.
-  dispatch_async_global([paths = paths_, path = mount_->drivePath(path), completion = std::move(completion)] {
-    NSError error;
-    const auto item = paths->itemAtPath(path, &error);
-    completion(item, item ? NSError() : error);
-  });
+  dispatch_async_global(
+      [paths = paths_, path = mount_ ? mount_->drivePath(path) : path, completion = std::move(completion)] {
+        NSError error;
+        const auto item = paths->itemAtPath(path, &error);
+        completion(item, item ? NSError() : error);
+      });
 }
 
 void ControlService::URLForItemIdentifier(const std::string &identifier,
@@ -133,6 +133,7 @@ void ControlService::listenerEndpointForServiceName(const std::string &name,
 
 // Threads of their own: both wait for the kernel, and the first for the extension.
 void ControlService::mountAtPath(const std::string &path, FPDMountCompletion completion) {
+  if (!mount_) return completion({}, NSError::errorWithPOSIXCode(ENODEV, "this host mounts nothing"));
   dispatch_async_global([mount = mount_, path, completion = std::move(completion)] {
     const std::string problem = mount->mount(path);
     completion(problem.empty() ? mount->state().path : std::string(),
@@ -141,6 +142,7 @@ void ControlService::mountAtPath(const std::string &path, FPDMountCompletion com
 }
 
 void ControlService::unmount(NSFileProviderErrorCompletion completion) {
+  if (!mount_) return completion(NSError());
   dispatch_async_global([mount = mount_, completion = std::move(completion)] {
     mount->unmount();
     completion(NSError());

@@ -39,7 +39,10 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   using StatusSource = std::function<FPDStatus()>;
 
   ControlService(std::shared_ptr<ExtensionCalls> calls, std::shared_ptr<FollowedContainers> followed,
-                 std::shared_ptr<OpenListings> listings, const DroxaHome &home, StatusSource status);
+                 std::shared_ptr<OpenListings> listings, std::string replica, StatusSource status);
+  // Before the first client comes; without one the drive can't be mounted.
+  void setMount(std::shared_ptr<HostMount> mount) { mount_ = std::move(mount); }
+  const std::shared_ptr<Providings> &providings() const { return providings_; }
 
   void getStatus(FPDStatusCompletion completion) override;
   void itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion) override;
@@ -63,7 +66,7 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   void mountAtPath(const std::string &path, FPDMountCompletion completion) override;
   void unmount(NSFileProviderErrorCompletion completion) override;
 
-  HostMount &mount() { return *mount_; }
+  HostMount &mount() { return *mount_; }  // REQUIRES: setMount()
 
  private:
   const std::shared_ptr<ExtensionCalls> calls_;
@@ -73,8 +76,8 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   const std::shared_ptr<Providings> providings_;
   const Actions actions_;
   const std::shared_ptr<Services> services_;
-  const std::shared_ptr<HostMount> mount_;
   const StatusSource status_;
+  std::shared_ptr<HostMount> mount_;  // constant after setMount()
 };
 
 }  // namespace droxa

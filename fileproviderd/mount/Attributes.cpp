@@ -43,9 +43,8 @@ int setPlainAttributes(const Descriptor &file, const struct stat &wanted, int wh
     const gid_t group = (which & FUSE_SET_ATTR_GID) != 0 ? wanted.st_gid : static_cast<gid_t>(-1);
     if (::fchownat(file.get(), "", user, group, AT_EMPTY_PATH) != 0) return errno;
   }
-  const timespec times[2] = {
-      timeOf(which, FUSE_SET_ATTR_ATIME, FUSE_SET_ATTR_ATIME_NOW, wanted.st_atim),
-      timeOf(which, FUSE_SET_ATTR_MTIME, FUSE_SET_ATTR_MTIME_NOW, wanted.st_mtim)};
+  const timespec times[2] = {timeOf(which, FUSE_SET_ATTR_ATIME, FUSE_SET_ATTR_ATIME_NOW, wanted.st_atim),
+                             timeOf(which, FUSE_SET_ATTR_MTIME, FUSE_SET_ATTR_MTIME_NOW, wanted.st_mtim)};
   const bool hasTimes = times[0].tv_nsec != UTIME_OMIT || times[1].tv_nsec != UTIME_OMIT;
   if (hasTimes && ::utimensat(file.get(), "", times, AT_EMPTY_PATH) != 0) return errno;
   return 0;

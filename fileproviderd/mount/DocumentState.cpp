@@ -42,7 +42,8 @@ std::string linkOf(int descriptor) {
 
 // `mayReadExtents`: the descriptor is open for more than its path.
 DocumentState stateOf(int descriptor, ssize_t length, std::string_view bytes, bool mayReadExtents) {
-  const Marker marker = length > 0 ? parseMarker(bytes.substr(0, static_cast<std::size_t>(length))) : Marker();
+  const Marker marker =
+      length > 0 ? parseMarker(bytes.substr(0, static_cast<std::size_t>(length))) : Marker();
   if (marker.state != 'p' && marker.state != 'd' && marker.state != 'e') return DocumentState::unmarked;
   struct stat status;
   if (::fstat(descriptor, &status) != 0 || status.st_size == 0 || marker.size == 0)

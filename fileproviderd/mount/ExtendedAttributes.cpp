@@ -125,8 +125,7 @@ void getExtendedAttribute(fuse_req_t request, fuse_ino_t node, const char *name,
 
 void setExtendedAttribute(fuse_req_t request, fuse_ino_t node, const char *name, const char *value,
                           std::size_t size, int flags) {
-  change(request, node, name,
-         [=](const char *path) { return ::setxattr(path, name, value, size, flags); });
+  change(request, node, name, [=](const char *path) { return ::setxattr(path, name, value, size, flags); });
 }
 
 void removeExtendedAttribute(fuse_req_t request, fuse_ino_t node, const char *name) {

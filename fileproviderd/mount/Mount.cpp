@@ -152,8 +152,8 @@ class Mount::Session {
     fuse_ = fuse_session_new(&arguments, &ops, sizeof(ops), &shared_);
     fuse_opt_free_args(&arguments);
     if (!fuse_) return "the session with the kernel can't be made";
-    invalidation_ = std::make_shared<Invalidation>(drive_, std::make_shared<FuseNotices>(
-                                                                fuse_, drive_, settings_.announcer, point_.path()));
+    invalidation_ = std::make_shared<Invalidation>(
+        drive_, std::make_shared<FuseNotices>(fuse_, drive_, settings_.announcer, point_.path()));
     drive_->news = invalidation_.get();
     drive_->watch.start([this](NodeId folder, const std::string &child) { seen(folder, child); },
                         [this] { invalidation_->missed(); });

@@ -89,8 +89,7 @@ bool MountedDrive::isOwnName(NodeId parent, const std::string &name) const {
 int MountedDrive::look(NodeId parent, const std::string &name, struct stat *status) {
   if (isHiddenName(name)) return ENOENT;
   if (parent == kRootNode) {
-    if (const auto fixed = roots->folderNamed(name))
-      return ::lstat(fixed->c_str(), status) == 0 ? 0 : errno;
+    if (const auto fixed = roots->folderNamed(name)) return ::lstat(fixed->c_str(), status) == 0 ? 0 : errno;
   }
   int error = 0;
   const SharedDescriptor above = folder(parent, &error);

@@ -54,8 +54,7 @@ void removeNamed(fuse_req_t request, NodeId parent, const char *name, int flags)
   fuse_reply_err(request, error);
 }
 
-int renameError(MountedDrive &drive, NodeId parent, const char *name, NodeId newParent,
-                const char *newName) {
+int renameError(MountedDrive &drive, NodeId parent, const char *name, NodeId newParent, const char *newName) {
   if (isFixed(drive, parent, name) || isFixed(drive, newParent, newName)) return EBUSY;
   if (drive.isOwnName(parent, name)) return ENOENT;
   return drive.isOwnName(newParent, newName) ? EPERM : 0;
@@ -73,8 +72,7 @@ void seeRenamed(MountedDrive &drive, NodeId parent, const std::string &name) {
 }  // namespace
 
 void makeNode(fuse_req_t request, fuse_ino_t parent, const char *name, mode_t mode, dev_t device) {
-  makeNamed(request, parent, name,
-            [=](int folder) { return ::mknodat(folder, name, mode, device); });
+  makeNamed(request, parent, name, [=](int folder) { return ::mknodat(folder, name, mode, device); });
 }
 
 void makeFolder(fuse_req_t request, fuse_ino_t parent, const char *name, mode_t mode) {
@@ -95,9 +93,8 @@ void link(fuse_req_t request, fuse_ino_t node, fuse_ino_t parent, const char *na
   }
   const OwnChange change(drive, node);
   const std::string source = "/proc/self/fd/" + std::to_string(file->get());
-  makeNamed(request, parent, name, [&](int folder) {
-    return ::linkat(AT_FDCWD, source.c_str(), folder, name, AT_SYMLINK_FOLLOW);
-  });
+  makeNamed(request, parent, name,
+            [&](int folder) { return ::linkat(AT_FDCWD, source.c_str(), folder, name, AT_SYMLINK_FOLLOW); });
 }
 
 void remove(fuse_req_t request, fuse_ino_t parent, const char *name) {

@@ -140,7 +140,8 @@ void NodeTable::growIfNeeded() {
   for (Slot slot = kRootSlot; slot < nodes_.size(); ++slot) {
     Node &node = nodes_[slot];
     if (node.isUsed && node.name)
-      node.nextByName = std::exchange(byName_.heads[hashOfName(node.parent, node.text()) & (buckets - 1)], slot);
+      node.nextByName =
+          std::exchange(byName_.heads[hashOfName(node.parent, node.text()) & (buckets - 1)], slot);
     if (node.isUsed && node.hasFile)
       node.nextByFile =
           std::exchange(byFile_.heads[hashOfFile(node.device, node.told.inode) & (buckets - 1)], slot);
@@ -360,7 +361,8 @@ std::optional<bool> NodeTable::see(NodeId node, const struct stat &status) {
   const Slot slot = slotOf(node);
   if (slot == 0) return std::nullopt;
   if (slot == kRootSlot) return false;
-  const bool isSame = nodes_[slot].told.inode == status.st_ino && nodes_[slot].type == (status.st_mode & S_IFMT);
+  const bool isSame =
+      nodes_[slot].told.inode == status.st_ino && nodes_[slot].type == (status.st_mode & S_IFMT);
   if (!isSame && !goesOver(slot, status)) return std::nullopt;
   return tell(slot, status);
 }

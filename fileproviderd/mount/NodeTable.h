@@ -77,8 +77,8 @@ class NodeTable {
 
   void renamed(NodeId parent, const std::string &name, NodeId newParent, const std::string &newName);
   void exchanged(NodeId parent, const std::string &name, NodeId newParent, const std::string &newName);
-  // The name is gone. The node stays for whoever has it open; `isLost` when its file went with the name, whose
-  // inode may be another's at once. renamed() does the same to what was at the new name.
+  // The name is gone. The node stays for whoever has it open; `isLost` when its file went with the name,
+  // whose inode may be another's at once. renamed() does the same to what was at the new name.
   void removed(NodeId parent, const std::string &name, bool isLost);
 
   // The kernel is told of the node's file again. nullopt when `status` is another file's; else whether the

@@ -76,10 +76,8 @@ void waitForContents(fuse_req_t request, const OpenFilePointer &file, int attemp
   const auto ticket = drive.materialising->newTicket();
   fuse_req_interrupt_func(request, interrupted, reinterpret_cast<void *>(ticket));
   drive.materialising->wait(ticket, path, fuse_req_ctx(request)->pid,
-                            [request, file, attempts, pending = pendingOf(request),
-                             goOn = std::move(goOn)](int error) {
-                              contentsEnded(request, file, attempts, error, goOn);
-                            });
+                            [request, file, attempts, pending = pendingOf(request), goOn = std::move(goOn)](
+                                int error) { contentsEnded(request, file, attempts, error, goOn); });
 }
 
 }  // namespace
@@ -138,8 +136,7 @@ void create(fuse_req_t request, fuse_ino_t parent, const char *name, mode_t mode
   }
   const bool isDataless = stateOfOpenDocument(file.get()) == DocumentState::dataless;
   const fuse_entry_param entry = entryFor(drive, parent, name, status);
-  const auto opened =
-      std::make_shared<OpenFile>(entry.ino, flags & ~O_TRUNC, std::move(file), isDataless);
+  const auto opened = std::make_shared<OpenFile>(entry.ino, flags & ~O_TRUNC, std::move(file), isDataless);
   drive.openFiles.add(opened);
   putInto(info, opened, false);
   if (fuse_reply_create(request, &entry, info) != -ENOENT) return;

@@ -41,7 +41,8 @@ void statusOfFileSystem(fuse_req_t request, fuse_ino_t node);
 // Directories.cpp
 void openFolder(fuse_req_t request, fuse_ino_t node, fuse_file_info *info);
 void readFolder(fuse_req_t request, fuse_ino_t node, std::size_t size, off_t offset, fuse_file_info *info);
-void readFolderPlus(fuse_req_t request, fuse_ino_t node, std::size_t size, off_t offset, fuse_file_info *info);
+void readFolderPlus(fuse_req_t request, fuse_ino_t node, std::size_t size, off_t offset,
+                    fuse_file_info *info);
 void closeFolder(fuse_req_t request, fuse_ino_t node, fuse_file_info *info);
 void syncFolder(fuse_req_t request, fuse_ino_t node, int dataOnly, fuse_file_info *info);
 
@@ -64,9 +65,11 @@ void seek(fuse_req_t request, fuse_ino_t node, off_t offset, int whence, fuse_fi
 void write(fuse_req_t request, fuse_ino_t node, const char *bytes, std::size_t size, off_t offset,
            fuse_file_info *info);
 void sync(fuse_req_t request, fuse_ino_t node, int dataOnly, fuse_file_info *info);
-void allocate(fuse_req_t request, fuse_ino_t node, int mode, off_t offset, off_t length, fuse_file_info *info);
+void allocate(fuse_req_t request, fuse_ino_t node, int mode, off_t offset, off_t length,
+              fuse_file_info *info);
 void copyRange(fuse_req_t request, fuse_ino_t source, off_t sourceOffset, fuse_file_info *sourceInfo,
-               fuse_ino_t target, off_t targetOffset, fuse_file_info *targetInfo, std::size_t length, int flags);
+               fuse_ino_t target, off_t targetOffset, fuse_file_info *targetInfo, std::size_t length,
+               int flags);
 
 // Mutations.cpp
 void makeNode(fuse_req_t request, fuse_ino_t parent, const char *name, mode_t mode, dev_t device);

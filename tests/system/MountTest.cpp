@@ -157,7 +157,8 @@ TEST_F(Mounted, aWriteIntoADatalessDocumentKeepsTheRest) {
   writeFile(source() + "/a.txt", std::string(10'000, 'a'));
   writeFile(source() + "/b.txt", std::string(10'000, 'b'));
   start();
-  ASSERT_TRUE(eventually([&] { return contentsOf("a.txt") == "dataless" && contentsOf("b.txt") == "dataless"; }));
+  ASSERT_TRUE(
+      eventually([&] { return contentsOf("a.txt") == "dataless" && contentsOf("b.txt") == "dataless"; }));
   const Result appended = run("echo end >> \"$1/a.txt\" && tail -c 6 \"$1/a.txt\"");
   EXPECT_EQ(appended.output, "aaend\n") << appended.errors;
   EXPECT_EQ(fs::file_size(at("a.txt")), 10'004U);
@@ -375,23 +376,24 @@ TEST_F(Mounted, gitWorksInIt) {
 TEST_F(Mounted, aDatabaseWithAWriteAheadLogWorksInIt) {
   if (run("command -v sqlite3").status != 0) GTEST_SKIP() << "no sqlite3";
   start();
-  const Result sql = run(
-      "set -e; cd \"$1\"; sqlite3 d.db 'pragma journal_mode=wal; create table t(x);'\n"
-      "for w in 1 2 3; do (for i in $(seq 20); do sqlite3 -cmd '.timeout 20000' d.db "
-      "'insert into t values(1)'; done) & done; wait\n"
-      "sqlite3 d.db 'select count(*) from t; pragma integrity_check'",
-      120s);
+  const Result sql =
+      run("set -e; cd \"$1\"; sqlite3 d.db 'pragma journal_mode=wal; create table t(x);'\n"
+          "for w in 1 2 3; do (for i in $(seq 20); do sqlite3 -cmd '.timeout 20000' d.db "
+          "'insert into t values(1)'; done) & done; wait\n"
+          "sqlite3 d.db 'select count(*) from t; pragma integrity_check'",
+          120s);
   EXPECT_EQ(sql.output, "wal\n60\nok\n") << sql.errors;
 }
 
 TEST_F(Mounted, copiesBothWaysAreTheSame) {
   if (run("command -v rsync").status != 0) GTEST_SKIP() << "no rsync";
   start();
-  const Result copied = run(
-      "set -e; cd \"$(dirname \"$1\")\"; mkdir -p tree/a/b; for i in $(seq 40); do head -c $((i*997)) "
-      "/dev/urandom > tree/a/b/$i; done; ln -s b tree/a/l; touch -d 2001-02-03 tree/a/b/7; chmod 640 tree/a/b/8\n"
-      "rsync -aX tree \"$1/\"; rsync -aX \"$1/tree\" back/; rsync -aXcni --delete tree/ \"$1/tree/\"\n"
-      "diff -r tree back/tree");
+  const Result copied =
+      run("set -e; cd \"$(dirname \"$1\")\"; mkdir -p tree/a/b; for i in $(seq 40); do head -c $((i*997)) "
+          "/dev/urandom > tree/a/b/$i; done; ln -s b tree/a/l; touch -d 2001-02-03 tree/a/b/7; chmod 640 "
+          "tree/a/b/8\n"
+          "rsync -aX tree \"$1/\"; rsync -aX \"$1/tree\" back/; rsync -aXcni --delete tree/ \"$1/tree/\"\n"
+          "diff -r tree back/tree");
   EXPECT_EQ(copied.status, 0) << copied.errors;
   EXPECT_EQ(copied.output, "");
 }

@@ -339,7 +339,8 @@ class ControlProxy final : public XPCProxy<Schema, FPDControlProtocol, ControlPr
   void mountAtPath(const std::string &path, FPDMountCompletion completion) override {
     call(
         &Client::mountAtPathRequest, [path](auto params, Session &) { params.setPath(xpcBytes(path)); },
-        std::move(completion), [](auto results, const RemoteObject &) {
+        std::move(completion),
+        [](auto results, const RemoteObject &) {
           return std::tuple(xpcString(results.getMountPoint()), getError(results));
         });
   }
