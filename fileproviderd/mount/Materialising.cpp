@@ -113,7 +113,7 @@ void Materialising::lookLater() {
     if (isLooking_ || waiters_.empty()) return;
     isLooking_ = true;
   }
-  dispatch_after_global(std::min(kLook, patience_), [weak = weak_from_this()] {
+  dispatch_after_global(std::min(kLook, patience_ / 4), [weak = weak_from_this()] {
     if (const auto self = weak.lock()) self->look();
   });
 }
@@ -132,7 +132,33 @@ void Materialising::look() {
     }
   }
   for (const auto &[ticket, error] : ended) endWait(ticket, error);
+  askForProgress();
   lookLater();
+}
+
+void Materialising::askForProgress() {
+  std::vector<std::pair<std::uint64_t, std::shared_ptr<FPDProviding>>> asked;
+  {
+    const Lock held(lock_);
+    for (auto &[path, download] : downloads_)
+      if (download.providing && !std::exchange(download.isAsked, true))
+        asked.emplace_back(download.number, download.providing);
+  }
+  for (const auto &[number, providing] : asked)
+    providing->getProgress([weak = weak_from_this(), number](std::int64_t completed, std::int64_t) {
+      if (const auto self = weak.lock()) self->progressed(number, completed);
+    });
+}
+
+void Materialising::progressed(std::uint64_t number, std::int64_t completed) {
+  const Lock held(lock_);
+  for (auto &[path, download] : downloads_) {
+    if (download.number != number) continue;
+    download.isAsked = false;
+    if (completed == std::exchange(download.completed, completed)) return;
+    for (auto &[ticket, waiter] : waiters_)
+      if (waiter.download == number) waiter.until = Clock::now() + patience_;
+  }
 }
 
 void Materialising::stop(int error) {

@@ -15,8 +15,8 @@ namespace droxa {
 
 // The requests of programs that wait for a document's contents. They hold no thread: each leaves what is to
 // be done when the contents are here. A request ends early when it is interrupted, when its process has gone,
-// or when there was no end for as long as the person has patience; the download ends with the last that
-// waits for it.
+// or when nothing of the document came for as long as the person has patience; the download ends with the
+// last that waits for it.
 // Thread contract: any thread; continuations run on the pool. lock_ guards what waits, and is never held
 // during a call.
 class Materialising final : public std::enable_shared_from_this<Materialising> {
@@ -51,12 +51,16 @@ class Materialising final : public std::enable_shared_from_this<Materialising> {
     std::uint64_t number = 0;
     std::shared_ptr<FPDProviding> providing;  // null until it was asked for
     std::size_t waiters = 0;
+    std::int64_t completed = 0;  // bytes, when it was last asked
+    bool isAsked = false;        // and hasn't answered yet
   };
 
   void begin(const std::string &path, std::uint64_t number);
   void ended(std::uint64_t number, const NSError &error);
   void endWait(Ticket ticket, int error);
   void look();
+  void askForProgress();
+  void progressed(std::uint64_t number, std::int64_t completed);
   void lookLater();
 
   const std::shared_ptr<Providings> providings_;

@@ -49,6 +49,9 @@ class NSFileProviderRemoteEnumerator {
 using NSFileProviderEnumeratorCompletion = std::function<void(
     const std::shared_ptr<NSFileProviderRemoteEnumerator> &enumerator, const NSError &error)>;
 
+// Units of the work's own choice, bytes where contents are moved; a total of -1: not known yet.
+using FPDProgressCompletion = std::function<void(std::int64_t completed, std::int64_t total)>;
+
 // Contents that are being made available to a reader. Cancelling it, or releasing the last reference before
 // it has ended, ends the download when nobody else waits for it; what is here already stays. A received one
 // makes proxies (NSXPCProxyWithErrorHandler).
@@ -57,6 +60,8 @@ class FPDProviding {
   virtual ~FPDProviding() = default;
   // Replies when it has ended: nil when the contents are here.
   virtual void waitWithReply(NSFileProviderErrorCompletion completion) = 0;
+  // 0 of -1 while nothing is known.
+  virtual void getProgress(FPDProgressCompletion completion) { completion(0, -1); }
   virtual void cancel() = 0;
 };
 
@@ -64,9 +69,6 @@ using FPDProvidingCompletion =
     std::function<void(const std::shared_ptr<FPDProviding> &providing, const NSError &error)>;
 using FPDItemProvidingCompletion = std::function<void(const std::shared_ptr<FPDProviding> &providing,
                                                       const NSURL &url, const NSError &error)>;
-
-// Units of the work's own choice, bytes where contents are moved; a total of -1: not known yet.
-using FPDProgressCompletion = std::function<void(std::int64_t completed, std::int64_t total)>;
 
 // A change that somebody wants made to an item. It begins when it is first waited for, so that one which
 // nobody received was never made. Cancelling it, or releasing the last reference before it has ended, stops

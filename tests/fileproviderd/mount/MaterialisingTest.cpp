@@ -75,6 +75,19 @@ TEST_F(MaterialisingTest, patienceEnds) {
   EXPECT_EQ(extension->providings[0]->cancels, 1);
 }
 
+TEST_F(MaterialisingTest, patienceLastsForAsLongAsSomethingComes) {
+  constexpr auto kPatience = 400ms;
+  materialising = std::make_shared<Materialising>(std::make_shared<Providings>(calls), kPatience);
+  const auto before = std::chrono::steady_clock::now();
+  const auto ticket = materialising->newTicket();
+  materialising->wait(ticket, "/r/a", 0, [&](int error) { ends.put({ticket, error}); });
+  ASSERT_EQ(extension->providings.size(), 1U);
+  extension->providings[0]->mostProgress = 10;
+  EXPECT_EQ(ends.take().second, ETIMEDOUT);
+  EXPECT_GE(extension->providings[0]->progressQuestions, 10);
+  EXPECT_GE(std::chrono::steady_clock::now() - before, 2 * kPatience);
+}
+
 TEST_F(MaterialisingTest, theDeathOfWhoWaitsEndsIt) {
   const pid_t child = fork();
   if (child == 0) {
