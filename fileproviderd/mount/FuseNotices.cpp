@@ -42,9 +42,9 @@ void FuseNotices::contentsChanged(NodeId node) {
   playChange(Announcer::Play::changeContents, node);
 }
 
-void FuseNotices::attributesChanged(NodeId node) {
+void FuseNotices::attributesChanged(NodeId node, bool isToldToWatchers) {
   fuse_lowlevel_notify_inval_inode(session_, node, -1, 0);
-  playChange(Announcer::Play::changeAttributes, node);
+  if (isToldToWatchers) playChange(Announcer::Play::changeAttributes, node);
 }
 
 void FuseNotices::listingChanged(NodeId folder) {

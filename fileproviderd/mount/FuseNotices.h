@@ -14,7 +14,7 @@ class FuseNotices final : public KernelNotices {
               std::shared_ptr<Announcer> announcer, std::string mountPoint);
 
   void contentsChanged(NodeId node) override;
-  void attributesChanged(NodeId node) override;
+  void attributesChanged(NodeId node, bool isToldToWatchers) override;
   void listingChanged(NodeId folder) override;
   void appeared(NodeId folder, const std::string &name, const struct stat &status) override;
   void disappeared(NodeId folder, const std::string &name, NodeId node, mode_t type) override;

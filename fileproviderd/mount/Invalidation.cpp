@@ -23,10 +23,12 @@ void Invalidation::stop() {
   if (thread_.joinable()) thread_.join();
 }
 
-void Invalidation::seen(NodeId folder, const std::string &name) {
+void Invalidation::seen(NodeId folder, const std::string &name, bool isNew) {
   {
     const Lock held(lock_);
-    if (!waiting_.emplace(folder, name).second) return;
+    const auto [waiting, isFirst] = waiting_.try_emplace({folder, name}, isNew);
+    waiting->second = waiting->second || isNew;
+    if (!isFirst) return;
     names_.emplace_back(folder, name);
   }
   changed_.notify_all();
@@ -59,6 +61,7 @@ bool Invalidation::waitUntilIdle(std::chrono::milliseconds longest) {
 void Invalidation::run() {
   for (;;) {
     Name name;
+    bool isNew = false;
     std::set<NodeId> contents;
     bool isEverything = false;
     {
@@ -73,16 +76,16 @@ void Invalidation::run() {
       if (!names_.empty()) {
         name = std::move(names_.front());
         names_.pop_front();
-        waiting_.erase(name);
+        isNew = waiting_.extract(name).mapped();
       }
     }
     for (const NodeId node : contents) notices_->contentsChanged(node);
     if (isEverything) compareEverything();
-    if (name.first != 0) compare(name);
+    if (name.first != 0) compare(name, isNew);
   }
 }
 
-void Invalidation::compare(const Name &name) {
+void Invalidation::compare(const Name &name, bool isNew) {
   const auto &[folder, child] = name;
   if (child.empty()) return compareFolder(folder);
   if (isHiddenName(child)) return;
@@ -90,11 +93,13 @@ void Invalidation::compare(const Name &name) {
   // What is being done through the mount is looked at when it is done.
   if (drive_->busy.contains(folder, child) || (node != 0 && drive_->nodes.isBeingChanged(node))) {
     std::this_thread::sleep_for(std::chrono::milliseconds(1));
-    return seen(folder, child);
+    return seen(folder, child, isNew);
   }
   struct stat now;
   const int error = drive_->look(folder, child, &now);
   if (error == 0 && node != 0) return differs(folder, child, node, now);
+  // A file that the kernel doesn't know, and that was there before, is nothing to it when it changes.
+  if (error == 0 && !isNew) return;
   if (error == 0) return notices_->appeared(folder, child, now);
   if (error != ENOENT || node == 0) return;
   const auto view = drive_->nodes.view(node);
@@ -115,14 +120,21 @@ void Invalidation::differs(NodeId folder, const std::string &name, NodeId node, 
   } else if (*hasChanged) {
     notices_->contentsChanged(node);
   } else {
-    notices_->attributesChanged(node);
+    notices_->attributesChanged(node, !hasMuchToDo());
   }
+}
+
+// Watchers aren't told of the attributes of thousands of files that come one after the other.
+bool Invalidation::hasMuchToDo() {
+  constexpr std::size_t kMuch = 500;
+  const Lock held(lock_);
+  return names_.size() > kMuch;
 }
 
 void Invalidation::compareFolder(NodeId folder) {
   const auto view = drive_->nodes.view(folder);
-  if (view && view->parent != 0) return compare({view->parent, view->name});
-  if (view) notices_->attributesChanged(folder);
+  if (view && view->parent != 0) return compare({view->parent, view->name}, false);
+  if (view) notices_->attributesChanged(folder, true);
 }
 
 void Invalidation::compareEverything() {
@@ -130,7 +142,7 @@ void Invalidation::compareEverything() {
     const auto view = drive_->nodes.view(node);
     if (!view) continue;
     if (S_ISDIR(view->type)) notices_->listingChanged(node);
-    if (view->parent != 0) compare({view->parent, view->name});
+    if (view->parent != 0) compare({view->parent, view->name}, false);
   }
 }
 

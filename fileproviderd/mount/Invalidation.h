@@ -3,6 +3,7 @@
 #include <condition_variable>
 #include <deque>
 #include <functional>
+#include <map>
 #include <set>
 #include <thread>
 
@@ -16,7 +17,8 @@ class KernelNotices {
  public:
   virtual ~KernelNotices() = default;
   virtual void contentsChanged(NodeId node) = 0;  // and attributes
-  virtual void attributesChanged(NodeId node) = 0;
+  // `isToldToWatchers`: the programs that watch its folder are to know.
+  virtual void attributesChanged(NodeId node, bool isToldToWatchers) = 0;
   virtual void listingChanged(NodeId folder) = 0;
   virtual void appeared(NodeId folder, const std::string &name, const struct stat &status) = 0;
   virtual void disappeared(NodeId folder, const std::string &name, NodeId node, mode_t type) = 0;
@@ -35,7 +37,8 @@ class Invalidation final : public KernelNews {
 
   void start();
   void stop();
-  void seen(NodeId folder, const std::string &name);
+  // As ReplicaWatch::Seen.
+  void seen(NodeId folder, const std::string &name, bool isNew);
   void missed();  // everything may have changed
   void contentsChanged(NodeId node) override;
   // Until everything that was seen before is dealt with; for tests.
@@ -44,9 +47,10 @@ class Invalidation final : public KernelNews {
  private:
   using Name = std::pair<NodeId, std::string>;
   void run();
-  void compare(const Name &name);
+  void compare(const Name &name, bool isNew);
   void compareFolder(NodeId folder);
   void compareEverything();
+  bool hasMuchToDo();
   void differs(NodeId folder, const std::string &name, NodeId node, const struct stat &now);
 
   const std::shared_ptr<MountedDrive> drive_;
@@ -55,7 +59,7 @@ class Invalidation final : public KernelNews {
   Mutex lock_;
   std::condition_variable_any changed_;
   std::deque<Name> names_ GUARDED_BY(lock_);
-  std::set<Name> waiting_ GUARDED_BY(lock_);  // the same
+  std::map<Name, bool> waiting_ GUARDED_BY(lock_);  // the same; whether the name is new
   std::set<NodeId> contents_ GUARDED_BY(lock_);
   bool isEverything_ GUARDED_BY(lock_) = false;
   bool isWorking_ GUARDED_BY(lock_) = false;

@@ -41,7 +41,7 @@ void lookUp(fuse_req_t request, fuse_ino_t parent, const char *name) {
   const int error = drive.look(parent, name, &status);
   if (error == ENOENT) {
     fuse_entry_param nothing{};
-    nothing.entry_timeout = drive.entryTimeout(parent);
+    nothing.entry_timeout = drive.absenceTimeout(parent);
     fuse_reply_entry(request, &nothing);
     return;
   }

@@ -21,7 +21,7 @@ namespace {
 constexpr unsigned kMostThreads = 16;
 constexpr unsigned kMostWrite = 1024 * 1024;
 constexpr NodeId kReplica = ~NodeId{0};  // what the watch calls the folder of the containers
-constexpr std::chrono::seconds kRootsPatience{20};
+constexpr std::chrono::seconds kRootsPatience{3};
 constexpr std::chrono::seconds kPendingPatience{5};
 
 // Attributes and pages are told to be stale; the kernel never guesses. Pages aren't written back later, since
@@ -155,8 +155,9 @@ class Mount::Session {
     invalidation_ = std::make_shared<Invalidation>(
         drive_, std::make_shared<FuseNotices>(fuse_, drive_, settings_.announcer, point_.path()));
     drive_->news = invalidation_.get();
-    drive_->watch.start([this](NodeId folder, const std::string &child) { seen(folder, child); },
-                        [this] { invalidation_->missed(); });
+    drive_->watch.start(
+        [this](NodeId folder, const std::string &child, bool isNew) { seen(folder, child, isNew); },
+        [this] { invalidation_->missed(); });
     watchRoot();
     if (fuse_session_mount(fuse_, point_.path().c_str()) != 0) {
       const std::string problem = point_.path() + ": can't be mounted: " + std::strerror(errno);
@@ -191,8 +192,8 @@ class Mount::Session {
     if (replica) drive_->watch.add(kReplica, replica.get());
   }
 
-  void seen(NodeId folder, const std::string &child) {
-    if (folder != kReplica) return invalidation_->seen(folder, child);
+  void seen(NodeId folder, const std::string &child, bool isNew) {
+    if (folder != kReplica) return invalidation_->seen(folder, child, isNew);
     // A container may have come or gone; its documents folder, and what the extension knows, come a moment
     // later.
     for (const auto delay : {std::chrono::milliseconds(100), std::chrono::milliseconds(1500)})
@@ -209,7 +210,7 @@ class Mount::Session {
       auto names = drive->roots->folders();
       for (const auto &folder : before)
         if (!names.erase(folder.first)) names.insert(folder);
-      for (const auto &[name, path] : names) invalidation->seen(kRootNode, name);
+      for (const auto &[name, path] : names) invalidation->seen(kRootNode, name, true);
     });
   }
 

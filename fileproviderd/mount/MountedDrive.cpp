@@ -1,5 +1,6 @@
 #include "fileproviderd/mount/MountedDrive.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <fcntl.h>
 
@@ -12,6 +13,7 @@ namespace {
 
 constexpr std::size_t kMostFolders = 1024;
 constexpr double kLong = 24.0 * 3600;
+constexpr double kLongestAbsence = 60;
 constexpr double kShort = 1;  // where changes can't be seen
 
 }  // namespace
@@ -170,6 +172,11 @@ bool MountedDrive::isHereByNow(OpenFile &file, int *error) {
 
 double MountedDrive::entryTimeout(NodeId parent) const {
   return watch.isWatched(parent) ? kLong : kShort;
+}
+
+// Nobody can be told of these one by one when changes were missed.
+double MountedDrive::absenceTimeout(NodeId parent) const {
+  return std::min(kLongestAbsence, entryTimeout(parent));
 }
 
 // What happens to a file under another of its names isn't seen.

@@ -47,6 +47,7 @@ class MountedDrive {
 
   // Seconds for which the kernel may keep what it is told.
   double entryTimeout(NodeId parent) const;
+  double absenceTimeout(NodeId parent) const;  // that there is nothing of a name
   double attributeTimeout(NodeId parent, const struct stat &status) const;
   // Watches a folder that the kernel is about to be told of; `status` is taken anew then.
   void watchFolder(NodeId node, NodeId parent, const std::string &name, struct stat *status);

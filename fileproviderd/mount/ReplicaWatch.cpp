@@ -99,7 +99,8 @@ void ReplicaWatch::readEvents() {
           continue;
         }
       }
-      seen_(folder, event->len > 0 ? std::string(event->name) : std::string());
+      seen_(folder, event->len > 0 ? std::string(event->name) : std::string(),
+            (event->mask & (IN_CREATE | IN_MOVED_TO)) != 0);
     }
   }
 }

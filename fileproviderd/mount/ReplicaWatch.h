@@ -14,8 +14,9 @@ namespace droxa {
 // `missed` are called on the watch's own thread.
 class ReplicaWatch {
  public:
-  // `name` in `folder` was made, changed or removed; "": the folder itself was changed.
-  using Seen = std::function<void(NodeId folder, const std::string &name)>;
+  // `name` in `folder` was made or came there (`isNew`), was changed or removed; "": the folder itself was
+  // changed.
+  using Seen = std::function<void(NodeId folder, const std::string &name, bool isNew)>;
   using Missed = std::function<void()>;  // some were not told
 
   ReplicaWatch() = default;
