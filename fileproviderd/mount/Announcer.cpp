@@ -65,8 +65,12 @@ void Announcer::play(Play play, const std::string &path) {
   send(static_cast<char>(play), path);
 }
 
-void Announcer::watchOver(unsigned connection) {
-  send('w', connection == 0 ? std::string() : std::to_string(connection));
+void Announcer::watchOver(const MountPoint &point, unsigned connection) {
+  if (connection != 0) send('w', std::to_string(connection) + '\n' + point.source() + '\n' + point.path());
+}
+
+void Announcer::watchOverNothing() {
+  send('w', {});
 }
 
 }  // namespace droxa

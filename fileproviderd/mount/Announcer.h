@@ -5,6 +5,7 @@
 #include <sys/types.h>
 
 #include "fileproviderd/mount/Descriptor.h"
+#include "fileproviderd/mount/MountPoint.h"
 #include "platform/foundation/ThreadSafety.h"
 
 namespace droxa {
@@ -12,9 +13,9 @@ namespace droxa {
 // Plays changes that happened behind a mount on the mount itself, so that the kernel tells the programs which
 // watch its folders: a small process, whose requests the host recognises and answers as if each had done what
 // was done already. It has to be another process: one that is killed while it waits for itself can't end. For
-// the same reason it frees the mount's connection when the process that made it dies.
-// Thread contract: start() on the main thread, with which the process ends; play() and watchOver() on any
-// thread, one at a time. lock_ is held while the process plays.
+// the same reason it frees the mount's connection when the process that made it dies, and takes the mount
+// off. Thread contract: start() on the main thread, with which the process ends; play() and watchOver() on
+// any thread, one at a time. lock_ is held while the process plays.
 class Announcer {
  public:
   enum class Play : char {
@@ -34,8 +35,9 @@ class Announcer {
   pid_t process() const { return process_; }
   // Waits until it was played, but not for ever: an announcer that doesn't answer is ended.
   void play(Play play, const std::string &path);
-  // The connection that is to be freed, by its number; 0: none.
-  void watchOver(unsigned connection);
+  // The mount that is to be taken off when this process dies, and the number of its connection.
+  void watchOver(const MountPoint &point, unsigned connection);
+  void watchOverNothing();
 
   static constexpr char kArgument[] = "--announcer";
 

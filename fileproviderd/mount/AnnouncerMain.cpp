@@ -3,8 +3,8 @@
 #include <cerrno>
 #include <csignal>
 #include <cstdlib>
-#include <cstring>
 #include <fcntl.h>
+#include <optional>
 #include <string>
 #include <sys/prctl.h>
 #include <sys/socket.h>
@@ -19,16 +19,36 @@ namespace {
 
 // The connection's file that ends all its requests; open beforehand, so that a signal's handler can use it.
 std::atomic<int> abortFile{-1};
+std::atomic<bool> isParentDead{false};
 
+// This process may itself wait for the dead one, and goes on from there.
 void parentDied(int /*signal*/) {
+  const int before = errno;
   const int file = abortFile.load();
-  if (file >= 0 && ::write(file, "1", 1) < 0) ::_exit(1);
-  ::_exit(0);
+  const ssize_t written = file >= 0 ? ::write(file, "1", 1) : 0;
+  static_cast<void>(written);
+  errno = before;
+  isParentDead = true;
 }
 
-void watchOver(const std::string &connection) {
-  const std::string path = "/sys/fs/fuse/connections/" + connection + "/abort";
-  const int opened = connection.empty() ? -1 : ::open(path.c_str(), O_WRONLY | O_CLOEXEC);
+// What is to be taken off in the end.
+struct Watched {
+  std::optional<MountPoint> point;
+  unsigned connection = 0;
+};
+
+// "NUMBER", source and path, each on a line; "": nothing.
+void watchOver(const std::string &text, Watched *watched) {
+  watched->point.reset();
+  const std::size_t first = text.find('\n');
+  const std::size_t second = first == std::string::npos ? first : text.find('\n', first + 1);
+  int opened = -1;
+  if (second != std::string::npos) {
+    watched->point.emplace(text.substr(second + 1), text.substr(first + 1, second - first - 1));
+    watched->connection = static_cast<unsigned>(std::strtoul(text.c_str(), nullptr, 10));
+    const std::string file = "/sys/fs/fuse/connections/" + text.substr(0, first) + "/abort";
+    opened = ::open(file.c_str(), O_WRONLY | O_CLOEXEC);
+  }
   const int before = abortFile.exchange(opened);
   if (before >= 0) ::close(before);
 }
@@ -70,6 +90,21 @@ void play(char kind, const std::string &path) {
   }
 }
 
+// False when the host has gone.
+bool serveOne(Watched *watched) {
+  std::array<char, 16 * 1024> message;
+  const ssize_t length = ::recv(STDIN_FILENO, message.data(), message.size(), 0);
+  if (isParentDead) return false;
+  if (length < 0 && errno == EINTR) return true;
+  if (length <= 0) return false;
+  const std::string text(message.data() + 1, static_cast<std::size_t>(length) - 1);
+  if (message[0] == 'w')
+    watchOver(text, watched);
+  else
+    play(message[0], text);
+  return !isParentDead && ::send(STDIN_FILENO, "k", 1, MSG_NOSIGNAL) == 1;
+}
+
 }  // namespace
 
 int announcerMain() {
@@ -83,18 +118,12 @@ int announcerMain() {
   ::pthread_sigmask(SIG_SETMASK, &none, nullptr);
   ::prctl(PR_SET_PDEATHSIG, SIGUSR1);
   if (::getppid() != parent) return 0;
-  std::array<char, 16 * 1024> message;
-  for (;;) {
-    const ssize_t length = ::recv(STDIN_FILENO, message.data(), message.size(), 0);
-    if (length < 0 && errno == EINTR) continue;
-    if (length <= 0) return 0;
-    const std::string text(message.data() + 1, static_cast<std::size_t>(length) - 1);
-    if (message[0] == 'w')
-      watchOver(text);
-    else
-      play(message[0], text);
-    if (::send(STDIN_FILENO, "k", 1, MSG_NOSIGNAL) != 1) return 0;
+  Watched watched;
+  while (serveOne(&watched)) {
   }
+  // Nobody serves it any more.
+  if (watched.point) watched.point->takeOff(watched.connection);
+  return 0;
 }
 
 }  // namespace droxa

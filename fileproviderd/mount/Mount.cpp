@@ -126,7 +126,7 @@ class Mount::Session {
     if (loop_.joinable()) loop_.join();
     drive_->watch.stop();
     invalidation_->stop();
-    if (settings_.announcer) settings_.announcer->watchOver(0);
+    if (settings_.announcer) settings_.announcer->watchOverNothing();
     // A session with a request that never ends is left as it is: somebody may answer it yet.
     if (awaitPending()) fuse_session_destroy(fuse_);
     fuse_ = nullptr;
@@ -168,7 +168,7 @@ class Mount::Session {
     }
     if (settings_.announcer) {
       drive_->playing.setProcess(settings_.announcer->process());
-      settings_.announcer->watchOver(point_.connection());
+      settings_.announcer->watchOver(point_, point_.connection());
     }
     invalidation_->start();
     isMounted_ = true;

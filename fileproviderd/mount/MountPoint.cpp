@@ -103,10 +103,10 @@ unsigned MountPoint::connection() const {
   return there && there->isOurs ? there->device : 0;
 }
 
-void MountPoint::takeOff() const {
+void MountPoint::takeOff(unsigned only) const {
   for (int mounts = 0; mounts < 16; ++mounts) {
     const auto there = mounted();
-    if (!there || !there->isOurs) return;
+    if (!there || !there->isOurs || (only != 0 && there->device != only)) return;
     abortConnection(there->device);
     if (::geteuid() == 0 ? ::umount2(path_.c_str(), MNT_DETACH) != 0 : true) runUnmount(path_);
   }

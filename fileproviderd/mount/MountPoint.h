@@ -21,8 +21,8 @@ class MountPoint {
   // The number of the connection of what is mounted; 0: nothing of ours.
   unsigned connection() const;
   // Takes whatever of this source is mounted there off, also when nobody serves it any more, and ends the
-  // requests that wait for it.
-  void takeOff() const;
+  // requests that wait for it. `only`: unless it has another connection than this; 0: whatever it has.
+  void takeOff(unsigned only = 0) const;
 
  private:
   struct Mounted {
