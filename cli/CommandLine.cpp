@@ -41,7 +41,8 @@ struct Words {
   std::string argument;
   std::string name;
   std::vector<std::string> items;
-  std::string folder, cloud, device, account;
+  std::string folder, cloud, device, account, mount;
+  bool noMount = false;
   std::int32_t process = 0;
   bool json = false;
 };
@@ -139,6 +140,11 @@ class CommandLine {
                    ->type_name("PID")
                    ->check(CLI::Range(1, std::numeric_limits<std::int32_t>::max()));
     entitlements->add_flag("--json", words_.json, "One JSON object");
+    addArgument(add("mount",
+                    "Shows the drive as a folder, which every program can use, and prints where. Documents\n"
+                    "that aren't here are fetched when they are read"),
+                "dir", "An empty folder; made if it isn't there (default: ~/Droxa Drive)");
+    add("unmount", "Takes the folder off again");
     account_ = add("account", "Shows, signs in or signs out the account");
     account_->add_subcommand("show", "Shows who is signed in")
         ->fallthrough()
@@ -176,6 +182,11 @@ class CommandLine {
            "The account in the cloud that the drive belongs to, remembered too: homes of two accounts\n"
            "on one cloud are two people's (default: who runs it)")
         ->type_name("NAME");
+    auto *mount = run->add_option("--mount", words_.mount,
+                                  "The folder that shows the drive (default: \"~/Droxa Drive\", or \"Droxa "
+                                  "Drive\" in a home\nthat isn't the usual one)")
+                      ->type_name("DIR");
+    run->add_flag("--no-mount", words_.noMount, "Shows the drive as no folder")->excludes(mount);
   }
 
   CLI::App *add(const char *name, const char *description) {
@@ -215,7 +226,8 @@ int runCommand(const CommandLine &line, const Words &words, std::ostream &out, s
   const std::optional<std::string> home = given(words.home);
   if (line.has("run"))
     return runRun(out, err,
-                  {home, given(words.folder), given(words.cloud), given(words.device), given(words.account)});
+                  {home, given(words.folder), given(words.cloud), given(words.device), given(words.account),
+                   given(words.mount), !words.noMount});
 
   DroxaSetProcessHome(DroxaHome::resolve(home));
   const std::chrono::milliseconds timeout(std::llround(words.timeout * 1000));
@@ -249,6 +261,8 @@ int runCommand(const CommandLine &line, const Words &words, std::ostream &out, s
   if (line.has("status"))
     return words.items.empty() ? runStatus(context, words.json)
                                : runItemStatus(context, words.items, words.json);
+  if (line.has("mount")) return runMount(context, words.argument);
+  if (line.has("unmount")) return runUnmount(context);
   if (line.has("entitlements"))
     return runEntitlements(context, line.hasProcess() ? std::optional(words.process) : std::nullopt,
                            words.json);

@@ -73,6 +73,10 @@ int runDeletions(CommandContext &context, DeletionsAnswer answer, bool json);
 // What the process would be granted when it connects; without one, all that the files grant.
 int runEntitlements(CommandContext &context, std::optional<std::int32_t> process, bool json);
 
+// `path` absolute, or "" for where the drive is mounted by default.
+int runMount(CommandContext &context, const std::string &path);
+int runUnmount(CommandContext &context);
+
 int runAccountShow(CommandContext &context, bool json);
 int runAccountSignIn(CommandContext &context, const std::string &name);
 int runAccountSignOut(CommandContext &context);

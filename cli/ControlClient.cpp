@@ -128,6 +128,22 @@ CallResult<ControlClient::Item> ControlClient::defaultContainer(
   });
 }
 
+CallResult<std::string> ControlClient::mount(const std::string &path) {
+  return ask<std::string>(*connecting_, timeout_, [&](FPDControlProtocol &control, auto slot) {
+    control.mountAtPath(path, [slot](const std::string &mountPoint, const NSError &error) {
+      slot->put({mountPoint, error});
+    });
+  });
+}
+
+NSError ControlClient::unmount() {
+  return ask<bool>(*connecting_, timeout_,
+                   [](FPDControlProtocol &control, auto slot) {
+                     control.unmount([slot](const NSError &error) { slot->put({!error, error}); });
+                   })
+      .error;
+}
+
 CallResult<std::shared_ptr<FPDService>> ControlClient::service(const std::string &name,
                                                                const std::string &identifier) {
   using Service = std::shared_ptr<FPDService>;

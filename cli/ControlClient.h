@@ -60,6 +60,9 @@ class ControlClient {
   // A service on the item, to be held until the first reply over its connection has come.
   CallResult<std::shared_ptr<FPDService>> service(const std::string &name, const std::string &identifier);
 
+  CallResult<std::string> mount(const std::string &path);  // where it is mounted now
+  NSError unmount();
+
   CallResult<Page> page(const Enumerator &enumerator, const NSData &page);
   CallResult<NSData> anchor(const Enumerator &enumerator);
   CallResult<Changes> changes(const Enumerator &enumerator, const NSData &anchor);

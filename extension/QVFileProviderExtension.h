@@ -86,6 +86,7 @@ class QVFileProviderExtension final : public NSFileProviderExtension {
   void startProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
   void stopProvidingItemAtURL(const NSURL &url) override;
   void cancelProvidingItemAtURL(const NSURL &url) override;
+  std::pair<std::int64_t, std::int64_t> progressOfProvidingItemAtURL(const NSURL &url) override;
   void itemChangedAtURL(const NSURL &url) override;
   void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
   void movingItemAtURL_requiresProvidingWithDestinationURL(

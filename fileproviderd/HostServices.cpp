@@ -37,6 +37,9 @@ void ControlService::getStatus(FPDStatusCompletion completion) {
   status.cachedItems = followed_->cachedItemCount();
   status.followedContainers = followed_->followedCount();
   status.watchers = followed_->watcherCount();
+  const HostMount::State mount = mount_ ? mount_->state() : HostMount::State();
+  status.mountPoint = mount.path;
+  status.mountProblem = mount.problem;
   completion(status);
 }
 
@@ -50,11 +53,12 @@ void ControlService::itemForIdentifier(const std::string &identifier,
 
 void ControlService::itemAtPath(const std::string &path, NSFileProviderItemCompletion completion) {
   // A thread of its own: the search waits for the extension several times.
-  dispatch_async_global([paths = paths_, path, completion = std::move(completion)] {
-    NSError error;
-    const auto item = paths->itemAtPath(path, &error);
-    completion(item, item ? NSError() : error);
-  });
+  dispatch_async_global(
+      [paths = paths_, path = mount_ ? mount_->drivePath(path) : path, completion = std::move(completion)] {
+        NSError error;
+        const auto item = paths->itemAtPath(path, &error);
+        completion(item, item ? NSError() : error);
+      });
 }
 
 void ControlService::URLForItemIdentifier(const std::string &identifier,
@@ -160,6 +164,24 @@ void ControlService::fillDesktopThumbnailsForContainer(const std::string &identi
   if (!desktopThumbnails_)
     return completion(NSError::errorWithPOSIXCode(ENOSYS, "this host keeps no thumbnails for the desktop"));
   desktopThumbnails_->fillContainer(identifier, std::move(completion));
+}
+
+// Threads of their own: both wait for the kernel, and the first for the extension.
+void ControlService::mountAtPath(const std::string &path, FPDMountCompletion completion) {
+  if (!mount_) return completion({}, NSError::errorWithPOSIXCode(ENODEV, "this host mounts nothing"));
+  dispatch_async_global([mount = mount_, path, completion = std::move(completion)] {
+    const std::string problem = mount->mount(path);
+    completion(problem.empty() ? mount->state().path : std::string(),
+               problem.empty() ? NSError() : NSError::errorWithPOSIXCode(ENODEV, problem));
+  });
+}
+
+void ControlService::unmount(NSFileProviderErrorCompletion completion) {
+  if (!mount_) return completion(NSError());
+  dispatch_async_global([mount = mount_, completion = std::move(completion)] {
+    mount->unmount();
+    completion(NSError());
+  });
 }
 
 }  // namespace droxa

@@ -8,6 +8,7 @@
 #include "fileproviderd/Actions.h"
 #include "fileproviderd/DesktopThumbnailFiller.h"
 #include "fileproviderd/FollowedContainers.h"
+#include "fileproviderd/HostMount.h"
 #include "fileproviderd/OpenListings.h"
 #include "fileproviderd/PathResolver.h"
 #include "fileproviderd/Providings.h"
@@ -42,6 +43,9 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   ControlService(std::shared_ptr<ExtensionCalls> calls, std::shared_ptr<FollowedContainers> followed,
                  std::shared_ptr<OpenListings> listings, std::string replica, StatusSource status,
                  std::shared_ptr<DesktopThumbnailFiller> desktopThumbnails = nullptr);
+  // Before the first client comes; without one the drive can't be mounted.
+  void setMount(std::shared_ptr<HostMount> mount) { mount_ = std::move(mount); }
+  const std::shared_ptr<Providings> &providings() const { return providings_; }
 
   void getStatus(FPDStatusCompletion completion) override;
   void itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion) override;
@@ -69,6 +73,11 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   void fillDesktopThumbnailsForContainer(const std::string &identifier,
                                          NSFileProviderErrorCompletion completion) override;
 
+  void mountAtPath(const std::string &path, FPDMountCompletion completion) override;
+  void unmount(NSFileProviderErrorCompletion completion) override;
+
+  HostMount &mount() { return *mount_; }  // REQUIRES: setMount()
+
  private:
   std::shared_ptr<NSFileProviderRemoteEnumerator> relayed(
       const std::string &identifier, const std::shared_ptr<NSFileProviderRemoteEnumerator> &enumerator) const;
@@ -82,6 +91,7 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   const std::shared_ptr<Services> services_;
   const StatusSource status_;
   const std::shared_ptr<DesktopThumbnailFiller> desktopThumbnails_;  // may be null
+  std::shared_ptr<HostMount> mount_;                                 // constant after setMount()
 };
 
 }  // namespace droxa

@@ -5,6 +5,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "platform/fileprovider/NSFileProviderEnumerating.h"
@@ -64,6 +65,11 @@ class NSFileProviderExtension : public NSObject,
   // The first half of that alone: whoever waited no longer does, which is no reason to let go of contents
   // that have come in between.
   virtual void cancelProvidingItemAtURL(const NSURL &url) = 0;
+  // How many bytes of what is being provided at `url` are here, and how many it has; 0 of -1 where nothing is
+  // known. May wait for whoever knows.
+  virtual std::pair<std::int64_t, std::int64_t> progressOfProvidingItemAtURL(const NSURL & /*url*/) {
+    return {0, -1};
+  }
   virtual void itemChangedAtURL(const NSURL &url) = 0;
   virtual void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) = 0;
   // Whether the move needs the contents first.

@@ -50,6 +50,9 @@ class NSFileProviderRemoteEnumerator {
 using NSFileProviderEnumeratorCompletion = std::function<void(
     const std::shared_ptr<NSFileProviderRemoteEnumerator> &enumerator, const NSError &error)>;
 
+// Units of the work's own choice, bytes where contents are moved; a total of -1: not known yet.
+using FPDProgressCompletion = std::function<void(std::int64_t completed, std::int64_t total)>;
+
 // Contents that are being made available to a reader. Cancelling it, or releasing the last reference before
 // it has ended, ends the download when nobody else waits for it; what is here already stays. A received one
 // makes proxies (NSXPCProxyWithErrorHandler).
@@ -58,6 +61,8 @@ class FPDProviding {
   virtual ~FPDProviding() = default;
   // Replies when it has ended: nil when the contents are here.
   virtual void waitWithReply(NSFileProviderErrorCompletion completion) = 0;
+  // 0 of -1 while nothing is known.
+  virtual void getProgress(FPDProgressCompletion completion) { completion(0, -1); }
   virtual void cancel() = 0;
 };
 
@@ -65,9 +70,6 @@ using FPDProvidingCompletion =
     std::function<void(const std::shared_ptr<FPDProviding> &providing, const NSError &error)>;
 using FPDItemProvidingCompletion = std::function<void(const std::shared_ptr<FPDProviding> &providing,
                                                       const NSURL &url, const NSError &error)>;
-
-// Units of the work's own choice, bytes where contents are moved; a total of -1: not known yet.
-using FPDProgressCompletion = std::function<void(std::int64_t completed, std::int64_t total)>;
 
 // A change that somebody wants made to an item. It begins when it is first waited for, so that one which
 // nobody received was never made. Cancelling it, or releasing the last reference before it has ended, stops
@@ -211,9 +213,12 @@ struct FPDStatus {
   std::uint64_t watchers = 0;
   std::uint64_t signals = 0;     // received since the host started
   std::string lastExtensionEnd;  // why the extension last ended, "" if it never did
+  std::string mountPoint;        // where the drive is mounted, "" if it isn't
+  std::string mountProblem;      // why it isn't though it is to be, "" otherwise
 };
 
 using FPDStatusCompletion = std::function<void(const FPDStatus &status)>;
+using FPDMountCompletion = std::function<void(const std::string &mountPoint, const NSError &error)>;
 using FPDWatchCompletion = std::function<void(const std::shared_ptr<FPDWatch> &watch, const NSError &error)>;
 
 inline constexpr std::size_t FPDMostThumbnailsAtOnce = 10000;
@@ -267,6 +272,12 @@ class FPDControlProtocol {
   // programs share, where they aren't yet; completes when it is done, however long that takes.
   virtual void fillDesktopThumbnailsForContainer(const std::string &identifier,
                                                  NSFileProviderErrorCompletion completion) = 0;
+
+  // Shows the drive as a folder: `path` is absolute, "" where it is mounted by default. One that is mounted
+  // elsewhere moves. NSPOSIXErrorDomain ENODEV, with words, when it can't be.
+  virtual void mountAtPath(const std::string &path, FPDMountCompletion completion) = 0;
+  // Not mounted isn't an error.
+  virtual void unmount(NSFileProviderErrorCompletion completion) = 0;
 };
 
 }  // namespace droxa

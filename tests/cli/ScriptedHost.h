@@ -69,6 +69,16 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
   void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
                                       FPDServiceCompletion completion) override;
 
+  void mountAtPath(const std::string &path, FPDMountCompletion completion) override {
+    if (!mountError) status.mountPoint = path.empty() ? "/home/anna/Droxa Drive" : path;
+    completion(mountError ? std::string() : status.mountPoint, mountError);
+  }
+  void unmount(NSFileProviderErrorCompletion completion) override {
+    status.mountPoint.clear();
+    completion(NSError());
+  }
+
+  NSError mountError;
   std::map<std::string, NSFileProviderItemFields> items;  // by identifier
   std::map<std::string, std::string> paths;               // to identifiers
   std::map<std::string, std::string> urls;                // by identifier

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <algorithm>
 #include <atomic>
 #include <condition_variable>
 #include <deque>
@@ -85,6 +86,11 @@ class ScriptedProviding final : public FPDProviding,
     const Lock held(lock_);
     reply_ = std::move(completion);
   }
+  // One byte more each time, until all that it has are here.
+  void getProgress(FPDProgressCompletion completion) override {
+    const int asked = ++progressQuestions;
+    completion(std::min(asked, mostProgress.load()), mostProgress.load());
+  }
   void cancel() override { ++cancels; }
   std::shared_ptr<FPDProviding> remoteObjectProxyWithErrorHandler(NSXPCErrorHandler handler) override {
     const Lock held(lock_);
@@ -119,6 +125,8 @@ class ScriptedProviding final : public FPDProviding,
     }
     handler(error);
   }
+  std::atomic<int> progressQuestions{0};
+  std::atomic<int> mostProgress{0};
   std::atomic<int> cancels{0};
 
  private:

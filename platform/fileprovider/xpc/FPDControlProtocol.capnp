@@ -32,6 +32,8 @@ interface FPDControlProtocol {
       -> (thumbnails :Thumbnails.FPDThumbnails, error :Values.Error);
   defaultContainer @14 (identifier :Data) -> (item :Values.Item, error :Values.Error);
   fillDesktopThumbnails @15 (identifier :Data) -> (error :Values.Error);
+  mountAtPath @16 (path :Data) -> (mountPoint :Data, error :Values.Error);
+  unmount @17 () -> (error :Values.Error);
 }
 
 interface FPDWatch {
@@ -60,4 +62,6 @@ struct FPDStatus {
   watchers @7 :UInt64;
   signals @8 :UInt64;
   lastExtensionEnd @9 :Data;
+  mountPoint @10 :Data;
+  mountProblem @11 :Data;
 }

@@ -49,6 +49,8 @@ void writeStatus(schema::FPDStatus::Builder builder, const FPDStatus &status) {
   builder.setWatchers(status.watchers);
   builder.setSignals(status.signals);
   builder.setLastExtensionEnd(xpcBytes(status.lastExtensionEnd));
+  builder.setMountPoint(xpcBytes(status.mountPoint));
+  builder.setMountProblem(xpcBytes(status.mountProblem));
 }
 
 FPDStatus readStatus(schema::FPDStatus::Reader reader) {
@@ -63,6 +65,8 @@ FPDStatus readStatus(schema::FPDStatus::Reader reader) {
   status.watchers = reader.getWatchers();
   status.signals = reader.getSignals();
   status.lastExtensionEnd = xpcString(reader.getLastExtensionEnd());
+  status.mountPoint = xpcString(reader.getMountPoint());
+  status.mountProblem = xpcString(reader.getMountProblem());
   return status;
 }
 
@@ -215,6 +219,21 @@ class ControlServer final : public Schema::Server {
         context, [identifier = xpcString(context.getParams().getIdentifier())](auto &object, auto reply) {
           object.fillDesktopThumbnailsForContainer(identifier, reply(writeOutcome));
         });
+  }
+
+  kj::Promise<void> mountAtPath(MountAtPathContext context) override {
+    return exported_.serve(
+        context, [path = xpcString(context.getParams().getPath())](auto &object, auto reply) {
+          object.mountAtPath(
+              path, reply([](auto results, Session &, const std::string &mountPoint, const NSError &error) {
+                results.setMountPoint(xpcBytes(mountPoint));
+                setError(results, error);
+              }));
+        });
+  }
+
+  kj::Promise<void> unmount(UnmountContext context) override {
+    return exported_.serve(context, [](auto &object, auto reply) { object.unmount(reply(writeOutcome)); });
   }
 
  private:
@@ -371,6 +390,20 @@ class ControlProxy final : public XPCProxy<Schema, FPDControlProtocol, ControlPr
         &Client::fillDesktopThumbnailsRequest,
         [identifier](auto params, Session &) { params.setIdentifier(xpcBytes(identifier)); },
         std::move(completion), readOutcome, XPCWithoutDeadline);
+  }
+
+  void mountAtPath(const std::string &path, FPDMountCompletion completion) override {
+    call(
+        &Client::mountAtPathRequest, [path](auto params, Session &) { params.setPath(xpcBytes(path)); },
+        std::move(completion),
+        [](auto results, const RemoteObject &) {
+          return std::tuple(xpcString(results.getMountPoint()), getError(results));
+        });
+  }
+
+  void unmount(NSFileProviderErrorCompletion completion) override {
+    call(
+        &Client::unmountRequest, [](auto, Session &) {}, std::move(completion), readOutcome);
   }
 };
 
