@@ -168,28 +168,29 @@ NSError DesktopThumbnailFiller::fetch(const std::vector<Wanted> &documents) {
   const auto [thumbnails, failure] = await<std::shared_ptr<FPDThumbnails>, NSError>(
       [&](const auto &reply) { RelayedThumbnails::open(calls_, identifiers, kLargest, reply); });
   if (!thumbnails) return failure;
+  NSError notKept;
   for (;;) {
     const auto [some, isLast, error] = await<std::vector<FPDThumbnail>, bool, NSError>(
         [&, &from = *thumbnails](const auto &reply) { from.nextWithReply(reply); });
     for (const FPDThumbnail &thumbnail : some) {
       const auto found = byIdentifier.find(thumbnail.identifier);
-      if (found != byIdentifier.end()) store(*found->second, thumbnail);
+      if (found == byIdentifier.end()) continue;
+      if (NSError failed = store(*found->second, thumbnail)) notKept = failed;
     }
-    if (isLast) return error;
+    if (isLast) return error ? error : notKept;
   }
 }
 
-void DesktopThumbnailFiller::store(const Wanted &document, const FPDThumbnail &thumbnail) {
-  NSError error = thumbnail.error;
-  const auto picture = error ? std::nullopt : PNGImage::read(thumbnail.imageData, &error);
+NSError DesktopThumbnailFiller::store(const Wanted &document, const FPDThumbnail &thumbnail) {
+  const auto picture = thumbnail.error ? std::nullopt : PNGImage::read(thumbnail.imageData, nullptr);
   if (!picture) {
     if (without_.size() >= kMostKnownWithout) without_.clear();
     if (!thumbnail.error) without_[document.state()] = std::chrono::steady_clock::now();
-    return;
+    return {};
   }
   for (const DesktopThumbnailSubject &subject : document.subjects)
-    if ((error = cache_.store(subject, *picture)))
-      os_log_error(log(), "[ERROR] can't keep the thumbnail of %@: %@", subject.path, error);
+    if (NSError error = cache_.store(subject, *picture)) return error;
+  return {};
 }
 
 }  // namespace droxa

@@ -61,7 +61,7 @@ class DesktopThumbnailFiller final : public std::enable_shared_from_this<Desktop
   NSError locate(const std::string &container, std::string *path) const;
   Wanted wanted(const std::string &folder, const NSFileProviderItemFields &item);
   NSError fetch(const std::vector<Wanted> &documents);
-  void store(const Wanted &document, const FPDThumbnail &thumbnail);
+  NSError store(const Wanted &document, const FPDThumbnail &thumbnail);  // why it can't be kept
 
   const std::shared_ptr<ExtensionCalls> calls_;
   const DesktopThumbnails cache_;
