@@ -14,6 +14,7 @@
 #include "cli/ItemArgument.h"
 #include "cli/Run.h"
 #include "cli/ShareCommands.h"
+#include "cli/ThumbnailCommands.h"
 #include "platform/foundation/Paths.h"
 #include "tessaly/QVDaemonConnection.h"
 
@@ -40,7 +41,8 @@ struct Words {
   std::string argument;
   std::string name;
   std::vector<std::string> items;
-  std::string folder, cloud, device, account;
+  std::string folder, cloud, device, account, mount;
+  bool noMount = false;
   std::int32_t process = 0;
   bool json = false;
 };
@@ -65,6 +67,7 @@ class CommandLine {
     addItemCommands();
     contents_.emplace(app_);
     actions_.emplace(app_);
+    thumbnails_.emplace(app_);
     sharing_.emplace(app_);
     addSystemCommands();
   }
@@ -72,6 +75,7 @@ class CommandLine {
   CLI::App &app() { return app_; }
   const ContentsCommands &contents() const { return *contents_; }
   const ActionCommands &actions() const { return *actions_; }
+  const ThumbnailCommands &thumbnails() const { return *thumbnails_; }
   const ShareCommands &sharing() const { return *sharing_; }
   bool has(const char *command) const { return app_.got_subcommand(command); }
   bool hasAccount(const char *command) const { return account_->got_subcommand(command); }
@@ -136,6 +140,11 @@ class CommandLine {
                    ->type_name("PID")
                    ->check(CLI::Range(1, std::numeric_limits<std::int32_t>::max()));
     entitlements->add_flag("--json", words_.json, "One JSON object");
+    addArgument(add("mount",
+                    "Shows the drive as a folder, which every program can use, and prints where. Documents\n"
+                    "that aren't here are fetched when they are read"),
+                "dir", "An empty folder; made if it isn't there (default: ~/Droxa Drive)");
+    add("unmount", "Takes the folder off again");
     account_ = add("account", "Shows, signs in or signs out the account");
     account_->add_subcommand("show", "Shows who is signed in")
         ->fallthrough()
@@ -173,6 +182,11 @@ class CommandLine {
            "The account in the cloud that the drive belongs to, remembered too: homes of two accounts\n"
            "on one cloud are two people's (default: who runs it)")
         ->type_name("NAME");
+    auto *mount = run->add_option("--mount", words_.mount,
+                                  "The folder that shows the drive (default: \"~/Droxa Drive\", or \"Droxa "
+                                  "Drive\" in a home\nthat isn't the usual one)")
+                      ->type_name("DIR");
+    run->add_flag("--no-mount", words_.noMount, "Shows the drive as no folder")->excludes(mount);
   }
 
   CLI::App *add(const char *name, const char *description) {
@@ -187,6 +201,7 @@ class CommandLine {
   CLI::App app_;
   std::optional<ContentsCommands> contents_;
   std::optional<ActionCommands> actions_;
+  std::optional<ThumbnailCommands> thumbnails_;
   std::optional<ShareCommands> sharing_;
   CLI::App *account_ = nullptr;
   CLI::Option *depth_ = nullptr;
@@ -211,7 +226,8 @@ int runCommand(const CommandLine &line, const Words &words, std::ostream &out, s
   const std::optional<std::string> home = given(words.home);
   if (line.has("run"))
     return runRun(out, err,
-                  {home, given(words.folder), given(words.cloud), given(words.device), given(words.account)});
+                  {home, given(words.folder), given(words.cloud), given(words.device), given(words.account),
+                   given(words.mount), !words.noMount});
 
   DroxaSetProcessHome(DroxaHome::resolve(home));
   const std::chrono::milliseconds timeout(std::llround(words.timeout * 1000));
@@ -234,15 +250,19 @@ int runCommand(const CommandLine &line, const Words &words, std::ostream &out, s
     return runTree(context, options);
   }
   // Before there are threads that could take the signal.
-  if (line.has("watch") || line.contents().canBeStopped() || line.actions().canBeStopped())
+  if (line.has("watch") || line.contents().canBeStopped() || line.actions().canBeStopped() ||
+      line.thumbnails().canBeStopped())
     waitForStopSignal(std::chrono::milliseconds(0));
   if (line.has("watch")) return runWatch(context, words.argument, words.json);
   if (line.contents().isChosen()) return line.contents().run(context);
   if (line.actions().isChosen()) return line.actions().run(context);
+  if (line.thumbnails().isChosen()) return line.thumbnails().run(context);
   if (line.sharing().isChosen()) return line.sharing().run(context);
   if (line.has("status"))
     return words.items.empty() ? runStatus(context, words.json)
                                : runItemStatus(context, words.items, words.json);
+  if (line.has("mount")) return runMount(context, words.argument);
+  if (line.has("unmount")) return runUnmount(context);
   if (line.has("entitlements"))
     return runEntitlements(context, line.hasProcess() ? std::optional(words.process) : std::nullopt,
                            words.json);

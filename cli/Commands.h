@@ -48,6 +48,18 @@ int runDownload(CommandContext &context, const std::vector<std::string> &argumen
 int runEvict(CommandContext &context, const std::vector<std::string> &arguments, bool json);
 int runPin(CommandContext &context, const std::vector<std::string> &arguments, bool isPinned, bool json);
 
+struct ThumbnailOptions {
+  std::vector<std::string> arguments;
+  std::uint32_t size = 256;  // the longest side, in pixels
+  std::string folder = ".";  // where the pictures go
+  bool fillsCache = false;   // into the desktop's cache instead, those of folders
+  bool json = false;
+};
+int runThumbnail(CommandContext &context, const ThumbnailOptions &options);
+
+// Without an application: the folder of everybody's documents.
+int runDefaultFolder(CommandContext &context, const std::optional<std::string> &application, bool json);
+
 struct WaitOptions {
   std::vector<std::string> arguments;  // none: the whole drive
   std::optional<std::chrono::milliseconds> timeout;
@@ -60,6 +72,10 @@ int runDeletions(CommandContext &context, DeletionsAnswer answer, bool json);
 
 // What the process would be granted when it connects; without one, all that the files grant.
 int runEntitlements(CommandContext &context, std::optional<std::int32_t> process, bool json);
+
+// `path` absolute, or "" for where the drive is mounted by default.
+int runMount(CommandContext &context, const std::string &path);
+int runUnmount(CommandContext &context);
 
 int runAccountShow(CommandContext &context, bool json);
 int runAccountSignIn(CommandContext &context, const std::string &name);

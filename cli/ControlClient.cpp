@@ -86,6 +86,64 @@ CallResult<std::shared_ptr<FPDAction>> ControlClient::performAction(const FPDAct
   });
 }
 
+CallResult<std::shared_ptr<FPDThumbnails>> ControlClient::fetchThumbnails(
+    const std::vector<std::string> &identifiers, CGSize size) {
+  using Thumbnails = std::shared_ptr<FPDThumbnails>;
+  return ask<Thumbnails>(*connecting_, timeout_, [&](FPDControlProtocol &control, auto slot) {
+    control.fetchThumbnailsForItemIdentifiers(identifiers, size,
+                                              [slot](const Thumbnails &thumbnails, const NSError &error) {
+                                                slot->put({thumbnails, error});
+                                              });
+  });
+}
+
+NSError ControlClient::fillDesktopThumbnails(
+    const std::string &container, const std::function<bool(std::chrono::milliseconds)> &waitForStop,
+    bool *wasStopped) {
+  constexpr std::chrono::milliseconds kLook{50};
+  const auto slot = std::make_shared<AnswerSlot<bool>>();
+  NSError error;
+  const auto control = connecting_->control(
+      [slot](const NSError &failure) {
+        slot->put({false, failure});
+      },
+      &error);
+  if (!control) return error;
+  control->fillDesktopThumbnailsForContainer(container, [slot](const NSError &outcome) {
+    slot->put({true, outcome});
+  });
+  for (;;) {
+    if (const auto end = slot->waitFor(kLook)) return end->error;
+    *wasStopped = waitForStop(std::chrono::milliseconds(0));
+    if (*wasStopped) return {};
+  }
+}
+
+CallResult<ControlClient::Item> ControlClient::defaultContainer(
+    const std::optional<std::string> &application) {
+  return ask<Item>(*connecting_, timeout_, [&](FPDControlProtocol &control, auto slot) {
+    control.defaultContainerForBundleIdentifier(application, [slot](const Item &item, const NSError &error) {
+      slot->put({item, error});
+    });
+  });
+}
+
+CallResult<std::string> ControlClient::mount(const std::string &path) {
+  return ask<std::string>(*connecting_, timeout_, [&](FPDControlProtocol &control, auto slot) {
+    control.mountAtPath(path, [slot](const std::string &mountPoint, const NSError &error) {
+      slot->put({mountPoint, error});
+    });
+  });
+}
+
+NSError ControlClient::unmount() {
+  return ask<bool>(*connecting_, timeout_,
+                   [](FPDControlProtocol &control, auto slot) {
+                     control.unmount([slot](const NSError &error) { slot->put({!error, error}); });
+                   })
+      .error;
+}
+
 CallResult<std::shared_ptr<FPDService>> ControlClient::service(const std::string &name,
                                                                const std::string &identifier) {
   using Service = std::shared_ptr<FPDService>;

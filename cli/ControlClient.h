@@ -1,8 +1,11 @@
 #pragma once
 
 #include <chrono>
+#include <functional>
 #include <memory>
+#include <optional>
 #include <string>
+#include <vector>
 
 #include "cli/CallResult.h"
 #include "cli/ControlConnecting.h"
@@ -45,8 +48,20 @@ class ControlClient {
   // An action that hasn't begun: it does when it is waited for (cli/Acting.h).
   CallResult<std::shared_ptr<FPDAction>> performAction(const FPDActionRequest &request);
 
+  // Thumbnails that are fetched once the next ones are asked for (cli/Thumbnail.cpp).
+  CallResult<std::shared_ptr<FPDThumbnails>> fetchThumbnails(const std::vector<std::string> &identifiers,
+                                                             CGSize size);
+  // However long it takes.
+  NSError fillDesktopThumbnails(const std::string &container,
+                                const std::function<bool(std::chrono::milliseconds)> &waitForStop,
+                                bool *wasStopped);
+  // nullopt: of no application.
+  CallResult<Item> defaultContainer(const std::optional<std::string> &application);
   // A service on the item, to be held until the first reply over its connection has come.
   CallResult<std::shared_ptr<FPDService>> service(const std::string &name, const std::string &identifier);
+
+  CallResult<std::string> mount(const std::string &path);  // where it is mounted now
+  NSError unmount();
 
   CallResult<Page> page(const Enumerator &enumerator, const NSData &page);
   CallResult<NSData> anchor(const Enumerator &enumerator);

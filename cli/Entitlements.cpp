@@ -3,6 +3,7 @@
 #include <sys/syscall.h>
 #include <sysexits.h>
 #include <unistd.h>
+#include <variant>
 
 #include "cli/Commands.h"
 #include "cli/ExitStatus.h"
@@ -24,7 +25,20 @@ const char *kindText(const EntitlementGrant &grant) {
 }
 
 Json grantJSON(const EntitlementGrant &grant) {
-  return {{kindText(grant), grant.application}, {"entitlements", grant.entitlements}, {"file", grant.file}};
+  Json object{
+      {kindText(grant), grant.application}, {"entitlements", grant.entitlements}, {"file", grant.file}};
+  for (const auto &[name, value] : grant.values)
+    object["values"][name] = std::visit([](const auto &held) { return Json(held); }, value);
+  return object;
+}
+
+std::string valueText(const EntitlementValue &value) {
+  if (const auto *text = std::get_if<std::string>(&value)) return ": " + escapedText(*text);
+  const auto *texts = std::get_if<std::vector<std::string>>(&value);
+  if (!texts) return "";
+  std::string line = ":";
+  for (const std::string &text : *texts) line += " " + escapedText(text);
+  return line;
 }
 
 Json problemsJSON(const std::vector<EntitlementProblem> &problems) {
@@ -44,7 +58,8 @@ void printGrant(std::ostream &out, const EntitlementGrant &grant) {
   out << kindText(grant) << ' ' << escapedText(grant.application) << ", by " << escapedText(grant.file)
       << ":\n";
   for (const std::string &entitlement : grant.entitlements) out << "  " << escapedText(entitlement) << '\n';
-  if (grant.entitlements.empty()) out << "  nothing\n";
+  for (const auto &[name, value] : grant.values) out << "  " << escapedText(name) << valueText(value) << '\n';
+  if (grant.entitlements.empty() && grant.values.empty()) out << "  nothing\n";
 }
 
 void printProblems(std::ostream &out, const std::vector<EntitlementProblem> &problems) {

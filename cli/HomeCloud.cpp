@@ -9,6 +9,7 @@
 #include <unistd.h>
 
 #include "cli/Text.h"
+#include "tessaly/QVHomeCloud.h"
 
 namespace droxa {
 
@@ -35,20 +36,15 @@ bool isAtOrBelow(const std::string &path, const std::string &folder) {
 
 // nullopt when nothing is remembered; with `problem` when it can't be read.
 std::optional<HomeCloud> remembered(const DroxaHome &home, std::string *problem) {
-  std::ifstream file(settingsFile(home));
-  if (!file) return std::nullopt;
-  const Json json = Json::parse(file, nullptr, false);
-  const auto text = [&json](const char *key) {
-    return json.is_object() && json.contains(key) && json[key].is_string() ? json[key].get<std::string>()
-                                                                           : "";
-  };
-  if (!json.is_object()) {
+  NSError error;
+  const auto known = QVHomeCloudRead(home, &error);
+  if (error) {
     *problem = settingsFile(home) +
                " can't be read; it says which cloud this home's drive is in. Put it right, "
                "or remove it and name the cloud with --cloud";
-    return std::nullopt;
   }
-  return HomeCloud{text("cloud"), text("device"), text("account")};
+  if (!known) return std::nullopt;
+  return HomeCloud{known->folder, known->device, known->account};
 }
 
 // Until keld has opened the cloud for the first time, nothing depends on it.

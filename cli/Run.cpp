@@ -1,6 +1,7 @@
 #include "cli/Run.h"
 
 #include <filesystem>
+#include <fstream>
 #include <iostream>
 #include <pwd.h>
 #include <sysexits.h>
@@ -63,6 +64,7 @@ class Run {
     std::string problem;
     Outcome outcome = startAll(setup.isNew, &problem);
     if (outcome == Outcome::ready) outcome = awaitDocuments(setup.imported);
+    if (outcome == Outcome::ready) outcome = awaitMount();
     if (outcome == Outcome::stopped) return kExitSuccess;
     if (outcome == Outcome::failed) {
       supervisor_.stop();
@@ -79,6 +81,11 @@ class Run {
 
   void printNextSteps() {
     const std::string droxa = quoted(programBeside("droxa")) + " --home " + quoted(home_.root());
+    const std::string &folder = hostStatus_.mountPoint;
+    if (!folder.empty())
+      out_ << "folder: " << quoted(folder) << "\n";
+    else if (!hostStatus_.mountProblem.empty())
+      out_ << "folder: none: " << hostStatus_.mountProblem << "\n";
     out_ << "files:  " << documentsFolder(home_.replica(), kDefaultContainer) << "\n"
          << "cloud:  " << cloudFolder(home_, cloud_) << "\n"
          << "next:   " << droxa << " ls -l\n"
@@ -142,6 +149,19 @@ class Run {
     return Outcome::ready;
   }
 
+  // The folder is there when the drive is said to run; where it can't be, the rest works without it.
+  Outcome awaitMount() {
+    const auto isSettled = [this] {
+      hostAnswers();
+      return !hostStatus_.mountPoint.empty() || !hostStatus_.mountProblem.empty();
+    };
+    const auto until = ChildProcess::Clock::now() + kShowPatience;
+    std::error_code code;
+    while (fs::exists(home_.mountFile(), code) && !isSettled() && ChildProcess::Clock::now() < until)
+      if (supervisor_.keepRunning(50ms)) return Outcome::stopped;
+    return Outcome::ready;
+  }
+
   bool signInSomebody(std::string *problem) {
     const auto account = daemon_.account();
     if (!account.error && account.value) return true;
@@ -201,6 +221,20 @@ std::optional<HomeSetup> setUp(const DroxaHome &home, const HomeCloud &cloud,
   return setUpHome(home, request, problem);
 }
 
+// Tells the host, also one that is started again, where to mount the drive.
+bool noteMount(const DroxaHome &home, const RunOptions &options, std::string *problem) {
+  std::error_code code;
+  fs::remove(home.mountFile(), code);
+  if (!options.isMounted) return true;
+  const std::string path = options.mount ? fs::absolute(*options.mount, code).lexically_normal().native()
+                                         : home.defaultMountPoint();
+  std::ofstream file(home.mountFile());
+  file << path << std::flush;
+  if (file) return true;
+  *problem = home.mountFile() + ": can't be written";
+  return false;
+}
+
 }  // namespace
 
 DroxaHome homeForFolder(const std::string &folder) {
@@ -252,6 +286,7 @@ int runRun(std::ostream &out, std::ostream &err, const RunOptions &options) {
     return kExitSuccess;
   }
   if (!lock || !rememberHomeCloud(home, *cloud, &problem)) return fail(EX_CANTCREAT);
+  if (!noteMount(home, options, &problem)) return fail(EX_CANTCREAT);
   const auto setup = setUp(home, *cloud, folder, out, err, &problem);
   if (!setup) return fail(EX_CANTCREAT);
   if (setup->isStopped) {

@@ -14,6 +14,8 @@ struct RunOptions {
   std::optional<std::string> cloud;   // the folder that the drive's cloud is in
   std::optional<std::string> device;
   std::optional<std::string> account;  // that the drive belongs to
+  std::optional<std::string> mount;    // the folder that shows the drive, else the home's default one
+  bool isMounted = true;
 };
 
 // `droxa run`: serves a drive in the foreground until Ctrl-C. Gives the exit status.

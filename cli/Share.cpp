@@ -58,35 +58,46 @@ SharedItem sharedItem(CommandContext &context, const std::string &argument, int 
   return {};
 }
 
-void print(const CommandContext &context, const ShareArguments &arguments, const CKShare &share) {
-  context.out << (arguments.json ? shareJSON(arguments.item, share) : shareLines(arguments.item, share))
+void print(const CommandContext &context, const ShareArguments &arguments, const CKShare &share,
+           const std::optional<std::string> &folder = std::nullopt) {
+  context.out << (arguments.json ? shareJSON(arguments.item, share, folder)
+                                 : shareLines(arguments.item, share, folder))
               << std::flush;
 }
 
-// What is to be changed of an item that is shared by way of a folder above it is that folder's share.
-bool refuseForFolder(CommandContext &context, const ShareArguments &arguments, const std::string &identifier,
-                     int *status) {
+// The shared folder above the item by way of which it is shared; nullopt: it is shared by itself, or isn't,
+// or nobody can tell.
+std::optional<std::string> folderSharing(const CommandContext &context, const std::string &identifier) {
   const auto options = DaemonClient(context.daemon, context.timeout).shareOptions(identifier);
-  if (options.error || !options.value.isShared || options.value.isSharedByItself) return false;
-  *status = refuse(context, arguments.item,
-                   "it is shared with the folder " + escapedText(options.value.folder.value_or("above it")) +
-                       " that it is in; change that folder's share");
-  return true;
+  if (options.error || !options.value.isShared || options.value.isSharedByItself) return std::nullopt;
+  return options.value.folder.value_or("above it");
 }
 
 enum class Want { toLook, toChange };
 
-// Runs `command` with the item's share, whichever there is.
+// Runs `command` with the item's share, whichever there is, and the folder by way of which it is shared. What
+// is shared by way of a folder is changed there.
 template <class Command>
-int withShare(CommandContext &context, const ShareArguments &arguments, Want want, const Command &command) {
+int withShareAndFolder(CommandContext &context, const ShareArguments &arguments, Want want,
+                       const Command &command) {
   int status = kExitSuccess;
   const SharedItem item = sharedItem(context, arguments.item, &status);
   if (!item.client) return status;
   const auto share = item.client->fetch();
   if (share.error) return reportShareError(context, arguments.item, share.error);
-  const bool isRefused = want == Want::toChange && share.value.isKnownToServer() &&
-                         refuseForFolder(context, arguments, item.identifier, &status);
-  return isRefused ? status : command(*item.client, share.value);
+  const auto folder = share.value.isKnownToServer() ? folderSharing(context, item.identifier) : std::nullopt;
+  if (folder && want == Want::toChange)
+    return refuse(context, arguments.item,
+                  "it is shared with the folder " + escapedText(*folder) +
+                      " that it is in; change that folder's share");
+  return command(*item.client, share.value, folder);
+}
+
+template <class Command>
+int withShare(CommandContext &context, const ShareArguments &arguments, Want want, const Command &command) {
+  return withShareAndFolder(
+      context, arguments, want,
+      [&](ShareClient &client, const CKShare &share, const auto &) { return command(client, share); });
 }
 
 // The same for what has to be shared already.
@@ -127,10 +138,12 @@ int refuseUnknown(const CommandContext &context, const ShareArguments &arguments
 }  // namespace
 
 int runShareShow(CommandContext &context, const ShareArguments &arguments) {
-  return withShare(context, arguments, Want::toLook, [&](ShareClient &, const CKShare &share) {
-    print(context, arguments, share);
-    return kExitSuccess;
-  });
+  return withShareAndFolder(
+      context, arguments, Want::toLook,
+      [&](ShareClient &, const CKShare &share, const std::optional<std::string> &folder) {
+        print(context, arguments, share, folder);
+        return kExitSuccess;
+      });
 }
 
 int runShareCreate(CommandContext &context, const ShareArguments &arguments) {

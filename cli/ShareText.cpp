@@ -85,9 +85,11 @@ std::string participantLine(const CKShareParticipant &participant) {
          statusText(participant.acceptanceStatus) + "\n";
 }
 
-std::string shareLines(const std::string &item, const CKShare &share) {
+std::string shareLines(const std::string &item, const CKShare &share,
+                       const std::optional<std::string> &folder) {
   if (!share.isKnownToServer()) return escapedText(item) + ": not shared\n";
-  std::string lines = escapedText(item) + ": shared\n";
+  std::string lines =
+      escapedText(item) + ": shared" + (folder ? " with the folder " + escapedText(*folder) : "") + "\n";
   if (share.URL) lines += "  link      " + escapedText(share.URL.absoluteString()) + "\n";
   if (const auto *title = share.get<std::string>(CKShareTitleKey))
     lines += "  title     " + escapedText(*title) + "\n";
@@ -96,12 +98,14 @@ std::string shareLines(const std::string &item, const CKShare &share) {
   return lines;
 }
 
-std::string shareJSON(const std::string &item, const CKShare &share) {
+std::string shareJSON(const std::string &item, const CKShare &share,
+                      const std::optional<std::string> &folder) {
   Json object{{"item", item}, {"shared", share.isKnownToServer()}};
   if (share.isKnownToServer()) {
     object["link"] = share.URL ? Json(share.URL.absoluteString()) : Json(nullptr);
     object["title"] = textOrNull(share.get<std::string>(CKShareTitleKey));
     object["type"] = textOrNull(share.get<std::string>(CKShareTypeKey));
+    object["folder"] = textOrNull(folder ? &*folder : nullptr);
     object["everyone"] = permissionText(share.publicPermission);
     object["participants"] = Json::array();
     for (const CKShareParticipant &one : share.participants)

@@ -14,9 +14,11 @@ std::optional<CKShareParticipantPermission> permissionOfText(const std::string &
 // One line of `droxa share participants`: name, permission, state.
 std::string participantLine(const CKShareParticipant &participant);
 // The lines of `droxa share`, and the same as one JSON object. A share that isn't known to the server is
-// none.
-std::string shareLines(const std::string &item, const CKShare &share);
-std::string shareJSON(const std::string &item, const CKShare &share);
+// none; `folder` is the one above the item whose share it is, if it is.
+std::string shareLines(const std::string &item, const CKShare &share,
+                       const std::optional<std::string> &folder);
+std::string shareJSON(const std::string &item, const CKShare &share,
+                      const std::optional<std::string> &folder);
 // The link alone, as a line or one JSON object.
 std::string linkText(const std::string &item, const NSURL &link, bool json);
 

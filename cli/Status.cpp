@@ -90,7 +90,11 @@ void printHost(std::ostream &out, const CallResult<FPDStatus> &host) {
   }
   out << kIndentation << "started " << countText(status.extensionLaunches, "time");
   if (!status.lastExtensionEnd.empty()) out << "; last ended with " << status.lastExtensionEnd;
-  out << '\n';
+  out << '\n' << "mount          ";
+  if (!status.mountPoint.empty())
+    out << escapedText(status.mountPoint) << '\n';
+  else
+    out << "none" << (status.mountProblem.empty() ? "" : ": " + escapedText(status.mountProblem)) << '\n';
 }
 
 Json daemonJSON(const CallResult<QVDaemonStatus> &daemon) {
@@ -119,7 +123,9 @@ Json hostJSON(const CallResult<FPDStatus> &host) {
           {"followedContainers", status.followedContainers},
           {"cachedItems", status.cachedItems},
           {"watchers", status.watchers},
-          {"signals", status.signals}};
+          {"signals", status.signals},
+          {"mount", status.mountPoint.empty() ? Json(nullptr) : Json(status.mountPoint)},
+          {"mountProblem", status.mountProblem}};
 }
 
 Json extensionJSON(const CallResult<FPDStatus> &host) {

@@ -6,6 +6,7 @@
 #include "extension/HostedEnumerator.h"
 #include "extension/HostedProviding.h"
 #include "extension/HostedService.h"
+#include "extension/HostedThumbnails.h"
 #include "platform/fileprovider/NSFileProviderError.h"
 #include "platform/foundation/NSFileManager.h"
 
@@ -92,6 +93,16 @@ void HostedExtension::listenerEndpointForServiceName(const std::string &name,
     return completion(std::make_shared<HostedService>(source, *endpoint), {});
   }
   completion(nullptr, error ? error : NoSuchService(name, itemIdentifier));
+}
+
+void HostedExtension::fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers,
+                                                        CGSize size, FPDThumbnailsCompletion completion) {
+  completion(std::make_shared<HostedThumbnails>(principal_, identifiers, size), {});
+}
+
+void HostedExtension::defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                                          NSFileProviderItemCompletion completion) {
+  principal_->_defaultApplicationContainerForBundleIdentifier(bundleIdentifier, std::move(completion));
 }
 
 }  // namespace droxa

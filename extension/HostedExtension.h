@@ -38,6 +38,13 @@ class HostedExtension final : public NSFileProviderExtensionProtocol {
   void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
                                       FPDServiceCompletion completion) override;
 
+  // Always with thumbnails, which the first request for the next ones begins (HostedThumbnails).
+  void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers, CGSize size,
+                                         FPDThumbnailsCompletion completion) override;
+  // When the principal completes, on any thread.
+  void defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                           NSFileProviderItemCompletion completion) override;
+
  private:
   const std::shared_ptr<NSFileProviderExtension> principal_;
 };

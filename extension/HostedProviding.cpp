@@ -4,6 +4,7 @@
 #include <utility>
 #include <vector>
 
+#include "platform/dispatch/dispatch.h"
 #include "platform/foundation/ThreadSafety.h"
 #include "tessaly/QVLog.h"
 
@@ -60,6 +61,14 @@ void HostedProviding::waitWithReply(NSFileProviderErrorCompletion completion) {
     error = *outcome_->error;
   }
   completion(error);
+}
+
+// On a thread of its own: the daemon may not answer, and nobody who cancels waits behind it.
+void HostedProviding::getProgress(FPDProgressCompletion completion) {
+  dispatch_async_global([principal = principal_, url = url_, completion = std::move(completion)] {
+    const auto [completed, total] = principal->progressOfProvidingItemAtURL(url);
+    completion(completed, total);
+  });
 }
 
 void HostedProviding::cancel() {

@@ -24,6 +24,7 @@ class HostedProviding final : public FPDProviding {
   HostedProviding &operator=(const HostedProviding &) = delete;
 
   void waitWithReply(NSFileProviderErrorCompletion completion) override;
+  void getProgress(FPDProgressCompletion completion) override;
   void cancel() override;
 
  private:

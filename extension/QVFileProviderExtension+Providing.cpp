@@ -114,6 +114,15 @@ void QVFileProviderExtension::stopProvidingItemAtURL(const NSURL &url) {
   }
 }
 
+std::pair<std::int64_t, std::int64_t> QVFileProviderExtension::progressOfProvidingItemAtURL(
+    const NSURL &url) {
+  const auto download = std::dynamic_pointer_cast<QVFileProvidingOperation>(downloadAtPath(url.path()));
+  if (!download) return {0, -1};
+  const QVFileProvidingOperation::Progress progress = download->progress();
+  return {static_cast<std::int64_t>(progress.completedBytes),
+          progress.totalBytes == 0 ? -1 : static_cast<std::int64_t>(progress.totalBytes)};
+}
+
 void QVFileProviderExtension::cancelProvidingItemAtURL(const NSURL &url) {
   if (!downloadAtPath(url.path()) || isDownloadForced(url)) return;
   if (const auto operation = downloadAtPath(url.path())) operation->cancel();

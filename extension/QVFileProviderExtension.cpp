@@ -17,6 +17,7 @@
 #include "tessaly/QVPersona.h"
 #include "tessaly/QVQueryItem.h"
 #include "tessaly/QVUbiquitousItems.h"
+#include "thumbnails/QVUbiquitousCloudKitContainer.h"
 
 namespace droxa {
 namespace {
@@ -65,6 +66,7 @@ std::shared_ptr<QVFileProviderExtension> QVFileProviderExtension::init() {
   static std::once_flag classIsSetUp;
   std::call_once(classIsSetUp, initialize);
   QVInstallUbiquitousItemProvider();
+  QVRegisterUbiquitousCloudKitContainer();
 
   auto extension = std::make_shared<QVFileProviderExtension>(Passkey{});
   QVAccount::startAccountTokenChangeObserverIfNeeded();

@@ -86,6 +86,7 @@ class QVFileProviderExtension final : public NSFileProviderExtension {
   void startProvidingItemAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
   void stopProvidingItemAtURL(const NSURL &url) override;
   void cancelProvidingItemAtURL(const NSURL &url) override;
+  std::pair<std::int64_t, std::int64_t> progressOfProvidingItemAtURL(const NSURL &url) override;
   void itemChangedAtURL(const NSURL &url) override;
   void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) override;
   void movingItemAtURL_requiresProvidingWithDestinationURL(
@@ -124,6 +125,18 @@ class QVFileProviderExtension final : public NSFileProviderExtension {
                   NSFileProviderItemCompletion completion) override;
   void setFavoriteRank(const std::optional<std::uint64_t> &rank, const std::string &identifier,
                        NSFileProviderItemCompletion completion) override;
+
+  // Thumbnails: containers' icons, and documents' as the cloud has them.
+  std::shared_ptr<NSProgress> fetchThumbnailsForItemIdentifiers(
+      const std::vector<std::string> &identifiers, CGSize requestedSize,
+      NSFileProviderThumbnailHandler perThumbnailCompletionHandlerWithType,
+      NSFileProviderErrorCompletion completionHandler) override;
+
+  // Where an application's documents go: the folder of the first container that it is entitled to. Of no
+  // application, and of the documents browser: the top-level documents folder.
+  void _defaultApplicationContainerForBundleIdentifier(
+      const std::optional<std::string> &bundleIdentifier,
+      NSFileProviderItemCompletion completionHandler) override;
 
   // From the beginning to the end, a move needs the contents of the item, or of what is below it.
   void _beginForcedDownload(const std::string &identifier);

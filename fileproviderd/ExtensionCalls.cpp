@@ -203,4 +203,29 @@ void ExtensionCalls::listenerEndpointForServiceName(const std::string &name,
       ->attempt(1);
 }
 
+void ExtensionCalls::fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers,
+                                                       CGSize size, FPDThumbnailsCompletion completion) {
+  using ThumbnailsCall = Call<std::shared_ptr<FPDThumbnails>, NSError>;
+  std::make_shared<ThumbnailsCall>(
+      connecting_,
+      [identifiers, size](NSFileProviderExtensionProtocol &extension, ThumbnailsCall::Reply reply) {
+        extension.fetchThumbnailsForItemIdentifiers(identifiers, size, std::move(reply));
+      },
+      completion, [completion](const NSError &error) { completion(nullptr, error); })
+      ->attempt(1);
+}
+
+// Made once more it finds the folder that it made.
+void ExtensionCalls::defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                                         NSFileProviderItemCompletion completion) {
+  using ItemCall = Call<std::shared_ptr<const NSFileProviderItem>, NSError>;
+  std::make_shared<ItemCall>(
+      connecting_,
+      [bundleIdentifier](NSFileProviderExtensionProtocol &extension, ItemCall::Reply reply) {
+        extension.defaultContainerForBundleIdentifier(bundleIdentifier, std::move(reply));
+      },
+      completion, [completion](const NSError &error) { completion(nullptr, error); })
+      ->attempt(1);
+}
+
 }  // namespace droxa

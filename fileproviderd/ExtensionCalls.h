@@ -42,6 +42,12 @@ class ExtensionCalls {
   void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
                                       FPDServiceCompletion completion);
 
+  // They haven't begun; they end with the extension that gave them.
+  void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers, CGSize size,
+                                         FPDThumbnailsCompletion completion);
+  void defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                           NSFileProviderItemCompletion completion);
+
   // What to tell when the extension's end cut off what `error` says.
   NSError cutOffError(const NSError &error) const;
 

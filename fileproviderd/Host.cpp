@@ -8,8 +8,9 @@
 
 namespace droxa {
 
-std::shared_ptr<Host> Host::create(const std::string &extensionProgram) {
+std::shared_ptr<Host> Host::create(const std::string &extensionProgram, const std::string &ownProgram) {
   std::shared_ptr<Host> host(new Host());
+  host->ownProgram_ = ownProgram;
   host->startedNanoseconds_ = NSDate::now().nanosecondsSince1970();
   ExtensionLauncher::Configuration configuration;
   configuration.program = extensionProgram;
@@ -23,10 +24,16 @@ std::shared_ptr<Host> Host::create(const std::string &extensionProgram) {
   host->signals_ = std::make_shared<HostSignalReceiver>(host->followed_, listings);
   host->launcher_->setHost(host->signals_);
   host->control_ = std::make_shared<ControlService>(
-      calls, host->followed_, listings, DroxaProcessHome().replica(), [weak = std::weak_ptr<Host>(host)] {
+      calls, host->followed_, listings, DroxaProcessHome().replica(),
+      [weak = std::weak_ptr<Host>(host)] {
         const auto self = weak.lock();
         return self ? self->status() : FPDStatus();
-      });
+      },
+      std::make_shared<DesktopThumbnailFiller>(
+          calls, DesktopThumbnails(DesktopThumbnails::userFolder()),
+          std::vector<ShownFolder>{{DroxaProcessHome().replica(), DroxaProcessHome().replica()}}));
+  host->control_->setMount(
+      std::make_shared<HostMount>(calls, host->control_->providings(), DroxaProcessHome()));
   return host;
 }
 
@@ -35,11 +42,13 @@ bool Host::start(NSError *error) {
   if (!listener_) return false;
   listener_->setDelegate(weak_from_this());
   listener_->resume();
+  control_->mount().begin(ownProgram_);
   return true;
 }
 
 void Host::stop() {
   if (listener_) listener_->invalidate();
+  control_->mount().end();
   std::map<const NSXPCConnection *, std::shared_ptr<NSXPCConnection>> clients;
   {
     Lock held(lock_);

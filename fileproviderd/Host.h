@@ -16,8 +16,10 @@ namespace droxa {
 // connections.
 class Host final : public NSXPCListenerDelegate, public std::enable_shared_from_this<Host> {
  public:
-  // `extensionProgram` is started on demand for the process's home.
-  static std::shared_ptr<Host> create(const std::string &extensionProgram);
+  // `extensionProgram` is started on demand for the process's home; `ownProgram` is this process's, which
+  // understands Announcer::kArgument ("": it doesn't).
+  static std::shared_ptr<Host> create(const std::string &extensionProgram,
+                                      const std::string &ownProgram = {});
 
   // Listens at the home's socket. False, with `error` set, when that isn't possible.
   bool start(NSError *error);
@@ -34,6 +36,7 @@ class Host final : public NSXPCListenerDelegate, public std::enable_shared_from_
 
   // Constant after create().
   std::int64_t startedNanoseconds_ = 0;
+  std::string ownProgram_;
   std::shared_ptr<ExtensionLauncher> launcher_;
   std::shared_ptr<FollowedContainers> followed_;
   std::shared_ptr<HostSignalReceiver> signals_;

@@ -1,6 +1,10 @@
 #include "fileproviderd/HostServices.h"
 
+#include <cerrno>
+
 #include "fileproviderd/HostErrors.h"
+#include "fileproviderd/ObservedEnumerator.h"
+#include "fileproviderd/RelayedThumbnails.h"
 #include "platform/dispatch/dispatch.h"
 #include "platform/fileprovider/NSFileProviderError.h"
 
@@ -17,7 +21,7 @@ void HostSignalReceiver::signalEnumerator(const std::string &containerIdentifier
 ControlService::ControlService(std::shared_ptr<ExtensionCalls> calls,
                                std::shared_ptr<FollowedContainers> followed,
                                std::shared_ptr<OpenListings> listings, std::string replica,
-                               StatusSource status)
+                               StatusSource status, std::shared_ptr<DesktopThumbnailFiller> desktopThumbnails)
     : calls_(std::move(calls)),
       followed_(std::move(followed)),
       listings_(std::move(listings)),
@@ -25,13 +29,17 @@ ControlService::ControlService(std::shared_ptr<ExtensionCalls> calls,
       providings_(std::make_shared<Providings>(calls_)),
       actions_(calls_, followed_, listings_),
       services_(std::make_shared<Services>(calls_)),
-      status_(std::move(status)) {}
+      status_(std::move(status)),
+      desktopThumbnails_(std::move(desktopThumbnails)) {}
 
 void ControlService::getStatus(FPDStatusCompletion completion) {
   FPDStatus status = status_();
   status.cachedItems = followed_->cachedItemCount();
   status.followedContainers = followed_->followedCount();
   status.watchers = followed_->watcherCount();
+  const HostMount::State mount = mount_ ? mount_->state() : HostMount::State();
+  status.mountPoint = mount.path;
+  status.mountProblem = mount.problem;
   completion(status);
 }
 
@@ -45,11 +53,12 @@ void ControlService::itemForIdentifier(const std::string &identifier,
 
 void ControlService::itemAtPath(const std::string &path, NSFileProviderItemCompletion completion) {
   // A thread of its own: the search waits for the extension several times.
-  dispatch_async_global([paths = paths_, path, completion = std::move(completion)] {
-    NSError error;
-    const auto item = paths->itemAtPath(path, &error);
-    completion(item, item ? NSError() : error);
-  });
+  dispatch_async_global(
+      [paths = paths_, path = mount_ ? mount_->drivePath(path) : path, completion = std::move(completion)] {
+        NSError error;
+        const auto item = paths->itemAtPath(path, &error);
+        completion(item, item ? NSError() : error);
+      });
 }
 
 void ControlService::URLForItemIdentifier(const std::string &identifier,
@@ -67,14 +76,22 @@ void ControlService::enumeratorForContainer(const std::string &identifier,
                                             NSFileProviderEnumeratorCompletion completion) {
   calls_->enumeratorForContainer(
       identifier,
-      [calls = calls_, listings = listings_, identifier, completion](
+      [self = shared_from_this(), identifier, completion](
           const std::shared_ptr<NSFileProviderRemoteEnumerator> &enumerator, const NSError &error) {
-        std::shared_ptr<RelayedEnumerator> relayed;
-        if (enumerator) {
-          relayed = std::make_shared<RelayedEnumerator>(calls, identifier, enumerator);
-          listings->add(identifier, relayed);
-        }
-        completion(relayed, explainedError(identifier, error));
+        completion(enumerator ? self->relayed(identifier, enumerator) : nullptr,
+                   explainedError(identifier, error));
+      });
+}
+
+// What a client lists is what somebody looks at.
+std::shared_ptr<NSFileProviderRemoteEnumerator> ControlService::relayed(
+    const std::string &identifier, const std::shared_ptr<NSFileProviderRemoteEnumerator> &enumerator) const {
+  const auto relayed = std::make_shared<RelayedEnumerator>(calls_, identifier, enumerator);
+  listings_->add(identifier, relayed);
+  if (!desktopThumbnails_) return relayed;
+  return std::make_shared<ObservedEnumerator>(
+      relayed, [filler = desktopThumbnails_, identifier](const NSFileProviderItems &items) {
+        filler->itemsWereListed(identifier, items);
       });
 }
 
@@ -123,6 +140,48 @@ void ControlService::listenerEndpointForServiceName(const std::string &name,
                                                     FPDServiceCompletion completion) {
   const auto client = NSXPCConnection::currentConnection();
   services_->open(name, itemIdentifier, client ? client->peer().processIdentifier : 0, completion);
+}
+
+void ControlService::fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers,
+                                                       CGSize size, FPDThumbnailsCompletion completion) {
+  RelayedThumbnails::open(calls_, identifiers, size, completion);
+}
+
+// The top-level folder may be a container's, which making a folder of its name wouldn't find.
+void ControlService::defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                                         NSFileProviderItemCompletion completion) {
+  if (bundleIdentifier) return calls_->defaultContainerForBundleIdentifier(bundleIdentifier, completion);
+  itemAtPath("/Documents", [calls = calls_, completion](const auto &item, const NSError &error) {
+    const bool isMissing = error.is(NSFileProviderErrorDomain, NSFileProviderErrorNoSuchItem);
+    const bool isFolder = item && item->fields().kind == NSFileProviderItemKind::folder;
+    if (isFolder || (!item && !isMissing)) return completion(item, error);
+    calls->defaultContainerForBundleIdentifier(std::nullopt, completion);
+  });
+}
+
+void ControlService::fillDesktopThumbnailsForContainer(const std::string &identifier,
+                                                       NSFileProviderErrorCompletion completion) {
+  if (!desktopThumbnails_)
+    return completion(NSError::errorWithPOSIXCode(ENOSYS, "this host keeps no thumbnails for the desktop"));
+  desktopThumbnails_->fillContainer(identifier, std::move(completion));
+}
+
+// Threads of their own: both wait for the kernel, and the first for the extension.
+void ControlService::mountAtPath(const std::string &path, FPDMountCompletion completion) {
+  if (!mount_) return completion({}, NSError::errorWithPOSIXCode(ENODEV, "this host mounts nothing"));
+  dispatch_async_global([mount = mount_, path, completion = std::move(completion)] {
+    const std::string problem = mount->mount(path);
+    completion(problem.empty() ? mount->state().path : std::string(),
+               problem.empty() ? NSError() : NSError::errorWithPOSIXCode(ENODEV, problem));
+  });
+}
+
+void ControlService::unmount(NSFileProviderErrorCompletion completion) {
+  if (!mount_) return completion(NSError());
+  dispatch_async_global([mount = mount_, completion = std::move(completion)] {
+    mount->unmount();
+    completion(NSError());
+  });
 }
 
 }  // namespace droxa

@@ -6,7 +6,9 @@
 #include <string>
 
 #include "fileproviderd/Actions.h"
+#include "fileproviderd/DesktopThumbnailFiller.h"
 #include "fileproviderd/FollowedContainers.h"
+#include "fileproviderd/HostMount.h"
 #include "fileproviderd/OpenListings.h"
 #include "fileproviderd/PathResolver.h"
 #include "fileproviderd/Providings.h"
@@ -37,8 +39,13 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   // Fills in what only the process itself knows: identifiers, times, launches.
   using StatusSource = std::function<FPDStatus()>;
 
+  // Without a filler the desktop's cache is nobody's business here.
   ControlService(std::shared_ptr<ExtensionCalls> calls, std::shared_ptr<FollowedContainers> followed,
-                 std::shared_ptr<OpenListings> listings, std::string replica, StatusSource status);
+                 std::shared_ptr<OpenListings> listings, std::string replica, StatusSource status,
+                 std::shared_ptr<DesktopThumbnailFiller> desktopThumbnails = nullptr);
+  // Before the first client comes; without one the drive can't be mounted.
+  void setMount(std::shared_ptr<HostMount> mount) { mount_ = std::move(mount); }
+  const std::shared_ptr<Providings> &providings() const { return providings_; }
 
   void getStatus(FPDStatusCompletion completion) override;
   void itemForIdentifier(const std::string &identifier, NSFileProviderItemCompletion completion) override;
@@ -59,8 +66,22 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
   void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
                                       FPDServiceCompletion completion) override;
+  void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers, CGSize size,
+                                         FPDThumbnailsCompletion completion) override;
+  void defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                           NSFileProviderItemCompletion completion) override;
+  void fillDesktopThumbnailsForContainer(const std::string &identifier,
+                                         NSFileProviderErrorCompletion completion) override;
+
+  void mountAtPath(const std::string &path, FPDMountCompletion completion) override;
+  void unmount(NSFileProviderErrorCompletion completion) override;
+
+  HostMount &mount() { return *mount_; }  // REQUIRES: setMount()
 
  private:
+  std::shared_ptr<NSFileProviderRemoteEnumerator> relayed(
+      const std::string &identifier, const std::shared_ptr<NSFileProviderRemoteEnumerator> &enumerator) const;
+
   const std::shared_ptr<ExtensionCalls> calls_;
   const std::shared_ptr<FollowedContainers> followed_;
   const std::shared_ptr<OpenListings> listings_;
@@ -69,6 +90,8 @@ class ControlService final : public FPDControlProtocol, public std::enable_share
   const Actions actions_;
   const std::shared_ptr<Services> services_;
   const StatusSource status_;
+  const std::shared_ptr<DesktopThumbnailFiller> desktopThumbnails_;  // may be null
+  std::shared_ptr<HostMount> mount_;                                 // constant after setMount()
 };
 
 }  // namespace droxa

@@ -33,6 +33,9 @@ class Providings::Client final : public FPDProviding {
     }
     completion(error);
   }
+  void getProgress(FPDProgressCompletion completion) override {
+    providings_->askForProgress(path_, completion);
+  }
   void cancel() override {
     if (end(NSError(NSCocoaErrorDomain, NSUserCancelledError))) providings_->leave(path_, number_);
   }
@@ -159,6 +162,18 @@ void Providings::leave(const std::string &path, std::uint64_t client) {
     cancelled = found->second.providing;
   }
   if (cancelled) cancelled->cancel();
+}
+
+void Providings::askForProgress(const std::string &path, const FPDProgressCompletion &completion) {
+  std::shared_ptr<FPDProviding> providing;
+  {
+    const Lock held(lock_);
+    if (const auto found = entries_.find(path); found != entries_.end()) providing = found->second.providing;
+  }
+  if (!providing) return completion(0, -1);
+  NSXPCProxyWithErrorHandler<FPDProviding>(providing, [completion](const NSError &) {
+    completion(0, -1);
+  })->getProgress(completion);
 }
 
 }  // namespace droxa

@@ -42,6 +42,7 @@ class Providings final : public std::enable_shared_from_this<Providings> {
   void cutOff(const std::string &path, const NSError &error);
   void ended(const std::string &path, const NSError &error);
   void leave(const std::string &path, std::uint64_t client);
+  void askForProgress(const std::string &path, const FPDProgressCompletion &completion);
 
   const std::shared_ptr<ExtensionCalls> calls_;
   mutable Mutex lock_;

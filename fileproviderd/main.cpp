@@ -1,12 +1,14 @@
 #include <cstdio>
 #include <filesystem>
 #include <signal.h>
+#include <string_view>
 #include <sysexits.h>
 #include <systemd/sd-daemon.h>
 #include <unistd.h>
 
 #include "fileproviderd/Host.h"
 #include "fileproviderd/HostArguments.h"
+#include "fileproviderd/mount/Announcer.h"
 #include "platform/foundation/DescriptorLimit.h"
 #include "platform/foundation/Paths.h"
 #include "platform/foundation/ProcessLock.h"
@@ -62,6 +64,7 @@ void waitForEnd(const sigset_t &signals) {
 }  // namespace
 
 int main(int argc, char *argv[]) {
+  if (argc == 2 && argv[1] == std::string_view(Announcer::kArgument)) return announcerMain();
   std::string problem;
   const auto arguments = HostArguments::parse({argv + 1, argv + argc}, &problem);
   if (!arguments) return fail(kUsageError, problem);
@@ -82,7 +85,7 @@ int main(int argc, char *argv[]) {
   const std::string program = arguments->extension.value_or(extensionProgram());
   if (access(program.c_str(), X_OK) != 0)
     return fail(EX_UNAVAILABLE, "there is no extension program at " + program);
-  const auto host = Host::create(program);
+  const auto host = Host::create(program, "/proc/self/exe");
   NSError error;
   if (!host->start(&error)) return fail(EX_UNAVAILABLE, error.localizedDescription());
   sd_notify(0, "READY=1");

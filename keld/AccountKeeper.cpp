@@ -1,11 +1,10 @@
 #include "keld/AccountKeeper.h"
 
 #include <algorithm>
-#include <pwd.h>
-#include <unistd.h>
 
 #include "tessaly/QVAccount.h"
 #include "tessaly/QVErrors.h"
+#include "tessaly/QVHomeCloud.h"
 
 namespace droxa::keld {
 
@@ -52,12 +51,7 @@ bool AccountKeeper::isValidName(const std::string &name) {
 }
 
 std::string AccountKeeper::localUserName() {
-  passwd entry;
-  passwd *found = nullptr;
-  char buffer[16384];
-  const bool known = ::getpwuid_r(::getuid(), &entry, buffer, sizeof buffer, &found) == 0 && found;
-  const std::string name = known ? found->pw_name : "";
-  return isValidName(name) ? name : "user" + std::to_string(::getuid());
+  return QVLocalUserName();
 }
 
 }  // namespace droxa::keld

@@ -7,17 +7,20 @@
 #include <sys/stat.h>
 
 #include "keld/Placement.h"
+#include "keld/SharedContainer.h"
 #include "tessaly/QVContainer.h"
 
 namespace droxa::keld {
 
 namespace {
 
-std::string plainName(const std::string &containerID) {
+std::string plainName(const std::string &containerID, const std::map<std::string, std::string> &titles) {
   if (containerID == QVUbiquitousDocumentsContainerID) return "Documents";
   if (containerID == QVUbiquitousDesktopContainerID) return "Desktop";
   if (containerID == QVUbiquitousTrashContainerID) return ".Trash";
-  return containerID.substr(containerID.rfind('.') + 1);
+  if (const auto title = titles.find(containerID); title != titles.end()) return title->second;
+  const std::string last = containerID.substr(containerID.rfind('.') + 1);
+  return IsSharedContainer(containerID) ? SharedContainerTitle(last) : last;
 }
 
 std::vector<ContainerEntry> readEntries(ItemQueries &queries) {
@@ -35,13 +38,14 @@ std::vector<ContainerEntry> readEntries(ItemQueries &queries) {
 
 // A name that an entry of the root bears already, or a container before this one, gets the container's
 // identifier.
-void nameEntries(ItemQueries &queries, std::vector<ContainerEntry> &entries) {
+void nameEntries(ItemQueries &queries, const std::map<std::string, std::string> &titles,
+                 std::vector<ContainerEntry> &entries) {
   ItemNumber root = 0;
   for (const ContainerEntry &entry : entries)
     if (entry.containerID == QVUbiquitousDefaultContainerID) root = entry.documents;
   std::set<std::string> taken;
   for (ContainerEntry &entry : entries) {
-    entry.shownName = plainName(entry.containerID);
+    entry.shownName = plainName(entry.containerID, titles);
     const bool isListed = entry.containerID != QVUbiquitousDefaultContainerID &&
                           entry.containerID != QVUbiquitousTrashContainerID;
     if (!isListed) continue;
@@ -84,9 +88,27 @@ std::shared_ptr<const Containers> ContainerList::current() const {
   return current_;
 }
 
+void ContainerList::setTitle(const std::string &containerID, const std::string &title) {
+  const Lock lock(mutex_);
+  std::string &known = titles_[containerID];
+  hasNewTitles_ = hasNewTitles_ || known != title;
+  known = title;
+}
+
+bool ContainerList::hasNewTitles() const {
+  const Lock lock(mutex_);
+  return hasNewTitles_;
+}
+
+std::map<std::string, std::string> ContainerList::takeTitles() {
+  const Lock lock(mutex_);
+  hasNewTitles_ = false;
+  return titles_;
+}
+
 ContainerList::Changes ContainerList::refresh(ItemQueries &queries, SqlDatabase &database) {
   std::vector<ContainerEntry> entries = readEntries(queries);
-  nameEntries(queries, entries);
+  nameEntries(queries, takeTitles(), entries);
   Changes changes;
   const auto before = current();
   if (before->entries() == entries) return changes;

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <map>
 #include <memory>
 #include <string>
 #include <unordered_map>
@@ -44,10 +45,14 @@ class Containers {
 };
 
 // Keeps the list of the containers as the item table has it, and the names under which the root shows them.
-// Thread contract: current() on any thread, the rest on the keeper's.
+// Thread contract: current() and the titles on any thread, the rest on the keeper's.
 class ContainerList {
  public:
   std::shared_ptr<const Containers> current() const;
+
+  // What the documents folder of a container is to be called in the root, from the next refresh() on.
+  void setTitle(const std::string &containerID, const std::string &title);
+  bool hasNewTitles() const;
 
   struct Changes {
     bool list = false;                // containers came, went, or got a documents folder
@@ -57,7 +62,11 @@ class ContainerList {
   Changes refresh(ItemQueries &queries, SqlDatabase &database);
 
  private:
+  std::map<std::string, std::string> takeTitles();
+
   mutable Mutex mutex_;
+  std::map<std::string, std::string> titles_ GUARDED_BY(mutex_);  // by the containers' identifiers
+  bool hasNewTitles_ GUARDED_BY(mutex_) = false;
   std::shared_ptr<const Containers> current_ GUARDED_BY(mutex_) = std::make_shared<const Containers>();
 };
 

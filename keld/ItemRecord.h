@@ -30,6 +30,7 @@ inline constexpr std::uint32_t kUnreadableFlag = 8;  // a folder that the file s
 inline constexpr std::uint32_t kDatalessFlag = 16;   // a document whose contents are in the cloud alone
 inline constexpr std::uint32_t kUploadedFlag = 32;   // the cloud has it as it is
 inline constexpr std::uint32_t kSharedFlag = 64;     // the root of a share; what is below it has no flag
+inline constexpr std::uint32_t kOthersFlag = 128;    // in a container that shows what another shares
 inline constexpr std::uint32_t kSyncFlags = kDatalessFlag | kUploadedFlag;
 inline constexpr std::uint32_t kOwnFlags =
     kUnreadableFlag | kSharedFlag | kSyncFlags;  // not inherited from where it is

@@ -374,7 +374,8 @@ ContainerList::Changes Keeper::refreshContainers(const std::vector<ItemChange> &
   const auto concerns = [&](ItemNumber parent) {
     return parent == current->root() || current->isContainerFolder(parent);
   };
-  const bool needed = always || std::any_of(changes.begin(), changes.end(), [&](const ItemChange &change) {
+  const bool needed = always || containers_.hasNewTitles() ||
+                      std::any_of(changes.begin(), changes.end(), [&](const ItemChange &change) {
                         return concerns(change.oldParent) || concerns(change.newParent) ||
                                current->isContainerFolder(change.id) ||
                                (change.oldParent == kReplicaFolder && change.newParent == kReplicaFolder);

@@ -8,6 +8,7 @@
 
 #include "keld/KeldSession.h"
 #include "keld/Schema.h"
+#include "keld/SharedContainer.h"
 #include "keld/TrashNotes.h"
 #include "keld/contents/ContentsStorage.h"
 #include "keld/sync/DeviceName.h"
@@ -70,6 +71,9 @@ void Keld::open() {
   readers_ = std::make_unique<ReaderPool>(databasePath_);
   account_ = std::make_unique<AccountKeeper>(
       home_.configuration(), [this](const std::string &name) { return identifierForAccount(name); });
+  SharedZones::readTitles(home_.state(), [this](const std::string &container, const std::string &title) {
+    containers_.setTitle(container, title);
+  });
   keeper_->start();
   openSync();
   const NSError error = account_->load();
@@ -117,11 +121,34 @@ void Keld::openSync() {
   host.read = readItems;
   host.pathBelowReplica = [this](const NSURL &url) { return pathBelowReplica(url); };
   host.isSignedIn = [this] { return account_->isSignedIn(); };
+  host.sharedEngines = [this] { return sharedZones_->engines(); };
+  host.engineOf = [this](const ItemRecord &item) { return engineOf(item); };
   contents_ = std::make_shared<ContentsService>(std::move(host), sync_);
   openSharing(cloud);
   std::string itemDatabase;
   (void)readItems([&](ItemQueries &queries) { itemDatabase = queries.metaText("uuid"); });
   sync_->start(itemDatabase);
+  openSharedZones(cloud, itemDatabase);
+}
+
+void Keld::openSharedZones(const std::shared_ptr<CKCloud> &cloud, const std::string &itemDatabase) {
+  SharedZonesHost host;
+  host.replicaPath = replicaPath_;
+  host.stateFolder = home_.state();
+  host.keeper = [this] { return keeper_.get(); };
+  host.read = [this](const std::function<void(ItemQueries &)> &work) {
+    return read([&](ItemQueries &queries, const ItemPresenter &) { work(queries); });
+  };
+  host.itemDatabase = itemDatabase;
+  host.setTitle = [this](const std::string &container, const std::string &title) {
+    containers_.setTitle(container, title);
+    // Whatever it does next, it reads the list anew.
+    keeper_->perform([](Reconciler &, ItemQueries &, ItemEdits &) {}, [] {});
+  };
+  const std::shared_ptr<CKCloud> shared = cloud->sharedDatabase();
+  sharedZones_ = std::make_shared<SharedZones>(std::move(host), sync_, shared, options_.sync.pollInterval);
+  sharedZones_->start();
+  sharedFeed_ = sharedZones_.get();
 }
 
 void Keld::openSharing(const std::shared_ptr<CKCloud> &cloud) {
@@ -133,12 +160,28 @@ void Keld::openSharing(const std::shared_ptr<CKCloud> &cloud) {
   };
   host.pathBelowReplica = [this](const NSURL &url) { return pathBelowReplica(url); };
   host.isSignedIn = [this] { return account_->isSignedIn(); };
-  sharing_ = std::make_shared<SharingService>(std::move(host), sync_, SharingPlaces(cloud, driveAccount_),
+  host.engineOf = [this](const ItemRecord &item) { return engineOf(item); };
+  host.engineOfZone = [this](const CKRecordZoneID &zone) {
+    return zone == sync_->scope().zone ? sync_ : sharedZones_->engineOf(SharedContainerOf(zone.ownerName));
+  };
+  sharing_ = std::make_shared<SharingService>(std::move(host), SharingPlaces(cloud, driveAccount_),
                                               options_.sharing);
+}
+
+std::shared_ptr<SyncEngine> Keld::engineOf(const ItemRecord &item) {
+  if ((item.flags & kOthersFlag) == 0) return sync_;
+  std::string container;
+  (void)read([&](ItemQueries &queries, const ItemPresenter &) {
+    const std::vector<std::string> names = queries.namesTo(item);
+    if (!names.empty()) container = names.front();
+  });
+  auto engine = sharedZones_->engineOf(container);
+  return engine ? engine : sync_;  // a container that is about to go
 }
 
 void Keld::accountChanged() {
   sync_->setSignedIn(account_->isSignedIn());
+  sharedZones_->setSignedIn(account_->isSignedIn());
 }
 
 // A home that is used for the first time works at once. Who signed out there stays signed out: the database
@@ -181,6 +224,7 @@ std::string Keld::identifierForAccount(const std::string &name) {
 void Keld::stop() {
   if (stopped_.exchange(true)) return;
   if (sharing_) sharing_->queue().stop();
+  if (sharedZones_) sharedZones_->stop();
   if (sync_) sync_->stop();
   if (keeper_) keeper_->stop();
 }
@@ -247,6 +291,7 @@ void Keld::itemsChanged(Commit commit, ItemQueries &queries) {
 
 void Keld::feedAdvanced() {
   if (sync_) sync_->itemsChanged();
+  if (SharedZones *shared = sharedFeed_) shared->itemsChanged();
 }
 
 void Keld::containerListChanged() {

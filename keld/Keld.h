@@ -16,6 +16,7 @@
 #include "keld/UpdateSenders.h"
 #include "keld/sharing/SharingService.h"
 #include "keld/sync/ContentsService.h"
+#include "keld/sync/SharedZones.h"
 #include "platform/foundation/Paths.h"
 #include "tessaly/QVProtocol.h"
 
@@ -58,6 +59,7 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   UpdateSenders &senders() { return senders_; }
   QVContentsProtocol &contents() { return *contents_; }
   SyncEngine &sync() { return *sync_; }
+  SharedZones &sharedZones() { return *sharedZones_; }
   SharingService &sharing() { return *sharing_; }
   // Whether anybody is signed in has changed.
   void accountChanged();
@@ -86,6 +88,8 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   void open();
   void removeAbandonedActions();
   void openSync();
+  std::shared_ptr<SyncEngine> engineOf(const ItemRecord &item);
+  void openSharedZones(const std::shared_ptr<CKCloud> &cloud, const std::string &itemDatabase);
   void openSharing(const std::shared_ptr<CKCloud> &cloud);
   bool replicaHasPromises() const;
   void offerAccount(bool mayOffer);
@@ -107,6 +111,8 @@ class Keld final : public KeeperListener, public UpdateSenderHost, public std::e
   std::unique_ptr<AccountKeeper> account_;
   std::unique_ptr<Keeper> keeper_;
   std::shared_ptr<SyncEngine> sync_;
+  std::shared_ptr<SharedZones> sharedZones_;
+  std::atomic<SharedZones *> sharedFeed_{nullptr};  // the same, once the keeper may tell it of changes
   std::shared_ptr<QVContentsProtocol> contents_;
   std::shared_ptr<SharingService> sharing_;
   std::atomic<bool> stopped_{false};

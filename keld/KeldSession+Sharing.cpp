@@ -145,8 +145,9 @@ void KeldSession::refreshSharingStateForItemIdentifier(const std::string &identi
   daemon_->sharing().refreshSharingState(caller(nullptr), item->id, std::move(reply));
 }
 
-void KeldSession::acceptShareWithURL(const NSURL & /*shareURL*/, QVURLReply reply) {
-  reply({}, qvc_error(QVErrorSharingUnavailable, "sharing isn't available"));
+void KeldSession::acceptShareWithURL(const NSURL &shareURL, QVURLReply reply) {
+  if (const NSError error = daemon_->checkSignedIn()) return reply({}, error);
+  daemon_->sharedZones().acceptShare(shareURL, std::move(reply));
 }
 
 void KeldSession::resolveFileObjectIDsToContentRecordIDs(const std::vector<QVFileObjectID> &identifiers,

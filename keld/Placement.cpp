@@ -1,5 +1,6 @@
 #include "keld/Placement.h"
 
+#include "keld/SharedContainer.h"
 #include "keld/contents/PromiseFile.h"
 #include "tessaly/NSURL+Tessaly.h"
 #include "tessaly/QVContainer.h"
@@ -32,7 +33,7 @@ std::optional<std::uint32_t> Placement::flags(ItemNumber parent, std::string_vie
   Zone zone = Zone::structure;
   if (parent == kReplicaFolder) {
     if (!isFolder || !IsContainerName(name)) return std::nullopt;
-    return static_cast<std::uint32_t>(zone);
+    return static_cast<std::uint32_t>(zone) | (IsSharedContainer(name) ? kOthersFlag : 0);
   }
   if (!record_) return std::nullopt;
   if (!isFolder && IsPromiseName(name)) return std::nullopt;  // stands for a document, and is none
@@ -45,7 +46,7 @@ std::optional<std::uint32_t> Placement::flags(ItemNumber parent, std::string_vie
   }
   const bool isExcluded =
       (record_->flags & kExcludedFlag) != 0 || (zone != Zone::structure && qv_isNameExcludedFromSync(name));
-  return static_cast<std::uint32_t>(zone) | (isExcluded ? kExcludedFlag : 0);
+  return static_cast<std::uint32_t>(zone) | (isExcluded ? kExcludedFlag : 0) | (record_->flags & kOthersFlag);
 }
 
 }  // namespace droxa::keld

@@ -13,8 +13,9 @@ namespace droxa::keld {
 // Whether a folder of the replica with this name is a container: a reverse-DNS name.
 bool IsContainerName(std::string_view name);
 
-// Works out what an item inherits from where it is: its zone, and whether it is kept local. Remembers the
-// last folder, because what is asked about comes folder by folder. Thread contract: the keeper's thread.
+// Works out what an item inherits from where it is: its zone, whether it is kept local, and whether another
+// shares it. Remembers the last folder, because what is asked about comes folder by folder. Thread contract:
+// the keeper's thread.
 class Placement {
  public:
   explicit Placement(ItemQueries &queries) : queries_(queries) {}

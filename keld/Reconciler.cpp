@@ -214,8 +214,21 @@ Reconciler::Origin Reconciler::originOf(const ItemRecord &record) const {
   return origin == limboOrigins_.end() ? Origin() : origin->second;
 }
 
+// Between what two owners share: each of its children is somebody else's then, though its flags don't tell.
+bool Reconciler::changesOwner(const ItemRecord &folder, ItemNumber from, ItemNumber to) {
+  if (!folder.isFolder() || (folder.flags & kOthersFlag) == 0 || from == to) return false;
+  const auto containerOf = [this](ItemNumber at) {
+    const auto record = queries_.byID(at);
+    const std::vector<std::string> names = record ? queries_.namesTo(*record) : std::vector<std::string>();
+    return names.empty() ? std::string() : names.front();
+  };
+  return containerOf(from) != containerOf(to);
+}
+
 void Reconciler::move(ItemRecord record, const Observation &observation, std::uint32_t flags) {
   const Origin origin = originOf(record);
+  const bool isOtherOwners =
+      (flags & kOthersFlag) != 0 && changesOwner(record, origin.parent, observation.folder);
   const bool wasInLimbo = record.parent == kLimboFolder;
   if (origin.parent == observation.folder && IsBackupName(observation.name, origin.name))
     recent_.becameBackup(observation.folder, origin.name, record.id);
@@ -239,7 +252,7 @@ void Reconciler::move(ItemRecord record, const Observation &observation, std::ui
   touched_.push_back(record.parent);
   if (!record.isFolder()) return;
   placement_.forget();
-  if (flagsChanged) reflagChildren(record);
+  if (flagsChanged || isOtherOwners) reflagChildren(record);
 }
 
 void Reconciler::refresh(ItemRecord record, const FileFacts &facts) {

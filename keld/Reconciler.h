@@ -111,6 +111,7 @@ class Reconciler {
   void move(ItemRecord record, const Observation &observation, std::uint32_t flags);
   void refresh(ItemRecord record, const FileFacts &facts);
   void reflagChildren(const ItemRecord &folder);
+  bool changesOwner(const ItemRecord &folder, ItemNumber from, ItemNumber to);
   void putIntoLimbo(ItemRecord record);
   void die(const ItemRecord &record, ItemNumber lastParent);
   void dieAlone(const ItemRecord &record, ItemNumber lastParent);

@@ -6,6 +6,8 @@
 #include <string_view>
 #include <vector>
 
+#include "platform/foundation/CGSize.h"
+#include "platform/foundation/NSData.h"
 #include "platform/foundation/NSError.h"
 #include "platform/foundation/NSURL.h"
 #include "tessaly/QVProtocol.h"
@@ -20,6 +22,7 @@ inline constexpr char QVUbiquitousTrashContainerID[] = "com.quorva.Tessaly.trash
 // The name of a container's documents folder: "Documents"; of the trash "files", as file managers lay a trash
 // out.
 const char *QVDocumentsFolderName(std::string_view containerID);
+inline constexpr char QVUbiquitousDocumentsFolderName[] = "Documents";
 inline constexpr char QVTrashInfoFolderName[] = "info";  // beside the trash's "files": where things came from
 
 // A folder of the replica with a documents folder in it: replica/<container identifier>/Documents. What else
@@ -36,6 +39,11 @@ class QVContainer final {
   const std::string &containerID() const { return description_.containerID; }
   const NSURL &url() const { return description_.url; }
   const NSURL &documentsURL() const { return description_.documentsURL; }
+
+  // The picture (PNG) that fits the size, in pixels, best of those installed: the icon of the application
+  // whose identifier the container's is, and then `shouldTransformToAppIcon` (may be null) tells that it is
+  // an application's plain icon; or that of a folder of this kind. nil when there is none. Reads files.
+  NSData bestFittingImageDataForSize(CGSize size, bool *shouldTransformToAppIcon) const;
 
  private:
   const QVContainerDescription description_;

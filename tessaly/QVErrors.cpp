@@ -14,6 +14,11 @@ NSError qvc_errorLoggedOut() {
   return qvc_error(QVErrorLoggedOut, "nobody is signed in");
 }
 
+NSError qvc_errorInvalidParameter(const std::string &parameter, const std::optional<std::string> &value) {
+  return qvc_error(QVErrorInvalidArgument,
+                   NSStringWithFormat("invalid parameter \"%@\": %@", parameter, value));
+}
+
 NSError qvc_errorNoSuchItem(const std::string &asked) {
   return qvc_error(QVErrorNoSuchItem, "there is no item " + asked);
 }

@@ -2,6 +2,7 @@
 
 #include <cstdint>
 #include <functional>
+#include <optional>
 #include <string>
 #include <type_traits>
 
@@ -12,6 +13,7 @@ namespace droxa {
 
 inline constexpr char QVTessalyErrorDomain[] = "QVTessalyErrorDomain";
 
+inline constexpr std::int64_t QVErrorNotEntitled = 1;  // to any container of the cloud
 inline constexpr std::int64_t QVErrorLoggedOut = 2;
 inline constexpr std::int64_t QVErrorNoSuchItem = 14;
 inline constexpr std::int64_t QVErrorNoShare = 20;  // there is no share of this item
@@ -27,6 +29,10 @@ inline constexpr std::int64_t QVErrorUnsentChanges = 36;     // the cloud doesn'
 inline constexpr std::int64_t QVErrorDocumentInUse = 37;
 inline constexpr std::int64_t QVErrorPinned = 38;
 inline constexpr std::int64_t QVErrorSharingUnavailable = 39;  // this daemon's cloud takes no shares
+// Of what others share: it may only be read, and what was changed is kept on this machine alone.
+inline constexpr std::int64_t QVErrorReadOnlyShare = 46;
+// Of what was put beside the shared folders instead of into one: it is kept on this machine alone.
+inline constexpr std::int64_t QVErrorNotInSharedFolder = 47;
 inline constexpr std::int64_t QVErrorBusy = 40;  // too much is under way already; to be asked again later
 inline constexpr std::int64_t QVErrorNotShareable =
     41;  // the item is of a kind, or in a place, that isn't shared
@@ -45,6 +51,8 @@ NSError qv_errorWithDomain(const char *domain, std::int64_t code,
   return NSError(domain, code, {{NSLocalizedDescriptionKey, description.print(args...)}});
 }
 NSError qvc_error(std::int64_t code, std::string description);
+// 22: a parameter, named in the text, has a value that it can't have.
+NSError qvc_errorInvalidParameter(const std::string &parameter, const std::optional<std::string> &value);
 NSError qvc_errorNoSuchItem(const std::string &asked);
 
 // Whether it is one of QVTessalyErrorDomain with that code; a nil error isn't.

@@ -45,6 +45,7 @@ QVUserDefaults::QVUserDefaults() {
   if (!object.is_object()) return;
   take(object, path, "maxRecordCountInFetchRecordsOperation", 1, 1'000'000,
        maxRecordCountInFetchRecordsOperation_);
+  take(object, path, "minFileSizeForThumbnailTransfer", 0, INT64_MAX, minFileSizeForThumbnailTransfer_);
   take(object, path, "daemonCallDeadlineMilliseconds", 1, 86'400'000, daemonCallDeadlineMilliseconds_);
 }
 

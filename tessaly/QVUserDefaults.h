@@ -15,12 +15,14 @@ class QVUserDefaults final {
   std::int64_t maxRecordCountInFetchRecordsOperation() const {
     return maxRecordCountInFetchRecordsOperation_;
   }
+  std::int64_t minFileSizeForThumbnailTransfer() const { return minFileSizeForThumbnailTransfer_; }
   // How long a call to the daemon may take before its error handler is called.
   std::int64_t daemonCallDeadlineMilliseconds() const { return daemonCallDeadlineMilliseconds_; }
 
  private:
   QVUserDefaults();
   std::int64_t maxRecordCountInFetchRecordsOperation_ = 200;
+  std::int64_t minFileSizeForThumbnailTransfer_ = 64 * 1024;
   std::int64_t daemonCallDeadlineMilliseconds_ = 30000;
 };
 

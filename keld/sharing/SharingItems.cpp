@@ -51,13 +51,22 @@ NSError SharingItems::find(SharingOperation &operation, const NSURL &url, Sharin
   std::optional<ItemRecord> record;
   if (const NSError error = look(operation, *path, &record)) return error;
   if (!record) return qvc_errorNoSuchItem(url.path());
-  *found = {*record, url.path(), engine_->store().byItem(record->id)};
+  const auto engine = host_.engineOf(*record);
+  *found = {*record, url.path(), engine, engine->store().byItem(record->id)};
   return checkShareable(*record, url.path());
 }
 
 SharingItem SharingItems::described(const ItemRecord &item) const {
-  return {item, engine_->files().absolute(engine_->files().pathOf(item.id)),
-          engine_->store().byItem(item.id)};
+  const auto engine = host_.engineOf(item);
+  return {item, engine->files().absolute(engine->files().pathOf(item.id)), engine,
+          engine->store().byItem(item.id)};
+}
+
+std::optional<ItemRecord> SharingItems::item(ItemNumber item) const {
+  std::optional<ItemRecord> found;
+  (void)host_.read([&](ItemQueries &queries) { found = queries.byID(item); });
+  if (found && found->parent == kLimboFolder) found.reset();
+  return found;
 }
 
 NSError SharingItems::checkShareable(const ItemRecord &item, const std::string &path) const {
@@ -85,7 +94,7 @@ NSError SharingItems::findInCloud(SharingOperation &operation, const NSURL &url,
   if (error || found->isInCloud()) return error;
   error = upload(operation, *found);
   if (error) return error;
-  found->row = engine_->store().byItem(found->item.id);
+  found->row = found->engine->store().byItem(found->item.id);
   if (found->isInCloud()) return NSError();
   return qvc_error(QVErrorUnsentChanges, found->path + ": the cloud doesn't have it yet; ask again later");
 }
@@ -114,8 +123,8 @@ std::vector<ItemNumber> SharingItems::unsentBelow(const ItemRecord &item) const 
   return unsent;
 }
 
-std::string SharingItems::problemOfCloud() const {
-  const std::string problem = engine_->status().cloudProblem;
+std::string SharingItems::problemOfCloud(const SharingItem &item) {
+  const std::string problem = item.engine->status().cloudProblem;
   return problem.empty() ? "" : " (" + problem + ")";
 }
 
@@ -128,25 +137,25 @@ NSError SharingItems::upload(SharingOperation &operation, const SharingItem &ite
   const std::uint64_t total = items.size();
   std::uint64_t told = total + 1;
   const auto position = [&] {
-    const std::uint64_t done = total - std::min(total, engine_->store().countQueued());
+    const std::uint64_t done = total - std::min(total, item.engine->store().countQueued());
     if (done != std::exchange(told, done)) operation.progress(QVSharingTopicUpload, done, total);
-    std::uint64_t bytes = engine_->status().bytesUploaded;
-    for (const AssetUploads::Progress &upload : engine_->assetUploads().underWay()) bytes += upload.done;
+    std::uint64_t bytes = item.engine->status().bytesUploaded;
+    for (const AssetUploads::Progress &upload : item.engine->assetUploads().underWay()) bytes += upload.done;
     return done + bytes;
   };
   // Of its own: a wait that timed out isn't left behind either.
   const auto interest = std::make_shared<CKCancellation>();
   const NSError error = operation.await(
       "sending " + item.path + " to the cloud",
-      [&](SharingOperation::Done done) { engine_->whenUploaded(items, std::move(done), interest); },
+      [&](SharingOperation::Done done) { item.engine->whenUploaded(items, std::move(done), interest); },
       position);
   interest->cancel();
   if (!error) {
     operation.progress(QVSharingTopicUpload, total, total);
     return error;
   }
-  engine_->itemsChanged();  // lets go of the wait
-  if (CKErrorIsTimeout(error)) return CKErrorMakeTimeout(error.localizedDescription() + problemOfCloud());
+  item.engine->itemsChanged();  // lets go of the wait
+  if (CKErrorIsTimeout(error)) return CKErrorMakeTimeout(error.localizedDescription() + problemOfCloud(item));
   return error;
 }
 
@@ -158,13 +167,14 @@ void SharingItems::forEachUpwards(const ItemRecord &item,
   for (int depth = 0; current && depth < kDeepest; ++depth) {
     if (!each(*current)) return;
     if (current->parent == kReplicaFolder || current->parent == kLimboFolder) return;
-    current = engine_->files().item(current->parent);
+    current = this->item(current->parent);
   }
 }
 
 std::optional<KnownShare> SharingItems::shareOf(const ItemRecord &item) const {
-  const auto row = engine_->store().byItem(item.id);
-  return row ? engine_->store().shareOfRoot(row->record) : std::nullopt;
+  const auto engine = host_.engineOf(item);
+  const auto row = engine->store().byItem(item.id);
+  return row ? engine->store().shareOfRoot(row->record) : std::nullopt;
 }
 
 std::optional<KnownShare> SharingItems::nearestShare(const ItemRecord &item) const {
@@ -177,7 +187,7 @@ std::optional<KnownShare> SharingItems::nearestShare(const ItemRecord &item) con
 }
 
 bool SharingItems::isBelow(ItemNumber item, ItemNumber folder) const {
-  const auto record = engine_->files().item(item);
+  const auto record = this->item(item);
   if (!record || item == folder) return false;
   bool isFound = false;
   forEachUpwards(*record, [&](const ItemRecord &each) {

@@ -20,13 +20,18 @@ struct SharingHost {
   ReplicaFiles::Read read;
   std::function<std::optional<std::string>(const NSURL &url)> pathBelowReplica;
   std::function<bool()> isSignedIn;
+  // The sync that looks after the item, or the zone: the drive's own, or that of what somebody shares. Of a
+  // zone that nobody looks after: null.
+  std::function<std::shared_ptr<SyncEngine>(const ItemRecord &item)> engineOf;
+  std::function<std::shared_ptr<SyncEngine>(const CKRecordZoneID &zone)> engineOfZone;
 };
 
 // An item that a client named.
 struct SharingItem {
   ItemRecord item;
-  std::string path;            // absolute
-  std::optional<SyncRow> row;  // absent, or without a tag: the cloud doesn't have it yet
+  std::string path;                    // absolute
+  std::shared_ptr<SyncEngine> engine;  // that looks after it
+  std::optional<SyncRow> row;          // absent, or without a tag: the cloud doesn't have it yet
   bool isInCloud() const { return row && !row->tag.empty(); }
 };
 
@@ -34,8 +39,7 @@ struct SharingItem {
 // Thread contract: any thread; what takes an operation waits, on its thread.
 class SharingItems {
  public:
-  SharingItems(SharingHost host, std::shared_ptr<SyncEngine> engine)
-      : host_(std::move(host)), engine_(std::move(engine)) {}
+  explicit SharingItems(SharingHost host) : host_(std::move(host)) {}
 
   // The item at the URL, which may have come there a moment ago. 22 for nil, 14, 41 for what isn't shared.
   NSError find(SharingOperation &operation, const NSURL &url, SharingItem *found);
@@ -45,7 +49,7 @@ class SharingItems {
   NSError upload(SharingOperation &operation, const SharingItem &item);
   // nil, or 41 with why it isn't shared, and what to do.
   NSError checkShareable(const ItemRecord &item, const std::string &path) const;
-  std::optional<ItemRecord> item(ItemNumber item) const { return engine_->files().item(item); }
+  std::optional<ItemRecord> item(ItemNumber item) const;
   SharingItem described(const ItemRecord &item) const;
 
   // Shares, as far as they are known here.
@@ -59,10 +63,9 @@ class SharingItems {
  private:
   NSError look(SharingOperation &operation, const std::string &path, std::optional<ItemRecord> *found);
   std::vector<ItemNumber> unsentBelow(const ItemRecord &item) const;
-  std::string problemOfCloud() const;
+  static std::string problemOfCloud(const SharingItem &item);
 
   const SharingHost host_;
-  const std::shared_ptr<SyncEngine> engine_;
 };
 
 }  // namespace droxa::keld

@@ -9,21 +9,11 @@ namespace droxa::keld {
 SharingPlaces::SharingPlaces(std::shared_ptr<CKCloud> cloud, std::string accountName)
     : own_(std::move(cloud)), others_(own_->sharedDatabase()), accountName_(std::move(accountName)) {}
 
-SharingPlace SharingPlaces::ofRow(const SyncRow & /*row*/) const {
-  return {own_, DriveZone(), true};
-}
-
 SharingPlace SharingPlaces::ofZone(const CKRecordZoneID &zone) const {
   const bool isOwn =
       zone.ownerName == CKCurrentUserDefaultName || (!accountName_.empty() && zone.ownerName == accountName_);
   if (isOwn) return {own_, {zone.zoneName}, true};
   return {others_, zone, false};
-}
-
-std::optional<SyncRow> SharingPlaces::row(SyncStore &store, const CKRecordID &record) const {
-  auto row = store.byRecord(record.recordName);
-  if (!row || ofRow(*row).zone != ofZone(record.zoneID).zone) return std::nullopt;
-  return row;
 }
 
 CKShare SharingPlaces::shareInPlace(const SharingPlace &place, CKShare share) {

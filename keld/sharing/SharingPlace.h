@@ -18,18 +18,14 @@ struct SharingPlace {
   CKRecordID recordID(const std::string &record) const { return {record, zone}; }
 };
 
-// Finds the places of items and of records. Thread contract: any thread.
+// Finds the places of zones. Thread contract: any thread.
 class SharingPlaces {
  public:
   // `accountName` may be "", when it isn't known.
   SharingPlaces(std::shared_ptr<CKCloud> cloud, std::string accountName);
 
-  // The zone of an item follows from the row that the sync has of it.
-  SharingPlace ofRow(const SyncRow &row) const;
   // The account may name itself as the owner of its zones.
   SharingPlace ofZone(const CKRecordZoneID &zone) const;
-  // The row that the sync has of a record; nullopt when it isn't of a zone that the sync follows, either.
-  std::optional<SyncRow> row(SyncStore &store, const CKRecordID &record) const;
   // The share as the database of its place writes it.
   static CKShare shareInPlace(const SharingPlace &place, CKShare share);
 

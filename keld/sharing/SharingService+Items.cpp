@@ -49,10 +49,10 @@ NSError SharingService::withdrawBelow(SharingOperation &operation, const NSURL &
   if (const NSError error = items_.find(operation, folder, &item)) return error;
   if (!item.item.isFolder())
     return qvc_error(QVErrorInvalidArgument, item.path + ": isn't a folder, and has nothing below it");
-  if (const NSError error = refresh(operation)) return error;
+  if (const NSError error = refresh(operation, item.engine)) return error;
   std::vector<std::pair<KnownShare, SharingItem>> below;
-  for (const KnownShare &known : engine_->store().shares()) {
-    const auto row = places_.row(engine_->store(), {known.root, known.record.zoneID});
+  for (const KnownShare &known : item.engine->store().shares()) {
+    const auto row = rowOf({known.root, known.record.zoneID});
     const auto root = row ? items_.item(row->item) : std::nullopt;
     if (root && items_.isBelow(root->id, item.item.id)) below.emplace_back(known, items_.described(*root));
   }
@@ -95,7 +95,7 @@ NSError SharingService::materialise(SharingOperation &operation, const SharingIt
   if (item.item.isFolder()) return NSError();
   const std::uint64_t size = item.item.facts.size;
   const std::shared_ptr<Downloads::Interest> interest =
-      engine_->downloads()->want(item.item.id, size, DownloadPriority::reader);
+      item.engine->downloads()->want(item.item.id, size, DownloadPriority::reader);
   std::uint64_t told = UINT64_MAX;
   const auto position = [&] {
     std::uint64_t done = 0, total = size;
@@ -113,10 +113,10 @@ NSError SharingService::materialise(SharingOperation &operation, const SharingIt
 NSError SharingService::openDocument(SharingOperation &operation, const CKRecordID &record, bool syncIfNeeded,
                                      std::shared_ptr<const FPSandboxingURLWrapper> *opened) {
   if (syncIfNeeded) {
-    const NSError error = refresh(operation);
+    const NSError error = refresh(operation, engineOf(record.zoneID));
     if (error) return error;
   }
-  const auto row = places_.row(engine_->store(), record);
+  const auto row = rowOf(record);
   const auto found = row ? items_.item(row->item) : std::nullopt;
   if (!found) return unknownRecord(record);
   SharingItem item = items_.described(*found);
@@ -130,9 +130,9 @@ NSError SharingService::openDocument(SharingOperation &operation, const CKRecord
     NSError error;
     *opened = FPSandboxingURLWrapper::wrapperWithURL(NSURL::fileURLWithPath(item.path), true, &error);
     if (*opened && item.item.isFolder()) return NSError();
-    const auto location = *opened ? engine_->files().locate(item.item.id, nullptr) : std::nullopt;
-    if (location &&
-        engine_->storage().classify(location->folder.get(), location->name).kind != DocumentClass::dataless)
+    const auto location = *opened ? item.engine->files().locate(item.item.id, nullptr) : std::nullopt;
+    if (location && item.engine->storage().classify(location->folder.get(), location->name).kind !=
+                        DocumentClass::dataless)
       return NSError();
     opened->reset();
     if (error && !error.is(NSPOSIXErrorDomain, ENOENT)) return error;
@@ -159,7 +159,7 @@ void SharingService::copyParticipantToken(const SharingCaller &caller, const NSU
   const auto perform = [this, url, tokens](SharingOperation &operation) {
     SharingItem item;
     if (const NSError error = items_.findInCloud(operation, url, &item)) return error;
-    const SharingPlace place = places_.ofRow(*item.row);
+    const SharingPlace place = placeOf(item);
     *tokens = place.cloud->shareTokens(place.recordID(item.row->record), operation.call());
     return tokens->error;
   };

@@ -102,7 +102,7 @@ NSError SharingService::checkShareable(ItemNumber number) const {
   if (const NSError error = items_.checkShareable(item.item, item.path)) return error;
   if (!item.isInCloud())
     return qvc_error(QVErrorNotShareable, item.path + ": the cloud doesn't have it yet; ask again later");
-  const SharingPlace place = places_.ofRow(*item.row);
+  const SharingPlace place = placeOf(item);
   if (!place.isOwn)
     return qvc_error(QVErrorNotShareable,
                      item.path + ": belongs to " + place.zone.ownerName + ", who alone can share it");
@@ -124,8 +124,10 @@ ShareOptions SharingService::shareOptions(const ItemRecord &item) const {
 }
 
 NSError SharingService::sharesOf(SharingOperation &operation, ItemNumber number) {
-  if (const NSError error = refresh(operation)) return error;
-  const auto item = items_.item(number);
+  auto item = items_.item(number);
+  if (!item) return qvc_errorNoSuchItem(std::to_string(number));
+  if (const NSError error = refresh(operation, host_.engineOf(*item))) return error;
+  item = items_.item(number);
   if (!item) return qvc_errorNoSuchItem(std::to_string(number));
   CKShare share;
   const NSError error = fetchNearest(operation, *item, &share);
@@ -140,15 +142,15 @@ void SharingService::refreshSharingState(const SharingCaller &caller, ItemNumber
 std::map<QVFileObjectID, CKRecordID> SharingService::contentRecords(
     const std::vector<QVFileObjectID> &identifiers) const {
   std::map<QVFileObjectID, CKRecordID> records;
-  engine_->store().transaction([&] {
-    for (const QVFileObjectID &identifier : identifiers) {
-      if (!identifier.isDocumentID()) continue;
-      const auto row = engine_->store().byItem(identifier.number());
-      const bool isDocument = row && row->kind == NSFileProviderItemKind::document;
-      if (isDocument && !row->tag.empty())
-        records.emplace(identifier, places_.ofRow(*row).recordID(row->record));
-    }
-  });
+  for (const QVFileObjectID &identifier : identifiers) {
+    if (!identifier.isDocumentID()) continue;
+    const auto record = items_.item(identifier.number());
+    const auto engine = record ? host_.engineOf(*record) : nullptr;
+    const auto row = engine ? engine->store().byItem(record->id) : std::nullopt;
+    const bool isDocument = row && row->kind == NSFileProviderItemKind::document;
+    if (isDocument && !row->tag.empty())
+      records.emplace(identifier, places_.ofZone(engine->scope().zone).recordID(row->record));
+  }
   return records;
 }
 

@@ -26,13 +26,10 @@ bool isGone(const NSError &error) {
 
 }  // namespace
 
-SharingService::SharingService(SharingHost host, std::shared_ptr<SyncEngine> engine, SharingPlaces places,
-                               SharingOptions options)
+SharingService::SharingService(SharingHost host, SharingPlaces places, SharingOptions options)
     : host_(std::move(host)),
-      engine_(std::move(engine)),
       places_(std::move(places)),
-      items_(host_, engine_),
-      known_(engine_->store(), engine_->states()),
+      items_(host_),
       queue_(std::make_shared<SharingQueue>(options)) {}
 
 void SharingService::start(const SharingCaller &caller, Perform perform,
@@ -47,20 +44,34 @@ void SharingService::start(const SharingCaller &caller, Perform perform,
 // --- What is known here follows.
 
 void SharingService::noteSaved(const CKShare &share) {
-  known_.note(share);
-  engine_->states().flush();
-  engine_->cloudChanged();
+  const auto engine = engineOf(share.recordID.zoneID);
+  if (!engine) return;
+  KnownShares(engine->store(), engine->states()).note(share);
+  engine->states().flush();
+  engine->cloudChanged();
 }
 
 void SharingService::noteGone(const CKRecordID &share) {
-  known_.forget(share);
-  engine_->states().flush();
-  engine_->cloudChanged();
+  const auto engine = engineOf(share.zoneID);
+  if (!engine) return;
+  KnownShares(engine->store(), engine->states()).forget(share);
+  engine->states().flush();
+  engine->cloudChanged();
 }
 
-NSError SharingService::refresh(SharingOperation &operation) {
+std::shared_ptr<SyncEngine> SharingService::engineOf(const CKRecordZoneID &zone) const {
+  return host_.engineOfZone(places_.ofZone(zone).zone);
+}
+
+std::optional<SyncRow> SharingService::rowOf(const CKRecordID &record) const {
+  const auto engine = engineOf(record.zoneID);
+  return engine ? engine->store().byRecord(record.recordName) : std::nullopt;
+}
+
+NSError SharingService::refresh(SharingOperation &operation, const std::shared_ptr<SyncEngine> &engine) {
+  if (!engine) return NSError();
   return operation.await("asking the cloud for its changes",
-                         [this](SharingOperation::Done done) { engine_->fetchNow(std::move(done)); });
+                         [&engine](SharingOperation::Done done) { engine->fetchNow(std::move(done)); });
 }
 
 // --- Fetching.
@@ -76,8 +87,10 @@ NSError SharingService::fetch(SharingOperation &operation, const KnownShare &kno
   if (!fetched)
     return CKErrorMake(CKErrorCode::internalError, "the cloud's share " + id.description() + " isn't one");
   *share = *fetched;
-  known_.note(*fetched);
-  engine_->states().flush();
+  if (const auto engine = engineOf(fetched->recordID.zoneID)) {
+    KnownShares(engine->store(), engine->states()).note(*fetched);
+    engine->states().flush();
+  }
   return NSError();
 }
 
@@ -94,7 +107,7 @@ NSError SharingService::fetchNearest(SharingOperation &operation, const ItemReco
 NSError SharingService::fetchOwn(SharingOperation &operation, const NSURL &url, CKShare *share) {
   SharingItem item;
   if (const NSError error = items_.find(operation, url, &item)) return error;
-  if (const NSError error = refresh(operation)) return error;
+  if (const NSError error = refresh(operation, item.engine)) return error;
   const auto known = items_.shareOf(item.item);
   if (!known) return noShareOf(item.path);
   const NSError error = fetch(operation, *known, share);
@@ -107,7 +120,7 @@ void SharingService::copySharingInfo(const SharingCaller &caller, const NSURL &u
   const auto perform = [this, url, share](SharingOperation &operation) {
     SharingItem item;
     if (const NSError error = items_.find(operation, url, &item)) return error;
-    if (const NSError error = refresh(operation)) return error;
+    if (const NSError error = refresh(operation, item.engine)) return error;
     CKShare fetched;
     const NSError error = fetchNearest(operation, item.item, &fetched);
     if (!error) *share = fetched;
@@ -183,7 +196,7 @@ void SharingService::copyShareURL(const SharingCaller &caller, const std::option
 NSError SharingService::makeShare(SharingOperation &operation, const NSURL &url, CKShare *share) {
   SharingItem item;
   if (const NSError error = items_.findInCloud(operation, url, &item)) return error;
-  const SharingPlace place = places_.ofRow(*item.row);
+  const SharingPlace place = placeOf(item);
   if (!place.isOwn)
     return qvc_error(QVErrorNotShareable,
                      item.path + ": belongs to " + place.zone.ownerName + ", who alone can share it");

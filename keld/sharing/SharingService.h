@@ -29,8 +29,7 @@ struct ShareOptions {
 // any thread. Operations run on the pool (SharingQueue).
 class SharingService final : public std::enable_shared_from_this<SharingService> {
  public:
-  SharingService(SharingHost host, std::shared_ptr<SyncEngine> engine, SharingPlaces places,
-                 SharingOptions options);
+  SharingService(SharingHost host, SharingPlaces places, SharingOptions options);
 
   void copySharingInfo(const SharingCaller &caller, const NSURL &url, QVShareAndURLReply reply);
   void copyShareURL(const SharingCaller &caller, const std::optional<CKShare> &share,
@@ -64,7 +63,11 @@ class SharingService final : public std::enable_shared_from_this<SharingService>
   void start(const SharingCaller &caller, Perform perform, std::function<void(const NSError &)> answer);
 
   // What the operations do; each answers its error.
-  NSError refresh(SharingOperation &operation);
+  NSError refresh(SharingOperation &operation, const std::shared_ptr<SyncEngine> &engine);
+  SharingPlace placeOf(const SharingItem &item) const { return places_.ofZone(item.engine->scope().zone); }
+  // The sync of the zone, as this account writes it; null when there is none (any more).
+  std::shared_ptr<SyncEngine> engineOf(const CKRecordZoneID &zone) const;
+  std::optional<SyncRow> rowOf(const CKRecordID &record) const;
   NSError fetch(SharingOperation &operation, const KnownShare &known, CKShare *share);
   NSError fetchNearest(SharingOperation &operation, const ItemRecord &item, CKShare *share);
   NSError fetchOwn(SharingOperation &operation, const NSURL &url, CKShare *share);
@@ -85,10 +88,8 @@ class SharingService final : public std::enable_shared_from_this<SharingService>
   void noteGone(const CKRecordID &share);
 
   const SharingHost host_;
-  const std::shared_ptr<SyncEngine> engine_;
   const SharingPlaces places_;
   mutable SharingItems items_;
-  KnownShares known_;
   const std::shared_ptr<SharingQueue> queue_;
 };
 

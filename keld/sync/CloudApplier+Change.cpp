@@ -51,6 +51,10 @@ void CloudApplier::change(const DocumentRecord &document, const Place &place, Sy
     touch(location->path);
     return;
   }
+  // Whether it may be written isn't part of what was changed here.
+  const bool changesAccess = ((document.content.mode ^ row.content.mode) & 0222U) != 0;
+  if (context_.scope.isShared() && changesAccess)
+    ::fchmodat(location->folder.get(), location->name.c_str(), document.content.mode & 0777U, 0);
   changeContents(document, std::move(row), *location);
 }
 

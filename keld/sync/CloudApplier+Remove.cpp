@@ -15,8 +15,11 @@ void CloudApplier::remove(const std::string &record) {
   const auto row = context_.store.byRecord(record);
   if (!row) return;
   ++applied_;
-  const auto location = row->item != 0 ? context_.files.locate(row->item, nullptr) : std::nullopt;
-  if (!location && row->item != 0 && context_.files.item(row->item)) {
+  if (context_.scope.isShared()) context_.store.dropTop(record);
+  // What has left for another zone is that one's.
+  const bool isHere = row->item != 0 && context_.files.item(row->item);
+  const auto location = isHere ? context_.files.locate(row->item, nullptr) : std::nullopt;
+  if (!location && isHere) {
     touch(context_.files.pathOf(row->item));
     return context_.store.fetchAgain(record);
   }
@@ -60,6 +63,10 @@ void CloudApplier::removeDocument(const SyncRow &row, const FileLocation &locati
                   (look.kind == DocumentClass::plain && IsSameContents(LocalFileOf(look.facts), row.local));
   }
   context_.store.erase(row.record);
+  if (!isUnchanged && context_.scope.isShared() && row.parent == context_.scope.top()) {
+    if (row.item != 0) context_.store.dropQueued(row.item);
+    return keepAside(location.path);
+  }
   if (!isUnchanged) {
     // Deleted elsewhere, and written here since: it lives, as a document of its own.
     if (row.item != 0) context_.store.enqueue(row.item, false, false);
@@ -88,13 +95,21 @@ void CloudApplier::removeFolders() {
   }
   std::sort(doomed.begin(), doomed.end(),
             [](const Doomed &a, const Doomed &b) { return a.path.size() > b.path.size(); });
+  std::set<std::string> records;
+  for (const Doomed &folder : doomed) records.insert(folder.record);
   for (const Doomed &folder : doomed) {
     const auto row = context_.store.byRecord(folder.record);
+    if (context_.scope.isShared()) hangChildren(folder.record, records);
     const int result = ::rmdir(context_.files.absolute(folder.path).c_str());
     const bool isGone = result == 0 || errno == ENOENT;
     context_.store.erase(folder.record);
     touch(folder.path);
-    if (isGone || !row || row->item == 0) continue;
+    if (isGone || !row) continue;
+    if (context_.scope.isShared() && row->parent == context_.scope.top()) {
+      keepAside(folder.path);
+      continue;
+    }
+    if (row->item == 0) continue;
     // It gets a record of its own, which what is left in it has to be told.
     context_.store.enqueue(row->item, false, false);
     for (const SyncRow &child : context_.store.childrenOf(folder.record, UINT32_MAX))

@@ -9,6 +9,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include "keld/sync/SharedAccess.h"
 #include "platform/cloudkit/CKDigest.h"
 #include "platform/cloudkit/CKShare.h"
 #include "tessaly/QVContainer.h"
@@ -45,6 +46,8 @@ CloudApplier::CloudApplier(const SyncContext &context, ConflictCopies &conflicts
 NSError CloudApplier::fetchAndApply(const CKCallContext &call) {
   undoUnfinished();
   NSError problem = fetchPages(call);
+  const bool isShared = context_.scope.isShared();
+  if (!problem && isShared) context_.store.hangOrphans();
   if (!problem) problem = fetchAgain(call);
   if (!problem && !hasFetchedAll()) context_.store.setNumber(kHasFetchedAll, 1);
   return problem;
@@ -60,9 +63,11 @@ void CloudApplier::beginFetchOfAll() {
   seenShares_.clear();
   context_.store.setText(kToken, "");
   context_.store.setNumber(kFetchesAll, 1);
+  context_.store.forgetAccesses();
 }
 
 NSError CloudApplier::fetchPages(const CKCallContext &call) {
+  isZoneGone_ = false;
   for (;;) {
     CKServerChangeToken token;
     std::string kept = context_.store.text(kToken);
@@ -74,7 +79,7 @@ NSError CloudApplier::fetchPages(const CKCallContext &call) {
     }
     if (!kept.empty()) token.data = NSData::dataWithString(kept);
     const CKZoneChanges page =
-        context_.cloud.fetchZoneChanges(DriveZone(), token, std::nullopt, kRecordsAtATime, call);
+        context_.cloud.fetchZoneChanges(context_.scope.zone, token, std::nullopt, kRecordsAtATime, call);
     if (CKErrorIs(page.error, CKErrorCode::changeTokenExpired)) {
       if (isSameCloud_ && !isSameCloud_()) return page.error;
       beginFetchOfAll();
@@ -82,44 +87,62 @@ NSError CloudApplier::fetchPages(const CKCallContext &call) {
     }
     if (CKErrorIs(page.error, CKErrorCode::zoneNotFound)) {
       if (isSameCloud_ && !isSameCloud_()) return page.error;
-      const NSError problem = context_.cloud.saveZone(DriveZone(), call);
-      if (problem) return problem;
+      const NSError problem = withoutZone(call);
+      if (problem || isZoneGone_) return problem;
       continue;
     }
     if (page.error) return page.error;
-    const NSError problem = applyPage(page);
+    const NSError problem = applyPage(page, call);
     if (problem) return problem;
     if (!page.moreComing) return NSError();
   }
 }
 
-NSError CloudApplier::applyPage(const CKZoneChanges &page) {
+NSError CloudApplier::withoutZone(const CKCallContext &call) {
+  if (!context_.scope.isShared()) return context_.cloud.saveZone(context_.scope.zone, call);
+  emptyZone();
+  isZoneGone_ = true;
+  return NSError();
+}
+
+std::vector<DocumentRecord> CloudApplier::documentsOf(const std::vector<CKRecord> &records) {
   std::vector<DocumentRecord> documents;
-  for (const CKRecord &record : page.changedRecords) {
+  for (const CKRecord &record : records) {
     if (record.recordType == CKRecordTypeShare) continue;  // is no item: noteShares()
     // One that makes no sense isn't one that was deleted.
     if (fetchesAll_) seen_.insert(record.recordID.recordName);
     auto document = ReadRecord(record);
-    if (!document) {
+    if (!document || !place(&*document)) {
       os_log_error(qvc_default_log(), "[ERROR] the cloud's record %s makes no sense and is left alone",
                    record.recordID.recordName);
       continue;
     }
     documents.push_back(std::move(*document));
   }
+  return documents;
+}
+
+NSError CloudApplier::applyPage(const CKZoneChanges &page, const CKCallContext &call) {
+  if (context_.scope.isShared() && account_.empty()) {
+    const CKUserIdentityReply asked = context_.cloud.currentUserIdentity(call);
+    if (asked.error) return asked.error;
+    account_ = asked.identity.accountName;
+  }
+  const std::vector<DocumentRecord> documents = documentsOf(page.changedRecords);
   const bool endsAll = fetchesAll_ && !page.moreComing;
   // Another cloud that came into this one's place has none of the records.
   if (endsAll && isSameCloud_ && !isSameCloud_())
     return CKErrorMake(CKErrorCode::changeTokenExpired, "the cloud was replaced while it was read");
   beginUnfinished(documents);
   context_.store.transaction([&] {
+    noteAccesses(page);
     applyAll(documents);
     noteShares(page);
     for (const CKDeletedRecord &deleted : page.deletedRecords)
       if (deleted.recordType != CKRecordTypeShare) remove(deleted.recordID.recordName);
     if (endsAll) {
       removeUnseen();
-      shares_.forgetUnseen(DriveZone(), seenShares_);
+      shares_.forgetUnseen(context_.scope.zone, seenShares_);
       context_.store.setNumber(kFetchesAll, 0);
     }
     if (!page.moreComing) removeFolders();
@@ -156,7 +179,7 @@ void CloudApplier::noteShares(const CKZoneChanges &page) {
 // be the last copy.
 void CloudApplier::removeUnseen() {
   const std::vector<std::string> known = context_.store.recordsInCloud();
-  if (seen_.empty() && !known.empty()) {
+  if (seen_.empty() && !known.empty() && !context_.scope.isShared()) {
     os_log_error(qvc_default_log(),
                  "[ERROR] the cloud has lost all of the drive: what is here is sent to it again");
     for (const std::string &record : known) sendAgain(record);
@@ -181,7 +204,8 @@ void CloudApplier::sendAgain(const std::string &record) {
 void CloudApplier::applyRecords(const std::vector<CKRecord> &records, const CKCallContext &call) {
   std::vector<DocumentRecord> documents;
   for (const CKRecord &record : records)
-    if (auto document = ReadRecord(record)) documents.push_back(std::move(*document));
+    if (auto document = ReadRecord(record); document && place(&*document))
+      documents.push_back(std::move(*document));
   beginUnfinished(documents);
   context_.store.transaction([&] { applyAll(documents); });
   finishBatch();
@@ -194,7 +218,7 @@ NSError CloudApplier::fetchAgain(const CKCallContext &call) {
   for (;;) {
     std::vector<CKRecordID> wanted;
     for (const std::string &record : context_.store.toFetch(asked.size() + kRecordsAtATime))
-      if (asked.insert(record).second) wanted.push_back(RecordID(record));
+      if (asked.insert(record).second) wanted.push_back(context_.scope.recordID(record));
     if (wanted.empty()) return NSError();
     const CKFetchReply reply = context_.cloud.fetchRecords(wanted, std::nullopt, call);
     if (reply.error && !CKErrorIs(reply.error, CKErrorCode::partialFailure)) return reply.error;
@@ -212,7 +236,7 @@ void CloudApplier::applyFetched(const std::vector<CKRecordResult> &results) {
     answered.push_back(result.recordID.recordName);
     if (isGone) gone.push_back(result.recordID.recordName);
     auto document = isGone ? std::nullopt : ReadRecord(result.record);
-    if (document) documents.push_back(std::move(*document));
+    if (document && place(&*document)) documents.push_back(std::move(*document));
   }
   beginUnfinished(documents);
   context_.store.transaction([&] {
@@ -237,7 +261,10 @@ void CloudApplier::finishBatch() {
 
 void CloudApplier::applyAll(const std::vector<DocumentRecord> &documents) {
   for (const DocumentRecord &document : documents) {
-    apply(document);
+    if (context_.scope.isShared())
+      apply(AsItMayBeUsed(document, context_));
+    else
+      apply(document);
     context_.store.finished(document.record);
   }
 }
@@ -287,10 +314,10 @@ void CloudApplier::waitForPlace(const DocumentRecord &document) {
 void CloudApplier::apply(const DocumentRecord &document) {
   context_.store.dropOrphan(document.record);
   auto row = context_.store.byRecord(document.record);
-  if (row && row->tag == document.tag) return;
+  if (row && row->tag == document.tag && isAsApplied(document, *row)) return;
   // Its contents are on their way; unless something was written here meanwhile.
-  if (row && row->hasNewer() && row->newerTag == document.tag && context_.files.item(row->item) &&
-      !context_.store.queued(row->item))
+  if (row && row->hasNewer() && row->newerTag == document.tag && isAsApplied(document, *row) &&
+      context_.files.item(row->item) && !context_.store.queued(row->item))
     return;
   if (row && (isOwnSaveOfDead(document, *row) || isKnownOfDead(document, *row)))
     return followOwnSave(document, std::move(*row));
@@ -313,7 +340,9 @@ void CloudApplier::apply(const DocumentRecord &document) {
     made.newerTag.clear();
     create(document, place, std::move(made));
   }
-  if (document.kind == NSFileProviderItemKind::folder) context_.store.fetchOrphansOf(document.record);
+  if (document.kind != NSFileProviderItemKind::folder) return;
+  context_.store.fetchOrphansOf(document.record);
+  if (context_.scope.isShared()) context_.store.fetchTopsOf(document.record);
 }
 
 // Whether this device has saved that itself and lost the reply, and what it saved was deleted here since.

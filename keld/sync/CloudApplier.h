@@ -35,6 +35,9 @@ class CloudApplier {
   // Asked before much is believed to be deleted: whether the cloud is still the same one.
   void setCloudCheck(std::function<bool()> isSame) { isSameCloud_ = std::move(isSame); }
   std::uint64_t applied() const { return applied_; }
+  // Whether the last fetch found that nothing of another's zone is shared any more. Its items are gone then,
+  // and what was only here lies in the drive.
+  bool isZoneGone() const { return isZoneGone_; }
 
  private:
   struct Place {
@@ -43,7 +46,9 @@ class CloudApplier {
   };
 
   NSError fetchPages(const CKCallContext &call);
-  NSError applyPage(const CKZoneChanges &page);
+  NSError withoutZone(const CKCallContext &call);
+  NSError applyPage(const CKZoneChanges &page, const CKCallContext &call);
+  std::vector<DocumentRecord> documentsOf(const std::vector<CKRecord> &records);
   void noteShares(const CKZoneChanges &page);
   void applyAll(const std::vector<DocumentRecord> &documents);
   NSError fetchAgain(const CKCallContext &call);
@@ -101,6 +106,19 @@ class CloudApplier {
   void removeDocument(const SyncRow &row, const FileLocation &location);
   void removeFolders();
 
+  // What is particular to scopes (CloudApplier+Shared.cpp). place() finds where in this scope a record
+  // belongs; false: in none.
+  bool place(DocumentRecord *document);
+  bool isAsApplied(const DocumentRecord &document, const SyncRow &row) const;
+  void noteAccesses(const CKZoneChanges &page);
+  void followAccess(const CKRecord &record);
+  void applyAccessBelow(const std::string &root);
+  void hangChildren(const std::string &folder, const std::set<std::string> &doomed);
+  bool hangAtTop(SyncRow row);
+  // Moves what was changed here, and isn't shared any more, into the drive's own folder.
+  void keepAside(const std::string &path);
+  void emptyZone();
+
   DocumentMarker markerOf(const DocumentRecord &document) const;
   void touch(const std::string &path) { touched_.push_back(path); }
   void finishBatch();
@@ -114,6 +132,8 @@ class CloudApplier {
   std::uint64_t applied_ = 0;
   std::function<bool()> isSameCloud_;
   bool isReplicaSeen_ = false;
+  bool isZoneGone_ = false;
+  std::string account_;  // this one's name, once it was asked for
   bool fetchesAll_ = false;
   std::set<std::string> seen_, seenShares_;  // while everything is fetched anew
 };

@@ -32,21 +32,31 @@ std::string withoutSeparators(std::string text) {
   return text;
 }
 
-}  // namespace
-
-std::string ConflictName(const std::string &name, const std::string &device, std::int64_t nanoseconds,
-                         unsigned number) {
+// The name with the suffix in front of its extension, cut where it would be too long.
+std::string suffixed(const std::string &name, const std::string &suffix) {
   const std::size_t dot = name.rfind('.');
   const bool hasExtension = dot != std::string::npos && dot > 0 && name.size() - dot <= kLongestExtension;
   const std::string extension = hasExtension ? name.substr(dot) : std::string();
   const std::string stem = hasExtension ? name.substr(0, dot) : name;
+  return shortened(stem, kLongestName - suffix.size() - extension.size()) + suffix + extension;
+}
+
+}  // namespace
+
+std::string ConflictName(const std::string &name, const std::string &device, std::int64_t nanoseconds,
+                         unsigned number) {
   std::string suffix = " (conflict, ";
   suffix += shortened(withoutSeparators(device), 60);
   suffix += " ";
   suffix += dateOf(nanoseconds);
   if (number > 1) suffix += " " + std::to_string(number);
   suffix += ")";
-  return shortened(stem, kLongestName - suffix.size() - extension.size()) + suffix + extension;
+  return suffixed(name, suffix);
+}
+
+std::string NoLongerSharedName(const std::string &name, unsigned number) {
+  return suffixed(name, number > 1 ? " (no longer shared " + std::to_string(number) + ")"
+                                   : std::string(" (no longer shared)"));
 }
 
 }  // namespace droxa::keld

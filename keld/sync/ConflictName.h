@@ -11,4 +11,8 @@ namespace droxa::keld {
 std::string ConflictName(const std::string &name, const std::string &device, std::int64_t nanoseconds,
                          unsigned number = 1);
 
+// What is kept of something that another doesn't share any more: "name (no longer shared).ext", with a number
+// from 2 on.
+std::string NoLongerSharedName(const std::string &name, unsigned number);
+
 }  // namespace droxa::keld

@@ -2,37 +2,61 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include "keld/SharedContainer.h"
 #include "keld/sync/DownloadTransfer.h"
 #include "keld/sync/ReplicaBarrier.h"
+#include "keld/sync/SharedAccess.h"
 #include "platform/dispatch/dispatch.h"
 #include "tessaly/NSURL+Tessaly.h"
 #include "tessaly/QVContainer.h"
 #include "tessaly/QVErrors.h"
-#include "tessaly/QVLog.h"
 
 namespace droxa::keld {
 
 namespace {
 
-constexpr std::size_t kMostFailures = 1000;
 constexpr std::uint64_t kChildrenAtATime = 1000;
 
 bool isDocument(const ItemRecord &item) {
   return item.facts.kind == NSFileProviderItemKind::document;
 }
 
-bool isSyncedItem(const ItemRecord &item) {
-  const bool isPlaced = item.zone() == Zone::shown || item.zone() == Zone::trashed;
-  return isPlaced && (item.flags & kExcludedFlag) == 0;
+// Replies when all of `number` have been answered, with the first error.
+QVContentsErrorReply afterAll(std::size_t number, QVContentsErrorReply reply) {
+  struct Waiting {
+    Mutex mutex;
+    std::size_t left GUARDED_BY(mutex) = 0;
+    NSError error GUARDED_BY(mutex);
+  };
+  const auto waiting = std::make_shared<Waiting>();
+  {
+    const Lock lock(waiting->mutex);
+    waiting->left = number;
+  }
+  return [waiting, reply = std::move(reply)](const NSError &error) {
+    NSError outcome;
+    {
+      const Lock lock(waiting->mutex);
+      if (error && !waiting->error) waiting->error = error;
+      if (--waiting->left > 0) return;
+      outcome = waiting->error;
+    }
+    reply(outcome);
+  };
 }
 
 }  // namespace
 
 // --- Finding.
+
+std::vector<std::shared_ptr<SyncEngine>> ContentsService::engines() {
+  std::vector<std::shared_ptr<SyncEngine>> engines{drive_};
+  for (auto &engine : host_.sharedEngines()) engines.push_back(std::move(engine));
+  return engines;
+}
 
 std::optional<ItemRecord> ContentsService::known(const std::string &path, NSError *error) {
   std::optional<ItemRecord> found;
@@ -48,7 +72,7 @@ void ContentsService::find(const NSURL &url, Found found) {
   if (error) return found(nullptr, error);
   // Another file may have come to that path a moment ago.
   struct stat status = {};
-  const bool isThere = ::lstat(engine_->files().absolute(*path).c_str(), &status) == 0;
+  const bool isThere = ::lstat(drive_->files().absolute(*path).c_str(), &status) == 0;
   if (item && isThere && status.st_ino == item->facts.inode) return found(&*item, NSError());
   host_.keeper().lookAt(*path, [self = shared_from_this(), path = *path, url, found = std::move(found)] {
     NSError problem;
@@ -110,216 +134,36 @@ void ContentsService::startDownload(const NSURL &url, std::uint64_t options, QVT
                                                                             const NSError &error) {
     if (!item) return reply(nullptr, error);
     const bool isFolder = item->isFolder();
+    const auto engine = self->engineOf(*item);
     std::vector<std::unique_ptr<Downloads::Interest>> interests;
     // What the table shows of a document may be a moment behind what the sync knows.
     const auto isWanted = [&](const ItemRecord &child) {
       if (!isFolder || (child.flags & kDatalessFlag) != 0) return true;
       if ((child.flags & kUploadedFlag) != 0) return false;
-      const auto row = self->engine_->store().byItem(child.id);
+      const auto row = engine->store().byItem(child.id);
       return row && row->isDataless;
     };
     for (const ItemRecord &document : self->documentsBelow(*item, isWanted))
-      interests.push_back(self->engine_->downloads()->want(document.id, document.facts.size, priority));
+      interests.push_back(engine->downloads()->want(document.id, document.facts.size, priority));
     reply(DownloadTransfer::of(std::move(interests)), NSError());
   });
 }
 
-// --- Letting go.
-
-void ContentsService::evictItemAtURL(const NSURL &url, QVContentsResultReply reply) {
-  find(url,
-       [self = shared_from_this(), reply = std::move(reply)](const ItemRecord *item, const NSError &error) {
-         if (!item) return reply({}, error);
-         dispatch_async_global([self, asked = *item, reply] {
-           QVContentsResult result;
-           NSError own;
-           for (const ItemRecord &document : self->documentsBelow(
-                    asked, [](const ItemRecord &child) { return (child.flags & kDatalessFlag) == 0; })) {
-             std::uint64_t bytes = 0;
-             const NSError refused = self->evict(document, &bytes);
-             if (!refused) {
-               ++result.documents;
-               result.bytes += bytes;
-               continue;
-             }
-             ++result.refused;
-             if (!asked.isFolder()) own = refused;
-             if (result.failures.size() < kMostFailures)
-               result.failures.push_back(
-                   {self->engine_->files().absolute(self->engine_->files().pathOf(document.id)), refused});
-           }
-           self->engine_->states().flush([reply, result, own] { reply(result, own); });
-         });
-       });
-}
-
-NSError ContentsService::evict(const ItemRecord &document, std::uint64_t *bytes) {
-  NSError problem;
-  const auto location = engine_->files().locate(document.id, &problem);
-  if (!location) return problem ? problem : qvc_errorNoSuchItem(document.name);
-  const std::string path = engine_->files().absolute(location->path);
-  if (engine_->isPinnedOrBelowPin(document.id)) return qvc_error(QVErrorPinned, path + ": is pinned here");
-  const auto row = engine_->store().byItem(document.id);
-  const NSError unsent = qvc_error(QVErrorUnsentChanges, path + ": the cloud doesn't have it yet");
-  if (!row || row->tag.empty() || !isSyncedItem(location->item)) return unsent;
-  if (const auto queued = engine_->store().queued(document.id); queued && !queued->isDeletion) return unsent;
-  const DocumentLook look = engine_->storage().classify(location->folder.get(), location->name);
-  if (look.kind == DocumentClass::dataless || look.facts.size == 0) return NSError();  // nothing to let go of
-  if (!cloudHasContents(*location, *row, look)) return unsent;
-  DocumentMarker marker = look.marker ? *look.marker : DocumentMarker();
-  marker.recordName = row->record;
-  marker.digest = row->content.digest;
-  marker.size = row->content.size;
-  marker.modified = look.facts.modified;
-  const ContentsResult result =
-      engine_->storage().evict(location->folder.get(), location->name, look.facts, marker);
-  switch (result.outcome) {
-    case ContentsOutcome::done:
-      break;
-    case ContentsOutcome::inUse:
-      return qvc_error(QVErrorDocumentInUse, path + ": a program has it open");
-    case ContentsOutcome::changedMeanwhile:
-      return unsent;
-    case ContentsOutcome::gone:
-      return qvc_errorNoSuchItem(path);
-    default:
-      return NSError::errorWithPOSIXCode(result.error != 0 ? result.error : EIO, path);
-  }
-  *bytes = row->content.size;
-  engine_->store().transaction([&] {
-    auto now = engine_->store().byItem(document.id);
-    if (!now || now->content.digest != row->content.digest) return;
-    now->isDataless = true;
-    now->local = LocalFileOf(result.facts);
-    engine_->store().put(*now);
-  });
-  engine_->states().show({document.id, true, true, LocalFileOf(result.facts), true});
-  return NSError();
-}
-
-// A file whose dates say that it is as it was sent may have been written with its dates put back: where the
-// status change isn't the known one, its contents decide.
-bool ContentsService::cloudHasContents(const FileLocation &location, const SyncRow &row,
-                                       const DocumentLook &look) {
-  if (row.hasNewer() || row.content.digest.empty() || !IsSameContents(LocalFileOf(look.facts), row.local))
-    return false;
-  if (row.local.changed != 0 && look.facts.changed == row.local.changed) return true;
-  const OwnedDescriptor file(
-      ::openat(location.folder.get(), location.name.c_str(), O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK));
-  return file && DigestOfFile(file.get()) == row.content.digest;
-}
+// --- Pins.
 
 void ContentsService::setPinnedAtURL(const NSURL &url, bool isPinned, QVContentsErrorReply reply) {
   find(url, [self = shared_from_this(), isPinned, reply = std::move(reply)](const ItemRecord *item,
                                                                             const NSError &error) {
     if (!item) return reply(error);
-    self->engine_->store().setPinned(item->id, isPinned);
+    const auto engine = self->engineOf(*item);
+    engine->store().setPinned(item->id, isPinned);
     if (isPinned) {
       for (const ItemRecord &document : self->documentsBelow(
                *item, [](const ItemRecord &child) { return (child.flags & kDatalessFlag) != 0; }))
-        self->engine_->downloads()->fetchInBackground(document.id, document.facts.size);
+        engine->downloads()->fetchInBackground(document.id, document.facts.size);
     }
     reply(NSError());
   });
-}
-
-// --- What is what.
-
-QVContentsStatus ContentsService::statusOf(const ItemRecord &document) {
-  QVContentsStatus status;
-  status.size = document.facts.size;
-  status.isPinned = engine_->isPinnedOrBelowPin(document.id);
-  const auto transferred = engine_->downloads()->transferred(document.id);
-  const auto row = engine_->store().byItem(document.id);
-  if ((document.flags & kDatalessFlag) != 0)
-    status.contents = transferred ? QVContentsState::downloading : QVContentsState::dataless;
-  status.transferred = transferred.value_or(0);
-  status.error = engine_->downloads()->lastError(document.id);
-  if (row) status.checksum = row->content.digest;
-  if (!isSyncedItem(document) || !host_.isSignedIn()) return status;
-  const auto queued = engine_->store().queued(document.id);
-  const bool isClean = row && !row->tag.empty() && !queued && (document.flags & kUploadedFlag) != 0;
-  if (isClean) {
-    status.upload = QVUploadState::inCloud;
-  } else if (engine_->assetUploads().isUnderWay(document.id)) {
-    status.upload = QVUploadState::uploading;
-    for (const AssetUploads::Progress &upload : engine_->assetUploads().underWay())
-      if (upload.item == document.id) status.transferred = upload.done;
-  } else if (queued && queued->error) {
-    status.upload = QVUploadState::failed;
-    status.error = queued->error;
-  } else {
-    status.upload = QVUploadState::queued;
-  }
-  return status;
-}
-
-QVContentsStatus ContentsService::statusBelow(const ItemRecord &folder) {
-  // From the least safe to the safest.
-  const auto danger = [](QVUploadState state) {
-    switch (state) {
-      case QVUploadState::failed:
-        return 4;
-      case QVUploadState::queued:
-        return 3;
-      case QVUploadState::uploading:
-        return 2;
-      case QVUploadState::local:
-        return 1;
-      case QVUploadState::inCloud:
-        break;
-    }
-    return 0;
-  };
-  QVContentsStatus status;
-  status.upload = QVUploadState::inCloud;
-  status.isPinned = engine_->isPinnedOrBelowPin(folder.id);
-  for (const ItemRecord &document : documentsBelow(folder, [](const ItemRecord &) { return true; })) {
-    const QVContentsStatus own = statusOf(document);
-    ++status.documents;
-    status.size += own.size;
-    status.transferred += own.transferred;
-    if (own.contents != QVContentsState::present) {
-      ++status.dataless;
-      if (status.contents != QVContentsState::downloading) status.contents = own.contents;
-    }
-    const bool isUnsent = own.upload != QVUploadState::inCloud && own.upload != QVUploadState::local;
-    if (isUnsent) ++status.unsent;
-    if (own.upload == QVUploadState::failed || own.error) ++status.failed;
-    if (own.error && !status.error) status.error = own.error;
-    if (danger(own.upload) > danger(status.upload)) status.upload = own.upload;
-  }
-  return status;
-}
-
-void ContentsService::getContentsStatusAtURL(const NSURL &url, QVContentsStatusReply reply) {
-  find(url,
-       [self = shared_from_this(), reply = std::move(reply)](const ItemRecord *item, const NSError &error) {
-         if (!item) return reply({}, error);
-         reply(item->isFolder() ? self->statusBelow(*item) : self->statusOf(*item), NSError());
-       });
-}
-
-void ContentsService::getTransferStatus(QVTransferStatusReply reply) {
-  QVTransferStatus status;
-  const SyncEngine::Status engine = engine_->status();
-  status.downloads = engine_->downloads()->counts();
-  for (const AssetUploads::Progress &upload : engine_->assetUploads().underWay()) {
-    ++status.uploads.active;
-    status.uploads.bytesLeft += upload.total - std::min(upload.done, upload.total);
-  }
-  const std::uint64_t queued = engine_->store().countQueued();
-  status.uploads.queued = queued - std::min(queued, status.uploads.active);
-  status.uploads.done = engine.uploadsDone;
-  status.uploads.failed = engine_->store().countFailed();
-  status.uploads.bytesDone = engine.bytesUploaded;
-  status.uploads.bytesPerSecond = engine.uploadRate;
-  status.cloud = engine.cloud;
-  status.cloudProblem = engine.cloudProblem;
-  status.isCloudReachable = engine.cloudProblem.empty();
-  status.heldDeletions = engine_->store().countHeld();
-  status.conflicts = engine.conflicts;
-  reply(status, NSError());
 }
 
 // --- Waiting until it is safe.
@@ -329,7 +173,12 @@ void ContentsService::waitForUploadAtURL(const NSURL &url, QVContentsErrorReply 
   dispatch_async_global([self = shared_from_this(), url, reply = std::move(reply)] {
     const NSError unseen = WaitUntilReplicaIsSeen(self->host_.replicaPath, self->host_.read);
     if (unseen) return reply(unseen);
-    if (!url) return self->engine_->whenUploaded({}, reply);
+    if (!url) {
+      const auto engines = self->engines();
+      const QVContentsErrorReply each = afterAll(engines.size(), reply);
+      for (const auto &engine : engines) engine->whenUploaded({}, each);
+      return;
+    }
     self->find(url, [self, reply](const ItemRecord *item, const NSError &error) {
       if (!item) return reply(error);
       std::vector<ItemNumber> items{item->id};
@@ -337,7 +186,7 @@ void ContentsService::waitForUploadAtURL(const NSURL &url, QVContentsErrorReply 
                *item, [](const ItemRecord &child) { return (child.flags & kUploadedFlag) == 0; }))
         items.push_back(document.id);
       std::sort(items.begin(), items.end());
-      self->engine_->whenUploaded(std::move(items), reply);
+      self->engineOf(*item)->whenUploaded(std::move(items), reply);
     });
   });
 }
@@ -348,22 +197,32 @@ void ContentsService::allowDeletionAtURL(const NSURL &url, QVContentsErrorReply 
          if (!item) return reply(error);
          std::vector<ItemNumber> items{item->id};
          self->forEachBelow(*item, [&](ItemRecord &child) { items.push_back(child.id); });
-         self->engine_->announceDeletions(items);
+         self->engineOf(*item)->announceDeletions(items);
          reply(NSError());
        });
 }
 
 void ContentsService::confirmDeletions(bool carryOut, QVContentsErrorReply reply) {
-  engine_->answerDeletions(carryOut);
+  for (const auto &engine : engines()) engine->answerDeletions(carryOut);
   reply(NSError());
 }
 
 // --- Moves.
 
+// Whether nothing can be put into the folder of what another shares.
+bool ContentsService::isReadOnlyFolder(const std::string &path) {
+  NSError error;
+  const auto folder = known(path, &error);
+  if (!folder || (folder->flags & kOthersFlag) == 0) return false;
+  const auto engine = engineOf(*folder);
+  const auto row = engine->store().byItem(folder->id);
+  return row && !SharedAccess(engine->store(), engine->scope()).isWritable(row->record);
+}
+
 QVMove ContentsService::describeMove(const ItemRecord &item, const NSURL &destination,
                                      const std::string &targetFolder) {
   QVMove move;
-  const std::string source = engine_->files().pathOf(item.id);
+  const std::string source = drive_->files().pathOf(item.id);
   const auto container = [](const std::string &path) { return path.substr(0, path.find('/')); };
   const auto target = host_.pathBelowReplica(destination);
   move.isOfContainer = item.zone() == Zone::structure;
@@ -383,6 +242,10 @@ QVMove ContentsService::describeMove(const ItemRecord &item, const NSURL &destin
   }
   move.isIntoItself = item.isFolder() && target->compare(0, source.size() + 1, source + "/") == 0;
   move.leavesContainer = container(*target) != container(source);
+  move.leavesShare = move.leavesContainer && IsSharedContainer(container(source));
+  if (IsSharedContainer(container(*target)))
+    move.isToReadOnlyPlace =
+        move.isToReadOnlyPlace || isReadOnlyFolder(target->substr(0, target->rfind('/')));
   move.isIntoTrash = container(*target) == QVUbiquitousTrashContainerID;
   move.isIntoLocalPlace =
       qv_isInTessalyPrivateStorages(destination) || qv_wouldBeExcludedFromSync(destination);

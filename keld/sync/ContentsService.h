@@ -18,15 +18,18 @@ struct ContentsServiceHost {
   ReplicaFiles::Read read;
   std::function<std::optional<std::string>(const NSURL &url)> pathBelowReplica;
   std::function<bool()> isSignedIn;
+  // Of what others share.
+  std::function<std::vector<std::shared_ptr<SyncEngine>>()> sharedEngines;
+  std::function<std::shared_ptr<SyncEngine>(const ItemRecord &item)> engineOf;  // of the item's scope
 };
 
-// Answers clients about contents, from the sync's engine. Thread contract: any thread; what takes time is
-// done on the pool.
+// Answers clients about contents, each from the engine of the scope that the item is in. Thread contract: any
+// thread; what takes time is done on the pool.
 class ContentsService final : public QVContentsProtocol,
                               public std::enable_shared_from_this<ContentsService> {
  public:
-  ContentsService(ContentsServiceHost host, std::shared_ptr<SyncEngine> engine)
-      : host_(std::move(host)), engine_(std::move(engine)) {}
+  ContentsService(ContentsServiceHost host, std::shared_ptr<SyncEngine> drive)
+      : host_(std::move(host)), drive_(std::move(drive)) {}
 
   void startDownloadAtURL(const NSURL &url, std::uint64_t options, QVTransferReply reply) override;
   void evictItemAtURL(const NSURL &url, QVContentsResultReply reply) override;
@@ -39,6 +42,9 @@ class ContentsService final : public QVContentsProtocol,
   void confirmDeletions(bool carryOut, QVContentsErrorReply reply) override;
 
  private:
+  // All that is below one folder is of one scope.
+  std::shared_ptr<SyncEngine> engineOf(const ItemRecord &item) const { return host_.engineOf(item); }
+  std::vector<std::shared_ptr<SyncEngine>> engines();  // the drive's first
   using Found = std::function<void(const ItemRecord *item, const NSError &error)>;
   // Finds the item at the URL, looking on disk where it isn't known. `found` comes once, on any thread.
   void find(const NSURL &url, Found found);
@@ -49,14 +55,15 @@ class ContentsService final : public QVContentsProtocol,
   // The item, or everything below it, that `wanted` says yes to.
   std::vector<ItemRecord> documentsBelow(const ItemRecord &item,
                                          const std::function<bool(const ItemRecord &)> &wanted);
-  QVContentsStatus statusOf(const ItemRecord &document);
+  QVContentsStatus statusOf(SyncEngine &engine, const ItemRecord &document);
   QVContentsStatus statusBelow(const ItemRecord &folder);
-  NSError evict(const ItemRecord &document, std::uint64_t *bytes);
-  bool cloudHasContents(const FileLocation &location, const SyncRow &row, const DocumentLook &look);
+  static NSError evict(SyncEngine &engine, const ItemRecord &document, std::uint64_t *bytes);
+  static bool cloudHasContents(const FileLocation &location, const SyncRow &row, const DocumentLook &look);
+  bool isReadOnlyFolder(const std::string &path);
   QVMove describeMove(const ItemRecord &item, const NSURL &destination, const std::string &targetFolder);
 
   const ContentsServiceHost host_;
-  const std::shared_ptr<SyncEngine> engine_;
+  const std::shared_ptr<SyncEngine> drive_;
 };
 
 }  // namespace droxa::keld

@@ -1,19 +1,11 @@
 #include "keld/sync/DeviceName.h"
 
-#include <unistd.h>
+#include "tessaly/QVHomeCloud.h"
 
 namespace droxa::keld {
 
 std::string DeviceName(const DroxaHome &home) {
-  char name[256] = {};
-  if (::gethostname(name, sizeof name - 1) != 0 || name[0] == '\0') return "this device";
-  std::string device = name;
-  const std::string folder = home.root().substr(home.root().rfind('/') + 1);
-  if (!folder.empty() && folder != "droxa") {
-    device += "-";
-    device += folder;
-  }
-  return device.substr(0, 200);
+  return QVDeviceName(home);
 }
 
 }  // namespace droxa::keld

@@ -107,11 +107,11 @@ CKRecord MakeRecordWithContent(const DocumentRecord &document) {
   return record;
 }
 
-CKRecord MakeRecordWithThumbnail(const std::string &record, const std::string &tag,
+CKRecord MakeRecordWithThumbnail(const CKRecordID &record, const std::string &tag,
                                  const CKAssetReference &thumbnail) {
   CKRecord made;
   made.recordType = kRecordType;
-  made.recordID = RecordID(record);
+  made.recordID = record;
   made.recordChangeTag = tag;
   made.fields[kQVRecordKeyThumbnail1024x1024] = CKAsset::assetWithReference(thumbnail);
   return made;

@@ -63,7 +63,7 @@ CKRecord MakeRecord(const DocumentRecord &document);
 // The same with the contents, which the cloud must have already. A thumbnail of others goes with that save.
 CKRecord MakeRecordWithContent(const DocumentRecord &document);
 // Adds a thumbnail to a document in that state, and changes nothing else.
-CKRecord MakeRecordWithThumbnail(const std::string &record, const std::string &tag,
+CKRecord MakeRecordWithThumbnail(const CKRecordID &record, const std::string &tag,
                                  const CKAssetReference &thumbnail);
 // nullopt for a record that no device of this kind wrote: hostile names, sizes and kinds among them.
 std::optional<DocumentRecord> ReadRecord(const CKRecord &record);

@@ -185,9 +185,13 @@ void LocalExaminer::queue(ItemNumber item, bool isDeletion) {
 
 void LocalExaminer::examineLive(const ItemRecord &item) {
   auto row = store_.byItem(item.id);
-  if (!isSynced(item)) {
-    // It left what is synced: for the cloud, it is gone.
-    if (row) queue(item.id, true);
+  const bool isInScope = files_.isInScope(item);
+  if (!isSynced(item) || !isInScope) {
+    // It left what is synced, or for another zone: for this one, it is gone.
+    if (row)
+      queue(item.id, true);
+    else if (!isInScope)
+      store_.dropQueued(item.id);
     return;
   }
   const std::string parent = files_.parentRecord(item);

@@ -12,13 +12,31 @@ namespace {
 constexpr int kDeepest = 4096;
 }  // namespace
 
-ReplicaFiles::ReplicaFiles(std::string replicaPath, Read read, SyncStore &store)
-    : replicaPath_(std::move(replicaPath)), read_(std::move(read)), store_(store) {}
+ReplicaFiles::ReplicaFiles(std::string replicaPath, Read read, SyncStore &store, SyncScope scope)
+    : replicaPath_(std::move(replicaPath)), read_(std::move(read)), store_(store), scope_(std::move(scope)) {}
+
+bool ReplicaFiles::isInScope(const ItemRecord &item, ItemQueries &queries) const {
+  const bool isShared = (item.flags & kOthersFlag) != 0;
+  if (isShared != scope_.isShared()) return false;
+  if (!isShared) return true;
+  const std::vector<std::string> names = queries.namesTo(item);
+  return !names.empty() && names.front() == scope_.container;
+}
+
+bool ReplicaFiles::isInScope(const ItemRecord &item) const {
+  const bool isShared = (item.flags & kOthersFlag) != 0;
+  bool isIn = isShared == scope_.isShared();
+  if (isIn && isShared) (void)read_([&](ItemQueries &queries) { isIn = isInScope(item, queries); });
+  return isIn;
+}
 
 std::optional<ItemRecord> ReplicaFiles::item(ItemNumber item) const {
   std::optional<ItemRecord> found;
-  (void)read_([&](ItemQueries &queries) { found = queries.byID(item); });
-  if (found && found->parent == kLimboFolder) found.reset();
+  (void)read_([&](ItemQueries &queries) {
+    found = queries.byID(item);
+    const bool isHere = found && found->parent != kLimboFolder && isInScope(*found, queries);
+    if (!isHere) found.reset();
+  });
   return found;
 }
 
@@ -36,6 +54,15 @@ std::string ReplicaFiles::pathOf(ItemNumber item) const {
   std::string path;
   (void)read_([&](ItemQueries &queries) {
     if (const auto record = queries.byID(item)) path = queries.pathBelowReplica(*record);
+  });
+  return path;
+}
+
+std::string ReplicaFiles::pathInScope(ItemNumber item) const {
+  std::string path;
+  (void)read_([&](ItemQueries &queries) {
+    const auto record = queries.byID(item);
+    if (record && isInScope(*record, queries)) path = queries.pathBelowReplica(*record);
   });
   return path;
 }
@@ -78,12 +105,14 @@ std::optional<std::string> ReplicaFiles::folderPath(const std::string &parentRec
   std::string below;
   std::string record = parentRecord;
   for (int depth = 0; depth < kDeepest; ++depth) {
-    if (const auto container = ContainerOfRecord(record))
+    const auto container = ContainerOfRecord(record);
+    if (container && !scope_.hasContainer(*container)) return std::nullopt;
+    if (container)
       return *container + "/" + QVDocumentsFolderName(*container) + (below.empty() ? "" : "/") + below;
     const auto row = store_.byRecord(record);
     if (!row || row->kind != NSFileProviderItemKind::folder) return std::nullopt;
     if (row->item != 0) {
-      const std::string path = pathOf(row->item);
+      const std::string path = pathInScope(row->item);
       if (!path.empty()) return below.empty() ? path : path + "/" + below;
     }
     below = below.empty() ? row->name : row->name + "/" + below;
@@ -94,7 +123,7 @@ std::optional<std::string> ReplicaFiles::folderPath(const std::string &parentRec
 
 std::optional<std::string> ReplicaFiles::path(const SyncRow &row) const {
   if (row.item != 0) {
-    std::string known = pathOf(row.item);
+    std::string known = pathInScope(row.item);
     if (!known.empty()) return known;
   }
   const auto folder = folderPath(row.parent);

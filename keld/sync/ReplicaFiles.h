@@ -6,6 +6,7 @@
 
 #include "keld/FolderReading.h"
 #include "keld/ItemQueries.h"
+#include "keld/sync/SyncScope.h"
 #include "keld/sync/SyncStore.h"
 
 namespace droxa::keld {
@@ -21,16 +22,20 @@ struct FileLocation {
 };
 
 // Finds files and folders of the replica for those who aren't the keeper: by item, and by record where the
-// keeper hasn't seen the file yet. No link is ever followed. Thread contract: any thread.
+// keeper hasn't seen the file yet. Where records stand for items, an item of another scope is as good as
+// gone. No link is ever followed. Thread contract: any thread.
 class ReplicaFiles {
  public:
   using Read = std::function<NSError(const std::function<void(ItemQueries &queries)> &work)>;
-  ReplicaFiles(std::string replicaPath, Read read, SyncStore &store);
+  ReplicaFiles(std::string replicaPath, Read read, SyncStore &store, SyncScope scope = {});
 
+  // nullopt when it is gone, or has left the scope.
   std::optional<ItemRecord> item(ItemNumber item) const;
+  bool isInScope(const ItemRecord &item) const;
   // What the item table has at a path below the replica; false when there is nothing.
   bool itemAtPath(const std::string &path, ItemRecord *item) const;
-  // nullopt when the item is gone, or its folder can't be opened (`error` says why; may be null).
+  // Of whatever scope. nullopt when the item is gone, or its folder can't be opened (`error` says why; may be
+  // null).
   std::optional<FileLocation> locate(ItemNumber item, NSError *error) const;
   // The path below the replica of the folder that stands for a parent record; nullopt when nothing does yet.
   std::optional<std::string> folderPath(const std::string &parentRecord) const;
@@ -46,9 +51,13 @@ class ReplicaFiles {
   std::string absolute(const std::string &path) const { return replicaPath_ + "/" + path; }
 
  private:
+  bool isInScope(const ItemRecord &item, ItemQueries &queries) const;
+  std::string pathInScope(ItemNumber item) const;
+
   const std::string replicaPath_;
   const Read read_;
   SyncStore &store_;
+  const SyncScope scope_;
 };
 
 // The facts that decide whether a file is still the one that was synced.

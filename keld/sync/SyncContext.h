@@ -6,6 +6,7 @@
 #include "keld/contents/ContentsStorage.h"
 #include "keld/sync/ItemStates.h"
 #include "keld/sync/ReplicaFiles.h"
+#include "keld/sync/SyncScope.h"
 #include "keld/sync/SyncStore.h"
 #include "platform/cloudkit/CKCloud.h"
 
@@ -19,6 +20,7 @@ struct SyncContext {
   ItemStates &states;
   CKCloud &cloud;
   std::string device;  // this one's name
+  SyncScope scope;
 };
 
 }  // namespace droxa::keld

@@ -33,7 +33,7 @@ void SyncEngine::run() {
   } catch (const SqlError &error) {
     os_log_fault(qvc_default_log(), "[CRIT] the sync's database failed: %s", error.what());
   }
-  conflicts_.placeRescuedFiles();
+  if (!scope().isShared()) conflicts_.placeRescuedFiles();
   for (;;) {
     {
       const Lock lock(mutex_);
@@ -101,6 +101,7 @@ void SyncEngine::send() {
     uploadRate_.add(uploader_.totals().bytes - before);
   }
   if (!sent.newerRecords.empty()) applier_.applyRecords(sent.newerRecords, call(kCallTimeout));
+  if (sent.needsFetch) cloudChanged();
   if (sent.cloudProblem)
     noteCloudProblem(sending, sent.cloudProblem);
   else if (sent.sent > 0 || store_.countQueued() == 0)
@@ -147,7 +148,8 @@ bool SyncEngine::prepareCloud() {
   }
   if (isCloudReady_) return true;
   if (known.empty()) store_.setText(kSyncCloudIdentifier, text);
-  const NSError problem = cloud_->saveZone(DriveZone(), call(kCallTimeout));
+  // Another's zone isn't this account's to make.
+  const NSError problem = scope().isShared() ? NSError() : cloud_->saveZone(scope().zone, call(kCallTimeout));
   if (problem) {
     noteCloudProblem(fetching, problem);
     return false;
@@ -155,10 +157,9 @@ bool SyncEngine::prepareCloud() {
   if (!subscription_) {
     NSError error;
     subscription_ = cloud_->subscribe(
-        [this](const std::vector<CKRecordZoneID> &) {
-          const Lock lock(mutex_);
-          hasCloudNews_ = true;
-          wake_.notify_all();
+        [this](const std::vector<CKRecordZoneID> &zones) {
+          const bool concerns = std::find(zones.begin(), zones.end(), scope().zone) != zones.end();
+          if (!scope().isShared() || zones.empty() || concerns) cloudChanged();
         },
         &error);
     if (!subscription_) os_log_error(qvc_default_log(), "[ERROR] the cloud's changes aren't told: %@", error);
@@ -171,6 +172,7 @@ void SyncEngine::fetch() {
   nextPoll_ = std::chrono::steady_clock::now() + options_.pollInterval;
   const NSError error = applier_.fetchAndApply(call(kCallTimeout));
   noteCloudProblem(fetching, error);
+  if (!error && applier_.isZoneGone() && zoneGone_) zoneGone_();
   // What stood in the way of a change is gone before long, as a rule: the keeper was about to look.
   const bool isIncomplete = !error && store_.countToFetch() > 0;
   againPause_ = isIncomplete ? std::clamp(againPause_ * 2, kFirstAgain, kLongestAgain) : kNoPause;

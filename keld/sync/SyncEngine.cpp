@@ -23,11 +23,10 @@ namespace {
 constexpr std::chrono::seconds kLongestEnd{5};
 constexpr char kItemDatabase[] = "itemDatabase";
 constexpr char kReplica[] = "replica";
-constexpr char kIdentityName[] = "identity";
 constexpr char kEndedWell[] = "endedWell";
 
-std::unique_ptr<ContentsStorage> openStorage(const std::string &replicaPath,
-                                             const ContentsSettings &settings) {
+std::shared_ptr<const ContentsStorage> openStorage(const std::string &replicaPath,
+                                                   const ContentsSettings &settings) {
   int error = 0;
   auto storage = ContentsStorage::open(replicaPath, settings, &error);
   if (!storage)
@@ -40,14 +39,26 @@ std::unique_ptr<ContentsStorage> openStorage(const std::string &replicaPath,
 SyncEngine::SyncEngine(const std::string &replicaPath, const std::string &databasePath,
                        std::shared_ptr<CKCloud> cloud, std::function<Keeper *()> keeper,
                        ReplicaFiles::Read read, SyncOptions options)
+    : SyncEngine(replicaPath, databasePath, std::move(cloud), std::move(keeper), std::move(read), options,
+                 SyncScope(), openStorage(replicaPath, options.contents)) {}
+
+SyncEngine::SyncEngine(const SyncEngine &drive, SyncScope scope, const std::string &databasePath,
+                       std::shared_ptr<CKCloud> cloud, ReplicaFiles::Read read)
+    : SyncEngine(drive.files_.replicaPath(), databasePath, std::move(cloud), drive.keeper_, std::move(read),
+                 drive.options_, std::move(scope), drive.storage_) {}
+
+SyncEngine::SyncEngine(const std::string &replicaPath, const std::string &databasePath,
+                       std::shared_ptr<CKCloud> cloud, std::function<Keeper *()> keeper,
+                       ReplicaFiles::Read read, SyncOptions options, SyncScope scope,
+                       std::shared_ptr<const ContentsStorage> storage)
     : cloud_(std::move(cloud)),
       options_(std::move(options)),
       keeper_(std::move(keeper)),
       store_(databasePath),
-      files_(replicaPath, read, store_),
-      storage_(openStorage(replicaPath, options_.contents)),
+      files_(replicaPath, read, store_, scope),
+      storage_(std::move(storage)),
       states_(keeper_),
-      context_{store_, files_, *storage_, states_, *cloud_, cloud_->deviceName()},
+      context_{store_, files_, *storage_, states_, *cloud_, cloud_->deviceName(), std::move(scope)},
       assets_(std::make_shared<AssetUploads>(cloud_, options_.downloads.stallTimeout,
                                              [this](ItemNumber item) {
                                                store_.retryNow(item);
@@ -76,6 +87,7 @@ SyncEngine::SyncEngine(const std::string &replicaPath, const std::string &databa
   uploader_.setNeedsContents(
       [this](const ItemRecord &item) { downloads_->fetchInBackground(item.id, item.facts.size); });
   uploader_.setWantsThumbnail([this](const std::string &name) { return thumbnails_->isFor(name); });
+  uploader_.setBringBack([this](const SyncRow &row) { applier_.bringBack(row); });
   uploader_.setProblemOfNewer([this](ItemNumber item) { return downloads_->lastError(item); });
 }
 
@@ -89,8 +101,11 @@ void SyncEngine::start(const std::string &itemDatabase) {
   // What was examined last may not have reached the item table's flags before the process was killed.
   if (store_.number(kEndedWell) == 0) store_.setNumber("examinedRank", 0);
   store_.setNumber(kEndedWell, 0);
-  storage_->recover();
-  RemoveOldMarks(files_.replicaPath());
+  // The storage and the marks are the whole replica's; the drive's engine starts first.
+  if (!scope().isShared()) {
+    storage_->recover();
+    RemoveOldMarks(files_.replicaPath());
+  }
   nextPoll_ = std::chrono::steady_clock::now();
   thread_ = std::thread([this] { run(); });
 }
@@ -130,10 +145,14 @@ void SyncEngine::stop() {
   answerFetches(error);
 }
 
-// Another folder in the replica's place has none of its documents, and nobody has deleted them. The folder is
-// told by a name that it was given once.
+std::string SyncEngine::identityFolder() const {
+  return files_.absolute(scope().isShared() ? scope().container : kContentsStorageName);
+}
+
+// Another folder in the replica's place, or in a shared container's, has none of its documents, and nobody
+// has deleted them. The folder is told by a name that it was given once.
 void SyncEngine::checkReplica() {
-  const std::string path = files_.replicaPath() + "/" + kContentsStorageName;
+  const std::string path = identityFolder();
   struct stat status = {};
   if (::stat(path.c_str(), &status) == 0) storageInode_ = status.st_ino;
   std::string found;
@@ -144,7 +163,7 @@ void SyncEngine::checkReplica() {
     os_log_error(qvc_default_log(),
                  "[ERROR] %s isn't the folder that it was: what is missing in it isn't deleted in the cloud "
                  "until somebody says so",
-                 files_.replicaPath());
+                 path);
     examiner_.holdDeletions();
   }
   if (known.empty()) known = found.empty() ? NewRecordName() : found;
@@ -152,10 +171,19 @@ void SyncEngine::checkReplica() {
   store_.setText(kReplica, known);
 }
 
+// The shared container is what it is now: somebody was asked about what is missing.
+void SyncEngine::adoptContainer() {
+  const std::string path = identityFolder();
+  ::mkdir(path.c_str(), 0700);
+  ::mkdir((path + "/" + QVDocumentsFolderName(scope().container)).c_str(), 0700);
+  struct stat status = {};
+  if (::stat(path.c_str(), &status) == 0) storageInode_ = status.st_ino;
+  std::ofstream(path + "/" + kIdentityName, std::ios::trunc) << store_.text(kReplica) << "\n";
+}
+
 bool SyncEngine::isReplicaItself() const {
   struct stat status = {};
-  const std::string path = files_.replicaPath() + "/" + kContentsStorageName;
-  return ::stat(path.c_str(), &status) == 0 && status.st_ino == storageInode_;
+  return ::stat(identityFolder().c_str(), &status) == 0 && status.st_ino == storageInode_;
 }
 
 // The keeper, which still runs, does things in order: when it has looked, all flags before are in its
@@ -301,6 +329,7 @@ void SyncEngine::answerDeletions(bool carryOut) {
       const Lock lock(mutex_);
       hasCloudNews_ = true;
     }
+    if (scope().isShared()) adoptContainer();
     examiner_.allowDeletions();
   });
 }

@@ -23,6 +23,9 @@
 
 namespace droxa::keld {
 
+// The file that tells a replica's folder, or a shared container's, from another one in its place.
+inline constexpr char kIdentityName[] = "identity";
+
 struct SyncOptions {
   // The cloud that the drive is in; tests give one of their own. Null: EmbeddedCloud in `cloudFolder`.
   std::shared_ptr<CKCloud> cloud;
@@ -36,14 +39,17 @@ struct SyncOptions {
   std::chrono::milliseconds pollInterval = std::chrono::seconds(30);  // in case a change wasn't told
 };
 
-// Keeps the replica and the cloud alike: one thread that examines what changed here, applies what changed
-// there, and sends; downloads run beside it. It runs while somebody is signed in.
-// Thread contract: any thread.
+// Keeps the replica and the cloud alike, in one scope: one thread that examines what changed here, applies
+// what changed there, and sends; downloads run beside it. It runs while somebody is signed in. Thread
+// contract: any thread.
 class SyncEngine {
  public:
   // Throws SqlError, std::system_error; `read` answers from the item database.
   SyncEngine(const std::string &replicaPath, const std::string &databasePath, std::shared_ptr<CKCloud> cloud,
              std::function<Keeper *()> keeper, ReplicaFiles::Read read, SyncOptions options);
+  // Of another scope, in the same replica, whose storage is that of the drive's engine.
+  SyncEngine(const SyncEngine &drive, SyncScope scope, const std::string &databasePath,
+             std::shared_ptr<CKCloud> cloud, ReplicaFiles::Read read);
   ~SyncEngine();
 
   // `itemDatabase` identifies the item database: with another one all items are found anew.
@@ -51,7 +57,10 @@ class SyncEngine {
   void stop();
 
   void itemsChanged();  // there is something new in the feed
-  void cloudChanged();  // this daemon itself has changed something there
+  void cloudChanged();  // there may be something new in the cloud
+  // Called, on the sync's thread, when the zone is found to be gone and nothing of it is here any more. May
+  // come again. Set before start().
+  void setZoneGoneHandler(std::function<void()> handler) { zoneGone_ = std::move(handler); }
   // Fetches the cloud's changes and applies them; `done` (on the pool) tells how that went, once.
   void fetchNow(std::function<void(const NSError &error)> done);
   void setSignedIn(bool isSignedIn);
@@ -59,6 +68,7 @@ class SyncEngine {
   SyncStore &store() { return store_; }
   ReplicaFiles &files() { return files_; }
   const ContentsStorage &storage() const { return *storage_; }
+  const SyncScope &scope() const { return context_.scope; }
   ItemStates &states() { return states_; }
   const std::shared_ptr<Downloads> &downloads() const { return downloads_; }
   AssetUploads &assetUploads() { return *assets_; }
@@ -95,7 +105,12 @@ class SyncEngine {
     std::shared_ptr<const CKCancellation> cancellation;
   };
 
+  SyncEngine(const std::string &replicaPath, const std::string &databasePath, std::shared_ptr<CKCloud> cloud,
+             std::function<Keeper *()> keeper, ReplicaFiles::Read read, SyncOptions options, SyncScope scope,
+             std::shared_ptr<const ContentsStorage> storage);
   void run();
+  std::string identityFolder() const;
+  void adoptContainer();
   bool prepareCloud();
   ContentsResult keepBoth(const FileLocation &location, PreparedFile &prepared);
   bool isSameCloud();
@@ -122,7 +137,7 @@ class SyncEngine {
   const std::function<Keeper *()> keeper_;
   SyncStore store_;
   ReplicaFiles files_;
-  std::unique_ptr<ContentsStorage> storage_;
+  const std::shared_ptr<const ContentsStorage> storage_;
   ItemStates states_;
   SyncContext context_;
   std::shared_ptr<AssetUploads> assets_;
@@ -132,7 +147,8 @@ class SyncEngine {
   Uploader uploader_;
   CloudApplier applier_;
   const std::shared_ptr<ThumbnailQueue> thumbnails_;
-  std::uint64_t storageInode_ = 0;  // of the replica's own folder; constant after start()
+  std::function<void()> zoneGone_;
+  std::uint64_t storageInode_ = 0;  // of the folder that has the identity; the sync's thread's after start()
   const std::shared_ptr<CKCancellation> stopping_ = std::make_shared<CKCancellation>();
   std::unique_ptr<CKSubscription> subscription_;
 

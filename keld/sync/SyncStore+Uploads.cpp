@@ -14,7 +14,7 @@ constexpr std::int64_t kLongestDelay = 3'600'000;  // milliseconds
 #define STANDS "(until = 0 OR (until > ?1 AND until <= ?2))"
 
 #define UPLOAD_COLUMNS \
-  "sequence, item, generation, attempts, deletion, held, errorDomain, errorCode, errorText"
+  "sequence, item, generation, attempts, deletion, held, errorDomain, errorCode, errorText, refused"
 
 }  // namespace
 
@@ -26,6 +26,7 @@ QueuedUpload SyncStore::readQueued(const SqlStatement &row) {
   upload.attempts = row.integer(3);
   upload.isDeletion = row.integer(4) != 0;
   upload.isHeld = row.integer(5) != 0;
+  upload.isRefused = row.integer(9) != 0;
   const std::string domain(row.bytes(6));
   const std::string text(row.bytes(8));
   if (!domain.empty()) upload.error = NSError(domain, row.integer(7), {{NSLocalizedDescriptionKey, text}});
@@ -45,7 +46,8 @@ void SyncStore::enqueue(ItemNumber item, bool isDeletion, bool isHeld, std::int6
       "INSERT INTO uploads(item, generation, attempts, retry, deletion, held, errorDomain, errorCode, "
       "errorText)"
       " VALUES (?1, 1, 0, ?4, ?2, ?3, '', 0, '') ON CONFLICT(item) DO UPDATE SET generation = generation + 1,"
-      " attempts = 0, retry = ?4, deletion = ?2, held = ?3, errorDomain = '', errorCode = 0, errorText = ''")
+      " attempts = 0, retry = ?4, deletion = ?2, held = ?3, errorDomain = '', errorCode = 0, errorText = '',"
+      " refused = 0")
       .bind(1, item)
       .bind(2, static_cast<std::int64_t>(isDeletion))
       .bind(3, static_cast<std::int64_t>(isHeld))
@@ -64,9 +66,10 @@ std::optional<QueuedUpload> SyncStore::queued(ItemNumber item) {
 
 std::vector<QueuedUpload> SyncStore::due(std::int64_t now, std::uint64_t limit) {
   const RecursiveLock lock(mutex_);
-  SqlStatement &asked = statement("SELECT " UPLOAD_COLUMNS
-                                  " FROM uploads WHERE held = 0 AND (retry <= ?1 OR retry > ?2)"
-                                  " ORDER BY sequence LIMIT ?3");
+  SqlStatement &asked =
+      statement("SELECT " UPLOAD_COLUMNS
+                " FROM uploads WHERE held = 0 AND refused = 0 AND (retry <= ?1 OR retry > ?2)"
+                " ORDER BY sequence LIMIT ?3");
   // Nothing is put off for so long: the clock was put back.
   asked.bind(1, now).bind(2, now + kLongestDelay).bind(3, limit);
   return queuedOf(asked);
@@ -89,7 +92,8 @@ std::vector<QueuedUpload> SyncStore::held(std::uint64_t limit) {
 
 std::optional<std::int64_t> SyncStore::nextRetry() {
   const RecursiveLock lock(mutex_);
-  SqlStatement &asked = statement("SELECT min(retry) FROM uploads WHERE retry <> 0 AND held = 0");
+  SqlStatement &asked =
+      statement("SELECT min(retry) FROM uploads WHERE retry <> 0 AND held = 0 AND refused = 0");
   std::optional<std::int64_t> next;
   if (asked.step() && asked.integer(0) != 0) next = asked.integer(0);
   asked.reset();
@@ -121,6 +125,20 @@ void SyncStore::uploadFailed(const QueuedUpload &upload, const NSError &error, s
       .bind(5, upload.item)
       .bind(6, upload.generation)
       .run();
+}
+
+void SyncStore::uploadRefused(const QueuedUpload &upload, const NSError &error) {
+  const RecursiveLock lock(mutex_);
+  uploadFailed(upload, error, 0);
+  statement("UPDATE uploads SET refused = 1 WHERE item = ? AND generation = ?")
+      .bind(1, upload.item)
+      .bind(2, upload.generation)
+      .run();
+}
+
+void SyncStore::retryRefused() {
+  const RecursiveLock lock(mutex_);
+  statement("UPDATE uploads SET refused = 0, retry = 0 WHERE refused = 1").run();
 }
 
 void SyncStore::retryNow(ItemNumber item) {

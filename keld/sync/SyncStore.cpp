@@ -110,8 +110,19 @@ CREATE TABLE thumbnails(
 ) WITHOUT ROWID;
 )sql";
 
+// What a zone of another account needs: what may be done in it, what hangs at its top, and what was refused
+// for good.
+constexpr char kOthersZones[] = R"sql(
+CREATE TABLE accesses(share TEXT PRIMARY KEY, root TEXT NOT NULL, writable INTEGER NOT NULL) WITHOUT ROWID;
+CREATE INDEX accesses_root ON accesses(root);
+CREATE TABLE tops(record TEXT PRIMARY KEY, parent TEXT NOT NULL) WITHOUT ROWID;
+CREATE INDEX tops_parent ON tops(parent);
+ALTER TABLE uploads ADD COLUMN refused INTEGER NOT NULL DEFAULT 0;
+)sql";
+
 // Each step leads from the version of its place to the next; version 0 is an empty database.
-constexpr const char *kSteps[] = {kTables, kUnfinished, kMeant, kMeantUntil, kShares, kThumbnails};
+constexpr const char *kSteps[] = {kTables, kUnfinished, kMeant,      kMeantUntil,
+                                  kShares, kThumbnails, kOthersZones};
 
 }  // namespace
 

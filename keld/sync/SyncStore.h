@@ -66,14 +66,22 @@ struct QueuedUpload {
   std::int64_t generation = 0;  // goes up whenever the item changes again
   std::int64_t attempts = 0;
   bool isDeletion = false;
-  bool isHeld = false;  // a deletion that waits for a person's word
-  NSError error;        // of the last attempt
+  bool isHeld = false;     // a deletion that waits for a person's word
+  bool isRefused = false;  // for good, as things stand: not tried again until something changes
+  NSError error;           // of the last attempt
 };
 
 // A record that is about to be given a file or folder of its own here, and where that is to be.
 struct UnfinishedRecord {
   std::string record, parent, name;
   NSFileProviderItemKind kind = NSFileProviderItemKind::document;
+};
+
+// What this account may do in one share of another's zone.
+struct ShareAccess {
+  std::string share, root;  // their records
+  bool isWritable = false;
+  bool operator==(const ShareAccess &) const = default;
 };
 
 // A share that this account sees: the zone that it is in, and the record that it shares with all below it.
@@ -167,6 +175,9 @@ class SyncStore {
   void dropQueued(ItemNumber item);
   // Not before that time again. A nil error: it wasn't tried, something else comes first.
   void uploadFailed(const QueuedUpload &upload, const NSError &error, std::int64_t retryMilliseconds);
+  // Not before the item changes again, or retryRefused().
+  void uploadRefused(const QueuedUpload &upload, const NSError &error);
+  void retryRefused();
   void retryNow(ItemNumber item);
   void retryAllNow();
   std::uint64_t countQueued();
@@ -195,6 +206,19 @@ class SyncStore {
   void dropStaleThumbnails();                        // of contents that a record doesn't have any more
   std::uint64_t countThumbnails();
   std::uint64_t thumbnailNews();  // goes up with every want of this process
+
+  // Of a shared zone alone: the shares, and the records that hang at its top because their own parents aren't
+  // to be seen by this account; these are asked for again when that changes.
+  std::optional<ShareAccess> accessByShare(const std::string &share);
+  std::optional<ShareAccess> accessByRoot(const std::string &root);
+  void putAccess(const ShareAccess &access);
+  void dropAccess(const std::string &share);
+  void forgetAccesses();  // all
+  void setTop(const std::string &record, const std::string &parent);
+  void dropTop(const std::string &record);
+  bool isTop(const std::string &record);
+  void fetchTopsOf(const std::string &parent);
+  void hangOrphans();  // whose parents aren't among the rows
 
   // Pins, by item.
   void setPinned(ItemNumber item, bool isPinned);

@@ -72,6 +72,7 @@ Uploader::Round Uploader::sendDue(const CKCallContext &call) {
   Round round;
   inlineBytes_ = 0;
   cloudProblem_ = NSError();
+  needsFetch_ = false;
   const auto due = context_.store.due(nowMilliseconds(), kRecordsAtATime);
   std::vector<Plan> saves, removals;
   for (const QueuedUpload &entry : due) {
@@ -85,6 +86,7 @@ Uploader::Round Uploader::sendDue(const CKCallContext &call) {
     if (cloudProblem_ || inlineBytes_ >= kInlineBytes || call.isCancelled()) break;
   }
   round.cloudProblem = cloudProblem_;
+  round.needsFetch = needsFetch_;
   context_.states.flush();
   if (call.isCancelled() || (saves.empty() && removals.empty())) {
     round.moreIsDue = !cloudProblem_ && due.size() == kRecordsAtATime;
@@ -92,13 +94,13 @@ Uploader::Round Uploader::sendDue(const CKCallContext &call) {
   }
   CKModifyRequest request;
   request.isAtomic = false;
-  for (const Plan &plan : saves) {
-    CKRecord record = plan.hasContent ? MakeRecordWithContent(plan.document) : MakeRecord(plan.document);
-    request.recordsToSave.push_back(std::move(record));
-  }
-  for (const Plan &plan : removals)
+  for (const Plan &plan : saves) request.recordsToSave.push_back(recordOf(plan));
+  for (const Plan &plan : removals) {
+    const std::string tag = plan.row.tag.empty() ? kUnknownTag : plan.row.tag;
+    const bool leaves = !plan.leaves.empty();
     request.recordsToDelete.push_back(
-        {RecordID(plan.row.record), plan.row.tag.empty() ? kUnknownTag : plan.row.tag});
+        {context_.scope.recordID(leaves ? plan.leaves : plan.row.record), leaves ? "" : tag});
+  }
   noteSent(saves);
   CKCallContext own = call;
   own.deadline = CKCallContext::Clock::now() + kTransferTimeout;
@@ -164,13 +166,19 @@ Uploader::Prepared Uploader::prepareDeletion(const std::optional<ItemRecord> &it
     context_.store.uploaded(plan->entry);
     return Prepared::nothing;
   }
-  const auto location = item ? context_.files.locate(item->id, nullptr) : std::nullopt;
-  if (location && item->facts.kind == NSFileProviderItemKind::document &&
+  if (context_.scope.isShared())
+    if (const auto prepared = prepareSharedDeletion(plan)) return *prepared;
+  // It may have left for another zone.
+  const auto location = context_.files.locate(plan->entry.item, nullptr);
+  if (location && location->item.facts.kind == NSFileProviderItemKind::document &&
       context_.storage.classify(location->folder.get(), location->name).kind == DocumentClass::dataless) {
     // It only leaves what is synced, and without the cloud's nobody would have its contents.
-    if (needsContents_) needsContents_(*item);
+    if (needsContents_) needsContents_(location->item);
     return laterWith(plan, NSError());
   }
+  // A folder leaves for another zone after what is in it, which may wait for its contents.
+  if (location && !item && plan->leaves.empty() && hasChildrenThatLeave(plan->row))
+    return laterWith(plan, NSError());
   assets_.forget(plan->entry.item);
   plan->isDeletion = true;
   return Prepared::remove;
@@ -227,6 +235,8 @@ Uploader::Prepared Uploader::prepareSave(const ItemRecord &item, Plan *plan, con
     row.kind = item.facts.kind;
     context_.store.put(row);
   }
+  if (context_.scope.isShared())
+    if (const auto prepared = prepareShared(*location, parent, plan)) return *prepared;
   DocumentRecord &document = plan->document;
   document.record = row.record;
   // Names and places of a newer version were followed when it came; only its contents are still on their way.
@@ -236,7 +246,7 @@ Uploader::Prepared Uploader::prepareSave(const ItemRecord &item, Plan *plan, con
   document.kind = location->item.facts.kind;
   document.content = row.content;
   document.content.mode = location->item.facts.mode & 07777;
-  document.metadata = changedMetadata(*location, row);
+  if (!context_.scope.isShared()) document.metadata = changedMetadata(*location, row);
   const bool isTrash = parent == ContainerRecord(QVUbiquitousTrashContainerID);
   if (isTrash && (row.tag.empty() || row.parent != parent))
     document.putBack = PutBackNotes(context_.files, context_.store).read(document.name, row);
@@ -414,6 +424,8 @@ void Uploader::saved(const Plan &plan, const CKRecord &record) {
   }
   if (plan.changesMarker) markFile(plan, &row);
   context_.store.put(row);
+  // What is in a new folder waited for it.
+  if (context_.scope.isShared() && plan.row.tag.empty()) context_.store.retryRefused();
   context_.store.uploaded(plan.entry);
   const bool hasFile = row.kind == NSFileProviderItemKind::document;
   context_.states.show({row.item, row.isDataless, true, row.local, hasFile});
@@ -465,12 +477,13 @@ void Uploader::removed(const Plan &plan) {
 
 void Uploader::saveFailed(const Plan &plan, const NSError &error, Round *round) {
   if (const auto server = CKErrorServerRecord(error)) {
-    CKRecord sent = plan.hasContent ? MakeRecordWithContent(plan.document) : MakeRecord(plan.document);
-    if (CKServerRecordIsOwnSave(sent, *server, context_.cloud.deviceName())) return saved(plan, *server);
+    if (CKServerRecordIsOwnSave(recordOf(plan), *server, context_.cloud.deviceName()))
+      return saved(plan, *server);
     round->newerRecords.push_back(*server);
     context_.store.uploadFailed(plan.entry, NSError(), nowMilliseconds() + kSoon);
     return;
   }
+  if (context_.scope.isShared() && saveRefused(plan, error, round)) return;
   if (CKErrorIs(error, CKErrorCode::unknownItem)) {
     // Deleted in the cloud, and changed here: what was changed here lives.
     SyncRow row = plan.row;
@@ -495,6 +508,12 @@ void Uploader::removeFailed(const Plan &plan, const NSError &error, Round *round
   if (CKErrorIs(error, CKErrorCode::unknownItem)) return removed(plan);
   if (const auto server = CKErrorServerRecord(error)) {
     round->newerRecords.push_back(*server);
+    return;
+  }
+  if (context_.scope.isShared() && CKErrorIs(error, CKErrorCode::zoneNotFound)) return removed(plan);
+  if (context_.scope.isShared() && CKErrorIs(error, CKErrorCode::permissionFailure)) {
+    undoDeletion(plan);
+    round->needsFetch = true;
     return;
   }
   failed(plan, error);

@@ -24,6 +24,7 @@ class Uploader {
     bool moreIsDue = false;
     std::vector<CKRecord> newerRecords;  // that the cloud has instead of what was sent: to be applied first
     NSError cloudProblem;                // the cloud couldn't be reached at all
+    bool needsFetch = false;             // what was undone here is to be fetched, or the feed knows more
   };
 
   Uploader(const SyncContext &context, AssetUploads &assets, ConflictCopies &conflicts,
@@ -42,6 +43,8 @@ class Uploader {
   void setWantsThumbnail(std::function<bool(const std::string &name)> ask) {
     wantsThumbnail_ = std::move(ask);
   }
+  // Has the cloud's state of what was deleted here come back.
+  void setBringBack(std::function<void(const SyncRow &row)> handler) { bringBack_ = std::move(handler); }
 
   // Sends a batch of what is due.
   Round sendDue(const CKCallContext &call);
@@ -63,6 +66,7 @@ class Uploader {
     bool isDataless = false;
     bool changesMarker = false;
     bool changesTarget = false;
+    std::string leaves;  // the share whose root this is: it is left, and nothing of the owner's is deleted
   };
   enum class Prepared { save, remove, later, nothing };
 
@@ -84,15 +88,34 @@ class Uploader {
   void failed(const Plan &plan, const NSError &error);
   Prepared laterWith(Plan *plan, const NSError &error);
 
+  // What is particular to another account's zone (Uploader+Shared.cpp). The first two answer nothing where
+  // the change goes the way of all others.
+  std::optional<Prepared> prepareShared(const FileLocation &location, const std::string &parent, Plan *plan);
+  std::optional<Prepared> prepareSharedDeletion(Plan *plan);
+  std::optional<Prepared> keepMetadataHere(const FileLocation &location, Plan *plan);
+  bool hasDatalessElsewhere(const SyncRow &row);
+  bool hasChildrenThatLeave(const SyncRow &row);
+  Prepared refuse(const Plan &plan, const NSError &error);
+  Prepared undoChange(const FileLocation &location, const Plan &plan, const std::string &why);
+  Prepared undoDeletion(const Plan &plan);
+  bool putBack(const FileLocation &location, const SyncRow &row);
+  bool isChangedInside(const FileLocation &location, const SyncRow &row) const;
+  NSError readOnlyError(const FileLocation &location) const;
+  // Whether it was answered; `round` is told what has to follow.
+  bool saveRefused(const Plan &plan, const NSError &error, Round *round);
+  CKRecord recordOf(const Plan &plan) const;
+
   const SyncContext &context_;
   AssetUploads &assets_;
   std::function<void(const ItemRecord &)> needsContents_;
   std::function<NSError(ItemNumber)> problemOfNewer_;
   std::function<bool(const std::string &)> wantsThumbnail_;
+  std::function<void(const SyncRow &)> bringBack_;
   ConflictCopies &conflicts_;
   LocalExaminer &examiner_;
   std::uint64_t inlineBytes_ = 0;  // sent by this round on this thread
   NSError cloudProblem_;
+  bool needsFetch_ = false;
   mutable Mutex mutex_;
   Totals totals_ GUARDED_BY(mutex_);
 };

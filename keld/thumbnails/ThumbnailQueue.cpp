@@ -90,7 +90,8 @@ std::vector<CKRecord> ThumbnailQueue::saveMade(const CKCallContext &call) {
       forget(made.wanted);
       continue;
     }
-    request.recordsToSave.push_back(MakeRecordWithThumbnail(row->record, row->tag, made.asset));
+    request.recordsToSave.push_back(
+        MakeRecordWithThumbnail(context_.scope.recordID(row->record), row->tag, made.asset));
     sent.push_back(std::move(made));
   }
   if (sent.empty()) return newer;

@@ -50,6 +50,13 @@ int CKAsset::descriptor() const {
   return descriptor_ ? *descriptor_ : -1;
 }
 
+NSURL CKAsset::fileURL() const {
+  if (kind_ == Kind::path) return NSURL::fileURLWithPath(path_);
+  if (kind_ == Kind::descriptor)
+    return NSURL::fileURLWithPath("/proc/self/fd/" + std::to_string(descriptor()));
+  return {};
+}
+
 std::string CKAsset::description() const {
   switch (kind_) {
     case Kind::nil:

@@ -6,6 +6,7 @@
 #include <string>
 
 #include "platform/foundation/NSError.h"
+#include "platform/foundation/NSURL.h"
 
 namespace droxa {
 
@@ -41,6 +42,9 @@ class CKAsset {
   const CKAssetReference &reference() const { return reference_; }  // empty unless isReference()
   const std::string &path() const { return path_; }                 // empty unless made with a path
   int descriptor() const;                                           // -1 unless made with a descriptor
+  // Where this process can read the file; nil unless isFile(). That of a descriptor is good for as long as a
+  // copy of the asset lives.
+  NSURL fileURL() const;
 
   std::string description() const;
   bool operator==(const CKAsset &) const = default;

@@ -21,6 +21,13 @@ enum class CKQualityOfService : std::uint8_t {
   userInteractive
 };
 
+// Whether a call may wait for a better moment (a charger, an unmetered network), where a cloud has such ones.
+enum class CKDiscretionaryNetworkBehavior : std::uint8_t {
+  nonDiscretionary = 0,
+  standard = 1,
+  discretionary = 2
+};
+
 // Says that calls are to stop. Set once, never cleared.
 // Thread contract: every member may be called on any thread, cancel() also inside a callback of the call.
 class CKCancellation {
@@ -57,6 +64,7 @@ struct CKCallContext {
   std::shared_ptr<const CKMovingDeadline> idleDeadline;   // null: none; the earlier of the two counts
   std::shared_ptr<CKCancellation> cancellation;           // null: can't be cancelled
   CKQualityOfService qualityOfService = CKQualityOfService::standard;
+  CKDiscretionaryNetworkBehavior discretionaryNetworkBehavior = CKDiscretionaryNetworkBehavior::standard;
   std::string sourceApplicationBundleIdentifier;  // of the program that asked for it; may be ""
 
   static CKCallContext withTimeout(std::chrono::milliseconds timeout);

@@ -13,7 +13,17 @@ void CKDatabase::addOperation(const std::shared_ptr<CKOperation> &operation) {
                  operation ? "an operation that was added before" : "no operation");
     return;
   }
+  std::string &source = operation->configuration.sourceApplicationBundleIdentifier;
+  if (source.empty()) {
+    const Lock lock(mutex_);
+    source = sourceApplicationBundleIdentifier_;
+  }
   queue_.addOperation(operation);
+}
+
+void CKDatabase::setSourceApplicationBundleIdentifier(const std::string &bundleIdentifier) {
+  const Lock lock(mutex_);
+  sourceApplicationBundleIdentifier_ = bundleIdentifier;
 }
 
 void CKDatabase::cancelAllOperations() {

@@ -1,9 +1,11 @@
 #pragma once
 
 #include <memory>
+#include <string>
 
 #include "platform/cloudkit/CKCloud.h"
 #include "platform/cloudkit/CKOperation.h"
+#include "platform/foundation/ThreadSafety.h"
 
 namespace droxa {
 
@@ -20,6 +22,9 @@ class CKDatabase {
   void cancelAllOperations();
   void waitUntilAllOperationsAreFinished();
 
+  // For whom operations run that don't say so themselves (CKOperationConfiguration).
+  void setSourceApplicationBundleIdentifier(const std::string &bundleIdentifier) EXCLUDES(mutex_);
+
   CKDatabaseScope databaseScope() const { return scope_; }
 
   // For calls that are not retried: zones, the account, subscriptions.
@@ -29,6 +34,8 @@ class CKDatabase {
   const std::shared_ptr<CKCloud> cloud_;
   const CKDatabaseScope scope_;
   NSOperationQueue queue_;
+  Mutex mutex_;
+  std::string sourceApplicationBundleIdentifier_ GUARDED_BY(mutex_);
 };
 
 // Adds the operation, waits until it has finished, and answers its error(). Not on a thread that the

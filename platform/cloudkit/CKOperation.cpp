@@ -151,6 +151,7 @@ CKOperation::Attempt CKOperation::attemptOnce(
   }
   context.cancellation = ckState_->cancellation;
   context.qualityOfService = configuration.qualityOfService;
+  context.discretionaryNetworkBehavior = configuration.discretionaryNetworkBehavior;
   context.sourceApplicationBundleIdentifier = configuration.sourceApplicationBundleIdentifier;
   return attempt(context);
 }

@@ -22,6 +22,7 @@ struct CKOperationGroup {
 // How an operation goes about its calls. Thread contract: a value; set before the operation is added.
 struct CKOperationConfiguration {
   CKQualityOfService qualityOfService = CKQualityOfService::standard;
+  CKDiscretionaryNetworkBehavior discretionaryNetworkBehavior = CKDiscretionaryNetworkBehavior::standard;
   // Of one attempt. An attempt that takes longer counts as networkFailure, and may be retried. The time of an
   // asset's transfer counts from the last bytes that moved.
   std::chrono::milliseconds timeoutIntervalForRequest = std::chrono::seconds(60);
@@ -33,7 +34,7 @@ struct CKOperationConfiguration {
   // operation's deadline isn't begun: the operation ends with the error that it has.
   std::chrono::milliseconds initialRetryDelay = std::chrono::milliseconds(500);
   std::chrono::milliseconds longestRetryDelay = std::chrono::seconds(60);
-  std::string sourceApplicationBundleIdentifier;
+  std::string sourceApplicationBundleIdentifier;  // "": the container's
 };
 
 // Work on a CKDatabase that retries transient errors (CKErrorIsTransient). An operation that was added

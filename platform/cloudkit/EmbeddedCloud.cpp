@@ -17,12 +17,26 @@ EmbeddedCloud::~EmbeddedCloud() = default;
 
 std::shared_ptr<EmbeddedCloud> EmbeddedCloud::open(const std::string &folder, const std::string &accountName,
                                                    const std::string &deviceName, NSError *error) {
+  return openWith(folder, accountName, deviceName, error, [](embedded::Home &home) { return home.create(); });
+}
+
+std::shared_ptr<EmbeddedCloud> EmbeddedCloud::openExisting(const std::string &folder,
+                                                           const std::string &accountName,
+                                                           const std::string &deviceName, NSError *error) {
+  return openWith(folder, accountName, deviceName, error, [](embedded::Home &home) {
+    return home.run(embedded::Home::Access::read, {}, [](const embedded::Connection &) {});
+  });
+}
+
+std::shared_ptr<EmbeddedCloud> EmbeddedCloud::openWith(
+    const std::string &folder, const std::string &accountName, const std::string &deviceName, NSError *error,
+    const std::function<NSError(embedded::Home &home)> &reach) {
   NSError failure;
   if (!CKNameIsValid(accountName) || !CKNameIsValid(deviceName)) {
     failure = CKErrorMake(CKErrorCode::invalidArguments, "An account or device can't be named so");
   }
   const auto home = std::make_shared<embedded::Home>(folder, accountName, deviceName);
-  if (!failure) failure = home->create();
+  if (!failure) failure = reach(*home);
   if (failure) {
     if (error) *error = failure;
     return nullptr;

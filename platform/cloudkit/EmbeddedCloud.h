@@ -2,6 +2,7 @@
 
 #include <chrono>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -9,6 +10,10 @@
 #include "platform/cloudkit/CKCloud.h"
 
 namespace droxa {
+
+namespace embedded {
+class Home;
+}
 
 // A cloud in a folder: one database file and the contents of assets, cut into chunks that versions and
 // documents share. Several processes and devices (objects) use one folder at once. Nothing acknowledged is
@@ -23,6 +28,11 @@ class EmbeddedCloud final : public CKCloud {
   // underlying error says why), internalError (what is there isn't such a cloud).
   static std::shared_ptr<EmbeddedCloud> open(const std::string &folder, const std::string &accountName,
                                              const std::string &deviceName, NSError *error);
+  // The same, of a cloud that is there already: makes nothing of a folder that has none. serviceUnavailable
+  // then, and while it can't be reached.
+  static std::shared_ptr<EmbeddedCloud> openExisting(const std::string &folder,
+                                                     const std::string &accountName,
+                                                     const std::string &deviceName, NSError *error);
   ~EmbeddedCloud() override;
 
   // The most bytes of assets that the account's records may refer to, each record's counted; absent: no
@@ -81,6 +91,9 @@ class EmbeddedCloud final : public CKCloud {
  private:
   struct State;
   explicit EmbeddedCloud(std::shared_ptr<State> state);
+  static std::shared_ptr<EmbeddedCloud> openWith(const std::string &folder, const std::string &accountName,
+                                                 const std::string &deviceName, NSError *error,
+                                                 const std::function<NSError(embedded::Home &home)> &reach);
   const std::shared_ptr<State> state_;
 };
 

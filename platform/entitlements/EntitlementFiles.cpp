@@ -89,6 +89,49 @@ const std::string *TextOf(const Json &object, const char *key) {
   return text && !text->empty() ? text : nullptr;
 }
 
+// Why the value isn't one; "" when it was read.
+std::string ReadValue(const Json &value, const std::string &name, EntitlementValue *read) {
+  if (value.is_boolean() && value.get<bool>()) {
+    *read = true;
+    return {};
+  }
+  if (const auto *text = value.get_ptr<const std::string *>(); text && !text->empty()) {
+    *read = *text;
+    return {};
+  }
+  std::vector<std::string> texts;
+  if (value.is_array()) {
+    for (const Json &element : value)
+      if (const auto *text = element.get_ptr<const std::string *>(); text && !text->empty())
+        texts.push_back(*text);
+  }
+  if (!value.is_array() || texts.size() != value.size())
+    return "the value of \"" + name + "\" is neither true nor a text nor a list of texts";
+  *read = std::move(texts);
+  return {};
+}
+
+std::string ReadEntitlements(const Json &entry, EntitlementGrant *grant) {
+  const auto list = entry.find("entitlements");
+  const auto values = entry.find("values");
+  if (list == entry.end() ? values == entry.end() : !list->is_array())
+    return "an application needs \"entitlements\", a list";
+  if (values != entry.end() && !values->is_object()) return "\"values\" of an application isn't an object";
+  if (list != entry.end()) {
+    for (const Json &name : *list) {
+      const auto *text = name.get_ptr<const std::string *>();
+      if (!text || text->empty()) return "an entitlement of " + grant->application + " isn't a text";
+      grant->entitlements.push_back(*text);
+    }
+  }
+  if (values == entry.end()) return {};
+  for (const auto &[name, value] : values->items()) {
+    const std::string why = ReadValue(value, name, &grant->values[name]);
+    if (!why.empty()) return why;
+  }
+  return {};
+}
+
 // Why the entry makes no grant; "" when it made one.
 std::string ReadEntry(const Json &entry, EntitlementGrant *grant) {
   if (!entry.is_object()) return "an application isn't an object";
@@ -98,16 +141,9 @@ std::string ReadEntry(const Json &entry, EntitlementGrant *grant) {
     return "an application needs either \"flatpak\" or \"executable\", a text";
   if (executable && executable->front() != '/')
     return "the executable \"" + *executable + "\" isn't an absolute path";
-  const auto list = entry.find("entitlements");
-  if (list == entry.end() || !list->is_array()) return "an application needs \"entitlements\", a list";
   grant->kind = flatpak ? EntitlementGrant::Kind::flatpak : EntitlementGrant::Kind::executable;
   grant->application = flatpak ? *flatpak : *executable;
-  for (const Json &name : *list) {
-    const auto *text = name.get_ptr<const std::string *>();
-    if (!text || text->empty()) return "an entitlement of " + grant->application + " isn't a text";
-    grant->entitlements.push_back(*text);
-  }
-  return {};
+  return ReadEntitlements(entry, grant);
 }
 
 std::string ReadGrants(const std::string &bytes, const std::string &file,

@@ -1,12 +1,17 @@
 #pragma once
 
+#include <map>
 #include <string>
 #include <sys/types.h>
+#include <variant>
 #include <vector>
 
 #include "platform/foundation/NSError.h"
 
 namespace droxa {
+
+// What an entitlement may say beyond being granted: true, a text, or texts.
+using EntitlementValue = std::variant<bool, std::string, std::vector<std::string>>;
 
 // What one file grants one application.
 struct EntitlementGrant {
@@ -14,6 +19,7 @@ struct EntitlementGrant {
   Kind kind = Kind::flatpak;
   std::string application;  // a Flatpak identifier, or an executable's absolute path
   std::vector<std::string> entitlements;
+  std::map<std::string, EntitlementValue> values;
   std::string file;  // that says so
 };
 
@@ -32,8 +38,10 @@ struct EntitlementGrants {
 //
 //   {"applications": [
 //     {"flatpak": "org.example.Writer", "entitlements": ["com.quorva.Tessaly.sharing-proxy"]},
-//     {"executable": "/usr/bin/writer", "entitlements": ["com.quorva.Tessaly.sharing-proxy"]}]}
+//     {"executable": "/usr/bin/writer", "entitlements": ["com.quorva.Tessaly.sharing-proxy"],
+//      "values": {"com.quorva.developer.droxa-container-identifiers": ["org.example.Writer"]}}]}
 //
+// An application has "entitlements", or "values" (each true, a text or texts), or both.
 // Only what nobody but the owner can write counts: the folder, and each file in it, has to belong to `owner`
 // and to be writable by it alone. Anything else, and a file that doesn't read as above, grants nothing; each
 // is an error in the log. Files are read anew for every question, so a change holds from the next connection.

@@ -5,14 +5,17 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "platform/fileprovider/NSFileProviderEnumerating.h"
 #include "platform/fileprovider/NSFileProviderServiceSource.h"
+#include "platform/foundation/CGSize.h"
 #include "platform/foundation/NSData.h"
 #include "platform/foundation/NSDate.h"
 #include "platform/foundation/NSError.h"
 #include "platform/foundation/NSObject.h"
+#include "platform/foundation/NSProgress.h"
 #include "platform/foundation/NSURL.h"
 
 namespace droxa {
@@ -21,6 +24,11 @@ using NSFileProviderItemCompletion =
     std::function<void(const std::shared_ptr<const NSFileProviderItem> &item, const NSError &error)>;
 using NSFileProviderErrorCompletion = std::function<void(const NSError &error)>;
 using NSFileProviderServiceSources = std::vector<std::shared_ptr<NSFileProviderServiceSource>>;
+// Told of one item's thumbnail: its bytes, or none; what kind of picture it is, where that isn't a plain one;
+// and why there is none, which is nil also where there just isn't one.
+using NSFileProviderThumbnailHandler =
+    std::function<void(const std::string &identifier, const NSData &imageData,
+                       const std::optional<std::string> &contentType, const NSError &error)>;
 using NSFileProviderMovingCompletion = std::function<void(bool requiresProviding, const NSError &error)>;
 
 // The extension protocol: what the framework asks a file provider.
@@ -57,6 +65,11 @@ class NSFileProviderExtension : public NSObject,
   // The first half of that alone: whoever waited no longer does, which is no reason to let go of contents
   // that have come in between.
   virtual void cancelProvidingItemAtURL(const NSURL &url) = 0;
+  // How many bytes of what is being provided at `url` are here, and how many it has; 0 of -1 where nothing is
+  // known. May wait for whoever knows.
+  virtual std::pair<std::int64_t, std::int64_t> progressOfProvidingItemAtURL(const NSURL & /*url*/) {
+    return {0, -1};
+  }
   virtual void itemChangedAtURL(const NSURL &url) = 0;
   virtual void providePlaceholderAtURL(const NSURL &url, NSFileProviderErrorCompletion completion) = 0;
   // Whether the move needs the contents first.
@@ -92,6 +105,19 @@ class NSFileProviderExtension : public NSObject,
                           NSFileProviderItemCompletion completion) = 0;
   virtual void setFavoriteRank(const std::optional<std::uint64_t> &rank, const std::string &identifier,
                                NSFileProviderItemCompletion completion) = 0;
+
+  // Thumbnails of about that size, in points. The handler is called once for each item, one call at a time,
+  // on any thread; not for those that were lost with the error that the completion then gets. The progress is
+  // cancellable once anything is left to be cancelled.
+  virtual std::shared_ptr<NSProgress> fetchThumbnailsForItemIdentifiers(
+      const std::vector<std::string> &identifiers, CGSize requestedSize,
+      NSFileProviderThumbnailHandler perThumbnailCompletionHandlerWithType,
+      NSFileProviderErrorCompletion completionHandler) = 0;
+
+  // The folder in which an application's documents go unless a person says otherwise; made where it is
+  // missing. Without an application: the one of everybody's documents.
+  virtual void _defaultApplicationContainerForBundleIdentifier(
+      const std::optional<std::string> &bundleIdentifier, NSFileProviderItemCompletion completionHandler) = 0;
 };
 
 }  // namespace droxa

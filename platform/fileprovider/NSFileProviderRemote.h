@@ -9,6 +9,7 @@
 
 #include "platform/fileprovider/FPDActionRequest.h"
 #include "platform/fileprovider/NSFileProviderItem.h"
+#include "platform/foundation/CGSize.h"
 #include "platform/foundation/NSData.h"
 #include "platform/foundation/NSError.h"
 #include "platform/foundation/NSURL.h"
@@ -49,6 +50,9 @@ class NSFileProviderRemoteEnumerator {
 using NSFileProviderEnumeratorCompletion = std::function<void(
     const std::shared_ptr<NSFileProviderRemoteEnumerator> &enumerator, const NSError &error)>;
 
+// Units of the work's own choice, bytes where contents are moved; a total of -1: not known yet.
+using FPDProgressCompletion = std::function<void(std::int64_t completed, std::int64_t total)>;
+
 // Contents that are being made available to a reader. Cancelling it, or releasing the last reference before
 // it has ended, ends the download when nobody else waits for it; what is here already stays. A received one
 // makes proxies (NSXPCProxyWithErrorHandler).
@@ -57,6 +61,8 @@ class FPDProviding {
   virtual ~FPDProviding() = default;
   // Replies when it has ended: nil when the contents are here.
   virtual void waitWithReply(NSFileProviderErrorCompletion completion) = 0;
+  // 0 of -1 while nothing is known.
+  virtual void getProgress(FPDProgressCompletion completion) { completion(0, -1); }
   virtual void cancel() = 0;
 };
 
@@ -64,9 +70,6 @@ using FPDProvidingCompletion =
     std::function<void(const std::shared_ptr<FPDProviding> &providing, const NSError &error)>;
 using FPDItemProvidingCompletion = std::function<void(const std::shared_ptr<FPDProviding> &providing,
                                                       const NSURL &url, const NSError &error)>;
-
-// Units of the work's own choice, bytes where contents are moved; a total of -1: not known yet.
-using FPDProgressCompletion = std::function<void(std::int64_t completed, std::int64_t total)>;
 
 // A change that somebody wants made to an item. It begins when it is first waited for, so that one which
 // nobody received was never made. Cancelling it, or releasing the last reference before it has ended, stops
@@ -104,6 +107,36 @@ class FPDService {
 using FPDServiceCompletion =
     std::function<void(const std::shared_ptr<FPDService> &service, const NSError &error)>;
 
+// What one item was answered: its picture, or none; what kind of picture it is, where that isn't a plain one;
+// and why there is none, which is nil also where there just isn't one.
+struct FPDThumbnail {
+  std::string identifier;
+  NSData imageData;
+  std::optional<std::string> contentType;
+  NSError error;
+};
+
+// Those that came since the last reply; at least one, unless they are the last ones, which come with the
+// outcome of the whole.
+using FPDThumbnailsReply =
+    std::function<void(const std::vector<FPDThumbnail> &thumbnails, bool isLast, const NSError &error)>;
+
+// Thumbnails that are being fetched. It begins when the next ones are first asked for. Each item is told at
+// most once; to clients of the host exactly once. Cancelling it, or releasing the last reference, ends what
+// can be ended. A received one makes proxies (NSXPCProxyWithErrorHandler).
+class FPDThumbnails {
+ public:
+  virtual ~FPDThumbnails() = default;
+  // Asked for again when it has replied, and no more after the last ones.
+  virtual void nextWithReply(FPDThumbnailsReply reply) = 0;
+  virtual void getProgress(FPDProgressCompletion completion) = 0;  // items
+  // Ends it with NSUserCancelledError (NSCocoaErrorDomain), unless it was too late.
+  virtual void cancel() = 0;
+};
+
+using FPDThumbnailsCompletion =
+    std::function<void(const std::shared_ptr<FPDThumbnails> &thumbnails, const NSError &error)>;
+
 // What the extension's process exports to the host.
 class NSFileProviderExtensionProtocol {
  public:
@@ -129,6 +162,12 @@ class NSFileProviderExtensionProtocol {
 
   virtual void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
                                               FPDServiceCompletion completion) = 0;
+
+  // The size is in points.
+  virtual void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers, CGSize size,
+                                                 FPDThumbnailsCompletion completion) = 0;
+  virtual void defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                                   NSFileProviderItemCompletion completion) = 0;
 };
 
 // What the host exports to the extension's process.
@@ -174,10 +213,15 @@ struct FPDStatus {
   std::uint64_t watchers = 0;
   std::uint64_t signals = 0;     // received since the host started
   std::string lastExtensionEnd;  // why the extension last ended, "" if it never did
+  std::string mountPoint;        // where the drive is mounted, "" if it isn't
+  std::string mountProblem;      // why it isn't though it is to be, "" otherwise
 };
 
 using FPDStatusCompletion = std::function<void(const FPDStatus &status)>;
+using FPDMountCompletion = std::function<void(const std::string &mountPoint, const NSError &error)>;
 using FPDWatchCompletion = std::function<void(const std::shared_ptr<FPDWatch> &watch, const NSError &error)>;
+
+inline constexpr std::size_t FPDMostThumbnailsAtOnce = 10000;
 
 // What the host exports to its clients (the droxa command).
 class FPDControlProtocol {
@@ -214,6 +258,26 @@ class FPDControlProtocol {
   // NSPOSIXErrorDomain EMFILE for a client that holds too many.
   virtual void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
                                               FPDServiceCompletion completion) = 0;
+
+  // Every item is answered, and once, however often it is named and whatever becomes of the extension: those
+  // that were lost with the error of the whole. NSPOSIXErrorDomain E2BIG for more than
+  // FPDMostThumbnailsAtOnce.
+  virtual void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers, CGSize size,
+                                                 FPDThumbnailsCompletion completion) = 0;
+  // The folder in which an application's documents go, made where it is missing; nullopt: the top-level
+  // documents folder, the one that is there already where there is one.
+  virtual void defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                                   NSFileProviderItemCompletion completion) = 0;
+  // Puts the thumbnails of the documents in the container that aren't here into the cache that the desktop's
+  // programs share, where they aren't yet; completes when it is done, however long that takes.
+  virtual void fillDesktopThumbnailsForContainer(const std::string &identifier,
+                                                 NSFileProviderErrorCompletion completion) = 0;
+
+  // Shows the drive as a folder: `path` is absolute, "" where it is mounted by default. One that is mounted
+  // elsewhere moves. NSPOSIXErrorDomain ENODEV, with words, when it can't be.
+  virtual void mountAtPath(const std::string &path, FPDMountCompletion completion) = 0;
+  // Not mounted isn't an error.
+  virtual void unmount(NSFileProviderErrorCompletion completion) = 0;
 };
 
 }  // namespace droxa

@@ -69,6 +69,12 @@ DroxaHome DroxaHome::resolve(const std::optional<std::string> &folder) {
   return DroxaHome(NSHomeDirectory() + "/.local/share/droxa");
 }
 
+std::string DroxaHome::defaultMountPoint() const {
+  const std::string data = environment("XDG_DATA_HOME");
+  const DroxaHome usual(data.starts_with('/') ? data + "/droxa" : NSHomeDirectory() + "/.local/share/droxa");
+  return (root_ == usual.root() ? NSHomeDirectory() : root_) + "/Droxa Drive";
+}
+
 DroxaHome::DroxaHome(std::string root) : root_(absolutePath(root)) {}
 
 bool DroxaHome::create(std::string *problem) const {

@@ -22,6 +22,11 @@ class DroxaHome {
   std::string logs() const { return root_ + "/logs"; }
   std::string daemonSocket() const { return run() + "/keld.sock"; }
   std::string hostSocket() const { return run() + "/fileproviderd.sock"; }
+  // Where the drive is to be mounted, for as long as it is: the text is the folder's path.
+  std::string mountFile() const { return run() + "/mount"; }
+  // Where the drive is mounted when nobody says otherwise: "~/Droxa Drive" for the usual home, "Droxa Drive"
+  // in any other.
+  std::string defaultMountPoint() const;
 
   // Makes the folders, each only for its owner (0700). False, with `problem` naming the folder, on failure.
   bool create(std::string *problem) const;

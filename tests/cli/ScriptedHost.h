@@ -50,10 +50,35 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
   }
   // Done by `act`, as the extension would.
   void performAction(const FPDActionRequest &request, FPDActionCompletion completion) override;
+  void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers, CGSize size,
+                                         FPDThumbnailsCompletion completion) override {
+    if (!fetchThumbnails) return completion(nullptr, NSError(NSPOSIXErrorDomain, ENOSYS));
+    completion(fetchThumbnails(identifiers, size), NSError());
+  }
+  void defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                           NSFileProviderItemCompletion completion) override {
+    if (!defaultContainer) return completion(nullptr, NSError(NSPOSIXErrorDomain, ENOSYS));
+    defaultContainer(bundleIdentifier, completion);
+  }
+  void fillDesktopThumbnailsForContainer(const std::string &identifier,
+                                         NSFileProviderErrorCompletion completion) override {
+    filled.push_back(identifier);
+    completion(NSError());
+  }
   // As the item offers them: `services` by name.
   void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
                                       FPDServiceCompletion completion) override;
 
+  void mountAtPath(const std::string &path, FPDMountCompletion completion) override {
+    if (!mountError) status.mountPoint = path.empty() ? "/home/anna/Droxa Drive" : path;
+    completion(mountError ? std::string() : status.mountPoint, mountError);
+  }
+  void unmount(NSFileProviderErrorCompletion completion) override {
+    status.mountPoint.clear();
+    completion(NSError());
+  }
+
+  NSError mountError;
   std::map<std::string, NSFileProviderItemFields> items;  // by identifier
   std::map<std::string, std::string> paths;               // to identifiers
   std::map<std::string, std::string> urls;                // by identifier
@@ -62,6 +87,11 @@ class ScriptedHost final : public FPDControlProtocol, public std::enable_shared_
   FPDStatus status;
   std::function<std::shared_ptr<FPDProviding>(const NSURL &url, std::uint64_t readingOptions)> provide;
   std::function<std::shared_ptr<FPDAction>(const FPDActionRequest &request)> act;
+  std::function<std::shared_ptr<FPDThumbnails>(const std::vector<std::string> &identifiers, CGSize size)>
+      fetchThumbnails;
+  std::vector<std::string> filled;  // the containers whose thumbnails the desktop was given
+  std::function<void(const std::optional<std::string> &, const NSFileProviderItemCompletion &)>
+      defaultContainer;
   std::map<std::string, std::function<std::shared_ptr<FPDService>(const std::string &identifier)>> services;
   std::vector<FPDActionRequest> requests;                                      // of actions
   std::function<void(const std::string &container, std::size_t page)> onPage;  // before it is answered

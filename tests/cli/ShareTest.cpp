@@ -154,6 +154,7 @@ TEST_F(ShareCommand, jsonHasTheSame) {
   EXPECT_EQ(object["shared"], true);
   EXPECT_EQ(object["link"], "https://drive.example/s/1");
   EXPECT_EQ(object["everyone"], "none");
+  EXPECT_EQ(object["folder"], nullptr);
   EXPECT_EQ(object["participants"][1]["account"], "bob");
   EXPECT_EQ(object["participants"][1]["permission"], "read-only");
   EXPECT_EQ(object["participants"][1]["status"], "not accepted yet");
@@ -260,8 +261,8 @@ TEST_F(ShareCommand, aFolderGoesThroughTheShareOperations) {
   foldersShareIs(shared());
   EXPECT_EQ(with(runShareShow, "in"), 0) << err.str();
   EXPECT_EQ(out.str().find("in: shared\n"), 0U);
-  EXPECT_EQ(fake.daemon->calls(), Words{"startOperation_toCopySharingInfoAtURL(file:///replica/in)"})
-      << "looking asks nothing else";
+  EXPECT_EQ(fake.daemon->calls(), (Words{"startOperation_toCopySharingInfoAtURL(file:///replica/in)",
+                                         "getShareOptionsOfItemIdentifier(i2)"}));
   EXPECT_EQ(add({"eve"}, "in"), 0) << err.str();
   EXPECT_EQ(fake.daemon->sharing().lastShare()->participants.back().userIdentity.accountName, "eve");
   EXPECT_EQ(with(runShareLink, "in"), 0);
@@ -282,6 +283,9 @@ TEST_F(ShareCommand, whatIsSharedWithAFolderIsChangedThere) {
   answers.sharedFolderName = "Plans";
   fake.daemon->sharing().setAnswers(answers);
   EXPECT_EQ(with(runShareShow), 0) << "it is shown";
+  EXPECT_EQ(out.str().find("a.txt: shared with the folder Plans\n"), 0U) << out.str();
+  EXPECT_EQ(with(runShareShow, "a.txt", true), 0);
+  EXPECT_EQ(Json::parse(out.str())["folder"], "Plans");
   EXPECT_EQ(remove(std::nullopt), 1);
   EXPECT_TRUE(said("it is shared with the folder Plans that it is in; change that folder's share"))
       << err.str();

@@ -111,6 +111,32 @@ class ScriptedPrincipal final : public NSFileProviderExtension {
                        NSFileProviderItemCompletion completion) override {
     keep("rank " + (rank ? std::to_string(*rank) : "nil") + " " + identifier, std::move(completion));
   }
+
+  // Kept for the test to answer.
+  std::shared_ptr<NSProgress> fetchThumbnailsForItemIdentifiers(
+      const std::vector<std::string> &identifiers, CGSize, NSFileProviderThumbnailHandler handler,
+      NSFileProviderErrorCompletion completion) override {
+    std::string text;
+    for (const std::string &identifier : identifiers) text += " " + identifier;
+    const Lock lock(mutex);
+    thumbnailHandler = std::move(handler);
+    thumbnailCompletion = std::move(completion);
+    log.add("thumbnails" + text);
+    return thumbnailProgress;
+  }
+  NSFileProviderThumbnailHandler takeThumbnailHandler() {
+    const Lock lock(mutex);
+    return std::exchange(thumbnailHandler, nullptr);
+  }
+  NSFileProviderErrorCompletion takeThumbnailCompletion() {
+    const Lock lock(mutex);
+    return std::exchange(thumbnailCompletion, nullptr);
+  }
+  void _defaultApplicationContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                                       NSFileProviderItemCompletion completion) override {
+    keep("default container of " + bundleIdentifier.value_or("nil"), std::move(completion));
+  }
+
   struct Asked {
     NSFileProviderItemCompletion completion;
     std::shared_ptr<NSProgress> progress;
@@ -143,6 +169,9 @@ class ScriptedPrincipal final : public NSFileProviderExtension {
   Mutex mutex;
   std::deque<NSFileProviderErrorCompletion> starts GUARDED_BY(mutex);
   std::deque<Asked> actions GUARDED_BY(mutex);
+  NSFileProviderThumbnailHandler thumbnailHandler GUARDED_BY(mutex);
+  NSFileProviderErrorCompletion thumbnailCompletion GUARDED_BY(mutex);
+  const std::shared_ptr<NSProgress> thumbnailProgress = std::make_shared<NSProgress>();
   std::map<std::string, NSURL> urls;  // by identifier; besides "d1", which is at `url`
   const NSURL url = NSURL::fileURLWithPath("/replica/a");
   std::shared_ptr<const NSFileProviderItem> item;

@@ -36,6 +36,14 @@ class FailingProxy final : public NSFileProviderExtensionProtocol {
                                       FPDServiceCompletion) override {
     fail();
   }
+  void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &, CGSize,
+                                         FPDThumbnailsCompletion) override {
+    fail();
+  }
+  void defaultContainerForBundleIdentifier(const std::optional<std::string> &,
+                                           NSFileProviderItemCompletion) override {
+    fail();
+  }
 
  private:
   void fail() { handler_(connectionInterrupted()); }
@@ -187,6 +195,22 @@ void ScriptedExtension::listenerEndpointForServiceName(const std::string &name,
   const auto found = services.find(name + " " + itemIdentifier);
   if (found == services.end()) return completion(nullptr, failure);
   completion(found->second, NSError());
+}
+
+void ScriptedExtension::fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &asFor, CGSize size,
+                                                          FPDThumbnailsCompletion completion) {
+  std::string text;
+  for (const std::string &identifier : asFor) text += " " + identifier;
+  asked.put("thumbnails of" + text + ", " + std::to_string(static_cast<int>(size.width)) + " x " +
+            std::to_string(static_cast<int>(size.height)));
+  completion(thumbnails, thumbnails ? NSError() : failure);
+}
+
+void ScriptedExtension::defaultContainerForBundleIdentifier(
+    const std::optional<std::string> &bundleIdentifier, NSFileProviderItemCompletion completion) {
+  asked.put("default container of " + bundleIdentifier.value_or("nil"));
+  if (!defaultContainer) return completion(nullptr, failure);
+  completion(std::make_shared<NSFileProviderPlainItem>(*defaultContainer), NSError());
 }
 
 void ScriptedExtension::add(const std::string &identifier, const std::string &path,

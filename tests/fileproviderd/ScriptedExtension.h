@@ -1,5 +1,6 @@
 #pragma once
 
+#include <algorithm>
 #include <atomic>
 #include <condition_variable>
 #include <deque>
@@ -85,6 +86,11 @@ class ScriptedProviding final : public FPDProviding,
     const Lock held(lock_);
     reply_ = std::move(completion);
   }
+  // One byte more each time, until all that it has are here.
+  void getProgress(FPDProgressCompletion completion) override {
+    const int asked = ++progressQuestions;
+    completion(std::min(asked, mostProgress.load()), mostProgress.load());
+  }
   void cancel() override { ++cancels; }
   std::shared_ptr<FPDProviding> remoteObjectProxyWithErrorHandler(NSXPCErrorHandler handler) override {
     const Lock held(lock_);
@@ -119,6 +125,8 @@ class ScriptedProviding final : public FPDProviding,
     }
     handler(error);
   }
+  std::atomic<int> progressQuestions{0};
+  std::atomic<int> mostProgress{0};
   std::atomic<int> cancels{0};
 
  private:
@@ -196,6 +204,12 @@ class ScriptedExtension final : public NSFileProviderExtensionProtocol {
   // Gives what `services` has for "NAME IDENTIFIER", and its failure otherwise.
   void listenerEndpointForServiceName(const std::string &name, const std::string &itemIdentifier,
                                       FPDServiceCompletion completion) override;
+  // With `thumbnails`, or `failure`.
+  void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers, CGSize size,
+                                         FPDThumbnailsCompletion completion) override;
+  // With the item `defaultContainer`, or `failure`.
+  void defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                           NSFileProviderItemCompletion completion) override;
 
   // An item at a path of the disk.
   void add(const std::string &identifier, const std::string &path, const NSFileProviderItemFields &fields);
@@ -204,6 +218,8 @@ class ScriptedExtension final : public NSFileProviderExtensionProtocol {
   std::map<std::string, std::string> paths;        // by identifier
   std::map<std::string, std::string> identifiers;  // by path
   std::map<std::string, std::shared_ptr<FPDService>> services;
+  std::shared_ptr<FPDThumbnails> thumbnails;
+  std::optional<NSFileProviderItemFields> defaultContainer;
   NSError failure;  // of items and enumerators, when set
   Arrivals<std::string> asked;
   Arrivals<std::shared_ptr<ScriptedEnumerator>> enumerators;  // handed out, in order

@@ -84,6 +84,14 @@ class Extension final : public NSFileProviderExtensionProtocol {
                                       FPDServiceCompletion completion) override {
     completion(nullptr, NSError(NSCocoaErrorDomain, NSFeatureUnsupportedError));
   }
+  void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &, CGSize,
+                                         FPDThumbnailsCompletion completion) override {
+    completion(nullptr, NSError(NSCocoaErrorDomain, NSFeatureUnsupportedError));
+  }
+  void defaultContainerForBundleIdentifier(const std::optional<std::string> &,
+                                           NSFileProviderItemCompletion completion) override {
+    completion(nullptr, NSError(NSCocoaErrorDomain, NSFeatureUnsupportedError));
+  }
 };
 
 struct Ended {

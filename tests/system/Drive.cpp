@@ -56,6 +56,7 @@ void Drive::startKeld(std::vector<std::string> options) {
 
 void Drive::startHost() {
   host_.reset();
+  setenv("XDG_CACHE_HOME", cache().c_str(), 1);  // the host writes there, for the desktop
   host_ = std::make_unique<Process>(std::vector<std::string>{program("fileproviderd"), "--home", home_},
                                     home_ + "/output", "host" + std::to_string(runs_++));
 }

@@ -21,6 +21,7 @@ class Drive {
   const std::string &home() const { return home_; }
   std::string documents() const;  // the folder that is the drive's root
   std::string container(const std::string &identifier) const;
+  std::string cache() const { return home_ + "/cache"; }  // the user's, as far as the drive knows
 
   // Both daemons, and waits until a listing of the root succeeds.
   void start(std::vector<std::string> keldOptions = {});

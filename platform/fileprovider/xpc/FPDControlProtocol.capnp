@@ -5,6 +5,7 @@ using Action = import "/platform/fileprovider/xpc/FPDAction.capnp";
 using Enumerator = import "/platform/fileprovider/xpc/NSFileProviderRemoteEnumerator.capnp";
 using Providing = import "/platform/fileprovider/xpc/FPDProviding.capnp";
 using Service = import "/platform/fileprovider/xpc/FPDService.capnp";
+using Thumbnails = import "/platform/fileprovider/xpc/FPDThumbnails.capnp";
 using Values = import "/platform/xpc/Values.capnp";
 $Cxx.namespace("droxa::schema");
 
@@ -27,6 +28,12 @@ interface FPDControlProtocol {
   performAction @11 (request :Action.FPDActionRequest) -> (action :Action.FPDAction, error :Values.Error);
   listenerEndpointForServiceName @12 (name :Data, identifier :Data)
       -> (service :Service.FPDService, error :Values.Error);
+  fetchThumbnails @13 (identifiers :List(Data), width :Float64, height :Float64)
+      -> (thumbnails :Thumbnails.FPDThumbnails, error :Values.Error);
+  defaultContainer @14 (identifier :Data) -> (item :Values.Item, error :Values.Error);
+  fillDesktopThumbnails @15 (identifier :Data) -> (error :Values.Error);
+  mountAtPath @16 (path :Data) -> (mountPoint :Data, error :Values.Error);
+  unmount @17 () -> (error :Values.Error);
 }
 
 interface FPDWatch {
@@ -55,4 +62,6 @@ struct FPDStatus {
   watchers @7 :UInt64;
   signals @8 :UInt64;
   lastExtensionEnd @9 :Data;
+  mountPoint @10 :Data;
+  mountProblem @11 :Data;
 }

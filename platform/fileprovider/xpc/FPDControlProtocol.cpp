@@ -5,6 +5,7 @@
 #include "platform/fileprovider/xpc/FPDControlProtocol.capnp.h"
 #include "platform/fileprovider/xpc/FPDProvidingAdapter.h"
 #include "platform/fileprovider/xpc/FPDServiceAdapter.h"
+#include "platform/fileprovider/xpc/FPDThumbnailsAdapter.h"
 #include "platform/fileprovider/xpc/FPDWatchAdapter.h"
 #include "platform/fileprovider/xpc/FileProviderInterfaces.h"
 #include "platform/fileprovider/xpc/RemoteEnumeratorAdapter.h"
@@ -48,6 +49,8 @@ void writeStatus(schema::FPDStatus::Builder builder, const FPDStatus &status) {
   builder.setWatchers(status.watchers);
   builder.setSignals(status.signals);
   builder.setLastExtensionEnd(xpcBytes(status.lastExtensionEnd));
+  builder.setMountPoint(xpcBytes(status.mountPoint));
+  builder.setMountProblem(xpcBytes(status.mountProblem));
 }
 
 FPDStatus readStatus(schema::FPDStatus::Reader reader) {
@@ -62,6 +65,8 @@ FPDStatus readStatus(schema::FPDStatus::Reader reader) {
   status.watchers = reader.getWatchers();
   status.signals = reader.getSignals();
   status.lastExtensionEnd = xpcString(reader.getLastExtensionEnd());
+  status.mountPoint = xpcString(reader.getMountPoint());
+  status.mountProblem = xpcString(reader.getMountProblem());
   return status;
 }
 
@@ -190,6 +195,47 @@ class ControlServer final : public Schema::Server {
         });
   }
 
+  kj::Promise<void> fetchThumbnails(FetchThumbnailsContext context) override {
+    const auto params = context.getParams();
+    return exported_.serve(
+        context, [identifiers = readStrings(params.getIdentifiers()),
+                  size = CGSize{params.getWidth(), params.getHeight()}](auto &object, auto reply) {
+          object.fetchThumbnailsForItemIdentifiers(identifiers, size, reply(xpcWriteThumbnails));
+        });
+  }
+
+  kj::Promise<void> defaultContainer(DefaultContainerContext context) override {
+    return exported_.serve(context, [bundle = getIdentifier(context.getParams())](auto &object, auto reply) {
+      object.defaultContainerForBundleIdentifier(
+          bundle, reply([](auto results, Session &, const auto &item, const NSError &error) {
+            setItem(results, item);
+            setError(results, error);
+          }));
+    });
+  }
+
+  kj::Promise<void> fillDesktopThumbnails(FillDesktopThumbnailsContext context) override {
+    return exported_.serve(
+        context, [identifier = xpcString(context.getParams().getIdentifier())](auto &object, auto reply) {
+          object.fillDesktopThumbnailsForContainer(identifier, reply(writeOutcome));
+        });
+  }
+
+  kj::Promise<void> mountAtPath(MountAtPathContext context) override {
+    return exported_.serve(
+        context, [path = xpcString(context.getParams().getPath())](auto &object, auto reply) {
+          object.mountAtPath(
+              path, reply([](auto results, Session &, const std::string &mountPoint, const NSError &error) {
+                results.setMountPoint(xpcBytes(mountPoint));
+                setError(results, error);
+              }));
+        });
+  }
+
+  kj::Promise<void> unmount(UnmountContext context) override {
+    return exported_.serve(context, [](auto &object, auto reply) { object.unmount(reply(writeOutcome)); });
+  }
+
  private:
   Exported<FPDControlProtocol> exported_;
 };
@@ -315,6 +361,49 @@ class ControlProxy final : public XPCProxy<Schema, FPDControlProtocol, ControlPr
           params.setIdentifier(xpcBytes(itemIdentifier));
         },
         std::move(completion), xpcReadService);
+  }
+
+  void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers, CGSize size,
+                                         FPDThumbnailsCompletion completion) override {
+    call(
+        &Client::fetchThumbnailsRequest,
+        [identifiers, size](auto params, Session &) {
+          writeStrings(params.initIdentifiers(xpcCount(identifiers)), identifiers);
+          params.setWidth(size.width);
+          params.setHeight(size.height);
+        },
+        std::move(completion), xpcReadThumbnails);
+  }
+
+  void defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                           NSFileProviderItemCompletion completion) override {
+    call(
+        &Client::defaultContainerRequest,
+        [bundleIdentifier](auto params, Session &) { setIdentifier(params, bundleIdentifier); },
+        std::move(completion),
+        [](auto results, const RemoteObject &) { return std::tuple(getItem(results), getError(results)); });
+  }
+
+  void fillDesktopThumbnailsForContainer(const std::string &identifier,
+                                         NSFileProviderErrorCompletion completion) override {
+    call(
+        &Client::fillDesktopThumbnailsRequest,
+        [identifier](auto params, Session &) { params.setIdentifier(xpcBytes(identifier)); },
+        std::move(completion), readOutcome, XPCWithoutDeadline);
+  }
+
+  void mountAtPath(const std::string &path, FPDMountCompletion completion) override {
+    call(
+        &Client::mountAtPathRequest, [path](auto params, Session &) { params.setPath(xpcBytes(path)); },
+        std::move(completion),
+        [](auto results, const RemoteObject &) {
+          return std::tuple(xpcString(results.getMountPoint()), getError(results));
+        });
+  }
+
+  void unmount(NSFileProviderErrorCompletion completion) override {
+    call(
+        &Client::unmountRequest, [](auto, Session &) {}, std::move(completion), readOutcome);
   }
 };
 

@@ -7,4 +7,5 @@ $Cxx.namespace("droxa::schema");
 interface FPDProviding {
   waitWithReply @0 () -> (error :Values.Error);  # answered when it has ended
   cancel @1 ();
+  getProgress @2 () -> (completed :Int64, total :Int64);
 }

@@ -19,6 +19,15 @@ class ProvidingServer final : public schema::FPDProviding::Server {
     });
   }
 
+  kj::Promise<void> getProgress(GetProgressContext context) override {
+    return exported_.serve(context, [](auto &object, auto reply) {
+      object.getProgress(reply([](auto results, Session &, std::int64_t completed, std::int64_t total) {
+        results.setCompleted(completed);
+        results.setTotal(total);
+      }));
+    });
+  }
+
   kj::Promise<void> cancel(CancelContext context) override {
     return exported_.serve(context, [](auto &object, auto reply) {
       object.cancel();
@@ -39,6 +48,15 @@ class ProvidingProxy final : public XPCProxy<schema::FPDProviding, FPDProviding,
     call(
         &Client::waitWithReplyRequest, [](auto, Session &) {}, std::move(completion),
         [](auto results, const RemoteObject &) { return std::tuple(getError(results)); }, XPCWithoutDeadline);
+  }
+
+  void getProgress(FPDProgressCompletion completion) override {
+    call(
+        &Client::getProgressRequest, [](auto, Session &) {}, std::move(completion),
+        [](auto results, const RemoteObject &) {
+          return std::tuple(static_cast<std::int64_t>(results.getCompleted()),
+                            static_cast<std::int64_t>(results.getTotal()));
+        });
   }
 
   void cancel() override {

@@ -5,6 +5,7 @@ using Action = import "/platform/fileprovider/xpc/FPDAction.capnp";
 using Enumerator = import "/platform/fileprovider/xpc/NSFileProviderRemoteEnumerator.capnp";
 using Providing = import "/platform/fileprovider/xpc/FPDProviding.capnp";
 using Service = import "/platform/fileprovider/xpc/FPDService.capnp";
+using Thumbnails = import "/platform/fileprovider/xpc/FPDThumbnails.capnp";
 using Values = import "/platform/xpc/Values.capnp";
 $Cxx.namespace("droxa::schema");
 
@@ -24,4 +25,7 @@ interface NSFileProviderExtensionProtocol {
   performAction @9 (request :Action.FPDActionRequest) -> (action :Action.FPDAction, error :Values.Error);
   listenerEndpointForServiceName @10 (name :Data, identifier :Data)
       -> (service :Service.FPDService, error :Values.Error);
+  fetchThumbnails @11 (identifiers :List(Data), width :Float64, height :Float64)
+      -> (thumbnails :Thumbnails.FPDThumbnails, error :Values.Error);
+  defaultContainer @12 (identifier :Data) -> (item :Values.Item, error :Values.Error);
 }

@@ -4,6 +4,7 @@
 #include "platform/fileprovider/xpc/FPDActionAdapter.h"
 #include "platform/fileprovider/xpc/FPDProvidingAdapter.h"
 #include "platform/fileprovider/xpc/FPDServiceAdapter.h"
+#include "platform/fileprovider/xpc/FPDThumbnailsAdapter.h"
 #include "platform/fileprovider/xpc/FileProviderInterfaces.h"
 #include "platform/fileprovider/xpc/NSFileProviderExtensionProtocol.capnp.h"
 #include "platform/fileprovider/xpc/RemoteEnumeratorAdapter.h"
@@ -126,6 +127,25 @@ class ExtensionServer final : public Schema::Server {
         });
   }
 
+  kj::Promise<void> fetchThumbnails(FetchThumbnailsContext context) override {
+    const auto params = context.getParams();
+    return exported_.serve(
+        context, [identifiers = readStrings(params.getIdentifiers()),
+                  size = CGSize{params.getWidth(), params.getHeight()}](auto &object, auto reply) {
+          object.fetchThumbnailsForItemIdentifiers(identifiers, size, reply(xpcWriteThumbnails));
+        });
+  }
+
+  kj::Promise<void> defaultContainer(DefaultContainerContext context) override {
+    return exported_.serve(context, [bundle = getIdentifier(context.getParams())](auto &object, auto reply) {
+      object.defaultContainerForBundleIdentifier(
+          bundle, reply([](auto results, Session &, const auto &item, const NSError &error) {
+            setItem(results, item);
+            setError(results, error);
+          }));
+    });
+  }
+
  private:
   Exported<NSFileProviderExtensionProtocol> exported_;
 };
@@ -227,6 +247,27 @@ class ExtensionProxy final : public XPCProxy<Schema, NSFileProviderExtensionProt
           params.setIdentifier(xpcBytes(itemIdentifier));
         },
         std::move(completion), xpcReadService);
+  }
+
+  void fetchThumbnailsForItemIdentifiers(const std::vector<std::string> &identifiers, CGSize size,
+                                         FPDThumbnailsCompletion completion) override {
+    call(
+        &Client::fetchThumbnailsRequest,
+        [identifiers, size](auto params, Session &) {
+          writeStrings(params.initIdentifiers(xpcCount(identifiers)), identifiers);
+          params.setWidth(size.width);
+          params.setHeight(size.height);
+        },
+        std::move(completion), xpcReadThumbnails);
+  }
+
+  void defaultContainerForBundleIdentifier(const std::optional<std::string> &bundleIdentifier,
+                                           NSFileProviderItemCompletion completion) override {
+    call(
+        &Client::defaultContainerRequest,
+        [bundleIdentifier](auto params, Session &) { setIdentifier(params, bundleIdentifier); },
+        std::move(completion),
+        [](auto results, const RemoteObject &) { return std::tuple(getItem(results), getError(results)); });
   }
 };
 

@@ -282,7 +282,8 @@ TEST_F(SyncStoreTest, aDatabaseOfTheFirstVersionIsBroughtUpToDate) {
     SqlDatabase database(old, SqlDatabase::Access::readWrite, 100);
     database.execute(
         "DROP TABLE unfinished; DROP TABLE meant; DROP TABLE shares; DROP TABLE thumbnails;"
-        "ALTER TABLE rows DROP COLUMN tags;"
+        "DROP TABLE accesses; DROP TABLE tops;"
+        "ALTER TABLE uploads DROP COLUMN refused; ALTER TABLE rows DROP COLUMN tags;"
         "ALTER TABLE rows DROP COLUMN lastUsed; ALTER TABLE rows DROP COLUMN favoriteRank;"
         "PRAGMA user_version = 1");
   }
@@ -436,7 +437,9 @@ TEST_F(SyncStoreTest, aDatabaseThatHasPassedOverSharesReadsEverythingOnceMore) {
   store.setText("changeToken", "t");
   store.transaction([] {});
   SqlDatabase(path, SqlDatabase::Access::readWrite, 100)
-      .execute("DROP TABLE shares; DROP TABLE thumbnails; PRAGMA user_version = 4");
+      .execute(
+          "DROP TABLE shares; DROP TABLE thumbnails; DROP TABLE accesses; DROP TABLE tops;"
+          "ALTER TABLE uploads DROP COLUMN refused; PRAGMA user_version = 4");
   SyncStore upgraded(path);
   EXPECT_EQ(upgraded.text("changeToken"), "");
   EXPECT_TRUE(upgraded.shares().empty());

@@ -163,10 +163,11 @@ TEST_F(ThumbnailSync, bringsNothingBackThatTheOtherDeviceDeleted) {
   annas->hold(true);
   sent(anna, "beach.jpg", "sand");
   ASSERT_TRUE(ben.knowsSoon("beach.jpg"));
+  ASSERT_TRUE(eventually([&] { return ben.status("beach.jpg").upload == QVUploadState::inCloud; }));
   ben.keld.stop();
   annas->hold(false);
   ASSERT_TRUE(hasSoon("beach.jpg", "thumbnail of sand"));
-  std::filesystem::remove(ben.keld.at("beach.jpg"));
+  ASSERT_TRUE(std::filesystem::remove(ben.keld.at("beach.jpg")));
   ben.keld.start();
   EXPECT_TRUE(eventually([&] { return !hand.at("beach.jpg"); }));
   EXPECT_TRUE(anna.losesSoon("beach.jpg"));
