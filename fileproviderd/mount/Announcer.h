@@ -26,6 +26,7 @@ class Announcer {
     removeFolder = 'r',
     changeContents = 'c',
     changeAttributes = 'a',
+    writeBack = 's',  // no change: has the kernel write what programs changed in mapped memory
   };
 
   ~Announcer();
