@@ -19,9 +19,9 @@ bool FuseNotices::play(Announcer::Play play, NodeId folder, const std::string &n
   const std::string path = announcer_ ? mountedPath(folder, name) : std::string();
   if (path.empty()) return false;
   drive_->playing.begin({folder, name, isMaking});
-  announcer_->play(play, path);
+  const bool isPlayed = announcer_->play(play, path);
   drive_->playing.end();
-  return true;
+  return isPlayed;
 }
 
 void FuseNotices::playChange(Announcer::Play play, NodeId node) {
