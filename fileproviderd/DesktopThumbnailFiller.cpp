@@ -17,6 +17,7 @@ constexpr std::size_t kMostWaiting = 50'000;
 constexpr std::size_t kMostKnownWithout = 100'000;
 constexpr std::size_t kOfOneRequest = 200;
 constexpr std::chrono::minutes kBeforeAskingAgain{1};
+constexpr double kMostFoldersAtOnce = 4, kFoldersASecond = 4;
 constexpr CGSize kLargest{1024, 1024};
 
 os_log_t log() {
@@ -59,11 +60,6 @@ DesktopThumbnailFiller::DesktopThumbnailFiller(std::shared_ptr<ExtensionCalls> c
       queue_(dispatch_queue_create("desktop-thumbnails", DISPATCH_QUEUE_SERIAL)),
       folders_(std::move(folders)) {}
 
-void DesktopThumbnailFiller::addShownFolder(const ShownFolder &folder) {
-  const Lock lock(lock_);
-  folders_.push_back(folder);
-}
-
 void DesktopThumbnailFiller::itemsWereListed(const std::string &container, const NSFileProviderItems &items) {
   if (!isPlainContainer(container)) return;
   NSFileProviderItems dataless;
@@ -81,6 +77,34 @@ void DesktopThumbnailFiller::itemsWereListed(const std::string &container, const
     const Lock lock(self->lock_);
     self->waiting_ -= dataless.size();
   });
+}
+
+bool DesktopThumbnailFiller::mayLookAtFolder() {
+  const auto now = std::chrono::steady_clock::now();
+  const Lock lock(lock_);
+  const std::chrono::duration<double> passed = now - turnsCounted_;
+  folderTurns_ = std::min(kMostFoldersAtOnce, folderTurns_ + passed.count() * kFoldersASecond);
+  turnsCounted_ = now;
+  if (folderTurns_ < 1) return false;
+  folderTurns_ -= 1;
+  return true;
+}
+
+void DesktopThumbnailFiller::folderWasOpened(const std::string &path) {
+  if (!mayLookAtFolder()) return;
+  dispatch_async(queue_, [self = shared_from_this(), path] {
+    if (const NSError error = self->fillFolder(path))
+      os_log_error(log(), "[ERROR] no thumbnails for the desktop of what is in %@: %@", path, error);
+  });
+}
+
+NSError DesktopThumbnailFiller::fillFolder(const std::string &path) {
+  const auto [container, error] = await<std::optional<std::string>, NSError>(
+      [&](const auto &reply) { calls_->identifierForItemAtURL(NSURL::fileURLWithPath(path), reply); });
+  if (!container) return error;  // without one: it is gone
+  NSFileProviderItems items;
+  const NSError failure = list(*container, &items);
+  return failure || items.empty() ? failure : fill(*container, items, Again::no);
 }
 
 void DesktopThumbnailFiller::fillContainer(const std::string &container,
@@ -128,9 +152,10 @@ NSError DesktopThumbnailFiller::fill(const std::string &container, const NSFileP
   std::string folder;
   if (const NSError error = locate(container, &folder)) return error;
   if (folder.empty()) return {};
+  const std::vector<ShownFolder> seenAt = places();
   std::vector<Wanted> documents;
   for (const auto &item : items) {
-    Wanted document = wanted(folder, item->fields());
+    Wanted document = wanted(folder, seenAt, item->fields());
     if (!document.subjects.empty() && (again == Again::yes || !hadNone(document)))
       documents.push_back(std::move(document));
     if (documents.size() < kOfOneRequest) continue;
@@ -140,15 +165,18 @@ NSError DesktopThumbnailFiller::fill(const std::string &container, const NSFileP
   return documents.empty() ? NSError() : fetch(documents);
 }
 
+std::vector<ShownFolder> DesktopThumbnailFiller::places() const {
+  std::vector<ShownFolder> all = folders_;
+  if (mounted_)
+    for (ShownFolder &folder : mounted_()) all.push_back(std::move(folder));
+  return all;
+}
+
 DesktopThumbnailFiller::Wanted DesktopThumbnailFiller::wanted(const std::string &folder,
-                                                              const NSFileProviderItemFields &item) {
+                                                              const std::vector<ShownFolder> &places,
+                                                              const NSFileProviderItemFields &item) const {
   Wanted document{item.itemIdentifier, {}};
   const std::string path = folder + "/" + item.filename;
-  std::vector<ShownFolder> places;
-  {
-    const Lock lock(lock_);
-    places = folders_;
-  }
   for (const ShownFolder &place : places) {
     if (!path.starts_with(place.replica + "/")) continue;
     const DesktopThumbnailSubject subject{place.shown + path.substr(place.replica.size()),

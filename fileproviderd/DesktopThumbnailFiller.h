@@ -1,6 +1,7 @@
 #pragma once
 
 #include <chrono>
+#include <functional>
 #include <map>
 #include <memory>
 #include <string>
@@ -8,17 +9,12 @@
 #include <vector>
 
 #include "fileproviderd/ExtensionCalls.h"
+#include "fileproviderd/ShownFolder.h"
 #include "platform/dispatch/dispatch.h"
 #include "platform/foundation/ThreadSafety.h"
 #include "platform/imaging/DesktopThumbnails.h"
 
 namespace droxa {
-
-// Below what path programs see what lies below a path of the replica.
-struct ShownFolder {
-  std::string replica;
-  std::string shown;
-};
 
 // Puts thumbnails of documents that aren't here into the desktop's cache, so that whoever shows a folder of
 // the drive finds pictures without reading, and so fetching, the documents. What somebody lists is what
@@ -34,12 +30,16 @@ class DesktopThumbnailFiller final : public std::enable_shared_from_this<Desktop
   DesktopThumbnailFiller(std::shared_ptr<ExtensionCalls> calls, DesktopThumbnails cache,
                          std::vector<ShownFolder> folders);
 
-  // From now on what lies in the replica is seen there too: a mount's folder, say.
-  void addShownFolder(const ShownFolder &folder);
+  // Asked, on the queue, where else what lies in the replica is seen now: a mount's folders. Before the first
+  // use.
+  void setMountedFolders(std::function<std::vector<ShownFolder>()> ask) { mounted_ = std::move(ask); }
 
   // A client was given these items of the container. Returns at once; when it can't keep up, what comes is
   // left out.
   void itemsWereListed(const std::string &container, const NSFileProviderItems &items);
+  // A program has opened the folder at that path of the replica. Returns at once. A few folders a second are
+  // looked at, those of a person; of a program that goes through the whole drive most are left out.
+  void folderWasOpened(const std::string &path);
   // Does the same for all that is in the container; completes when it is done: nil, or why it isn't.
   void fillContainer(const std::string &container, NSFileProviderErrorCompletion completion);
 
@@ -59,19 +59,26 @@ class DesktopThumbnailFiller final : public std::enable_shared_from_this<Desktop
   bool hadNone(const Wanted &document) const;
   NSError list(const std::string &container, NSFileProviderItems *items) const;
   NSError locate(const std::string &container, std::string *path) const;
-  Wanted wanted(const std::string &folder, const NSFileProviderItemFields &item);
+  std::vector<ShownFolder> places() const;
+  Wanted wanted(const std::string &folder, const std::vector<ShownFolder> &places,
+                const NSFileProviderItemFields &item) const;
+  NSError fillFolder(const std::string &path);
+  bool mayLookAtFolder();
   NSError fetch(const std::vector<Wanted> &documents);
   NSError store(const Wanted &document, const FPDThumbnail &thumbnail);  // why it can't be kept
 
   const std::shared_ptr<ExtensionCalls> calls_;
   const DesktopThumbnails cache_;
   const dispatch_queue_t queue_;
+  const std::vector<ShownFolder> folders_;
+  std::function<std::vector<ShownFolder>()> mounted_;  // constant after setMountedFolders(); may be null
 
   // Touched on the queue alone: documents, in a state, that had no thumbnail, and when that was.
   std::map<std::pair<std::string, std::int64_t>, std::chrono::steady_clock::time_point> without_;
 
-  Mutex lock_;  // held for no call
-  std::vector<ShownFolder> folders_ GUARDED_BY(lock_);
+  Mutex lock_;                                // held for no call
+  double folderTurns_ GUARDED_BY(lock_) = 0;  // how many folders may be looked at, as of then
+  std::chrono::steady_clock::time_point turnsCounted_ GUARDED_BY(lock_);
   std::size_t waiting_ GUARDED_BY(lock_) = 0;  // items that were listed and not looked at yet
 };
 

@@ -23,17 +23,23 @@ std::shared_ptr<Host> Host::create(const std::string &extensionProgram, const st
   const auto listings = std::make_shared<OpenListings>();
   host->signals_ = std::make_shared<HostSignalReceiver>(host->followed_, listings);
   host->launcher_->setHost(host->signals_);
+  const auto thumbnails = std::make_shared<DesktopThumbnailFiller>(
+      calls, DesktopThumbnails(DesktopThumbnails::userFolder()),
+      std::vector<ShownFolder>{{DroxaProcessHome().replica(), DroxaProcessHome().replica()}});
   host->control_ = std::make_shared<ControlService>(
       calls, host->followed_, listings, DroxaProcessHome().replica(),
       [weak = std::weak_ptr<Host>(host)] {
         const auto self = weak.lock();
         return self ? self->status() : FPDStatus();
       },
-      std::make_shared<DesktopThumbnailFiller>(
-          calls, DesktopThumbnails(DesktopThumbnails::userFolder()),
-          std::vector<ShownFolder>{{DroxaProcessHome().replica(), DroxaProcessHome().replica()}}));
-  host->control_->setMount(
-      std::make_shared<HostMount>(calls, host->control_->providings(), DroxaProcessHome()));
+      thumbnails);
+  const auto mount = std::make_shared<HostMount>(calls, host->control_->providings(), DroxaProcessHome());
+  mount->setFolderOpened([thumbnails](const std::string &path) { thumbnails->folderWasOpened(path); });
+  thumbnails->setMountedFolders([weak = std::weak_ptr<HostMount>(mount)] {
+    const auto mounted = weak.lock();
+    return mounted ? mounted->shownFolders() : std::vector<ShownFolder>();
+  });
+  host->control_->setMount(mount);
   return host;
 }
 

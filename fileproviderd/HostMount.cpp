@@ -73,6 +73,7 @@ std::string HostMount::tryToMount(const std::string &path, bool *isForNow) {
   settings.replica = home_.replica();
   settings.patience = patienceOf(home_);
   settings.announcer = announcer_;
+  settings.folderOpened = folderOpened_;
   auto mount = std::make_shared<Mount>(calls_, providings_, settings);
   std::string problem = mount->start(isForNow);
   if (!problem.empty()) return problem;
@@ -132,6 +133,15 @@ void HostMount::unmount() {
 HostMount::State HostMount::state() const {
   const Lock held(lock_);
   return {mount_ && mount_->isMounted() ? mount_->path() : std::string(), problem_};
+}
+
+std::vector<ShownFolder> HostMount::shownFolders() const {
+  std::shared_ptr<Mount> mount;
+  {
+    const Lock held(lock_);
+    mount = mount_;
+  }
+  return mount ? mount->shownFolders() : std::vector<ShownFolder>();
 }
 
 std::string HostMount::drivePath(const std::string &path) const {

@@ -1,10 +1,14 @@
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <string>
+#include <utility>
+#include <vector>
 
 #include "fileproviderd/ExtensionCalls.h"
 #include "fileproviderd/Providings.h"
+#include "fileproviderd/ShownFolder.h"
 #include "platform/foundation/Paths.h"
 #include "platform/foundation/ThreadSafety.h"
 
@@ -38,7 +42,13 @@ class HostMount final : public std::enable_shared_from_this<HostMount> {
   std::string mount(const std::string &path);
   void unmount();
 
+  // Before begin(); see MountSettings.
+  void setFolderOpened(std::function<void(const std::string &path)> handler) {
+    folderOpened_ = std::move(handler);
+  }
+
   State state() const;
+  std::vector<ShownFolder> shownFolders() const;
   // The drive's path of one in the mount; `path` itself for any other.
   std::string drivePath(const std::string &path) const;
 
@@ -51,7 +61,8 @@ class HostMount final : public std::enable_shared_from_this<HostMount> {
   const std::shared_ptr<ExtensionCalls> calls_;
   const std::shared_ptr<Providings> providings_;
   const DroxaHome home_;
-  std::shared_ptr<Announcer> announcer_;  // constant after begin()
+  std::shared_ptr<Announcer> announcer_;                       // constant after begin()
+  std::function<void(const std::string &path)> folderOpened_;  // constant after setFolderOpened()
   Mutex working_;
   mutable Mutex lock_;
   std::shared_ptr<Mount> mount_ GUARDED_BY(lock_);

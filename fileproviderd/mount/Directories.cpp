@@ -147,7 +147,10 @@ void openFolder(fuse_req_t request, fuse_ino_t node, fuse_file_info *info) {
   info->cache_readdir = isWatched;
   info->keep_cache = isWatched;
   info->fh = reinterpret_cast<std::uint64_t>(folder.get());
-  if (fuse_reply_open(request, info) != -ENOENT) static_cast<void>(folder.release());
+  if (fuse_reply_open(request, info) == -ENOENT) return;
+  static_cast<void>(folder.release());
+  if (drive.folderOpened)
+    if (const std::string place = drive.replicaPath(node); !place.empty()) drive.folderOpened(place);
 }
 
 void readFolder(fuse_req_t request, fuse_ino_t node, std::size_t size, off_t offset, fuse_file_info *info) {

@@ -79,6 +79,10 @@ fuse_lowlevel_ops operations() {
   return ops;
 }
 
+std::string trashName() {
+  return ".Trash-" + std::to_string(::getuid());
+}
+
 // A value of a mount option.
 std::string optionValue(const std::string &text) {
   std::string escaped;
@@ -99,8 +103,9 @@ class Mount::Session {
       : settings_(std::move(settings)),
         point_(settings_.path, settings_.source),
         drive_(std::make_shared<MountedDrive>(
-            std::make_shared<MountRoots>(calls, settings_.replica, ".Trash-" + std::to_string(::getuid())),
+            std::make_shared<MountRoots>(calls, settings_.replica, trashName()),
             std::make_shared<Materialising>(std::move(providings), settings_.patience), calls)) {
+    drive_->folderOpened = settings_.folderOpened;
     shared_.drive = drive_;
   }
   ~Session() { stop(); }
@@ -132,6 +137,15 @@ class Mount::Session {
     // A session with a request that never ends is left as it is: somebody may answer it yet.
     if (awaitPending()) fuse_session_destroy(fuse_);
     fuse_ = nullptr;
+  }
+
+  std::vector<ShownFolder> shownFolders() const {
+    std::vector<ShownFolder> folders;
+    if (!isMounted()) return folders;
+    folders.push_back({drive_->roots->root(), path()});
+    for (const auto &[name, place] : drive_->roots->folders())
+      if (name != trashName()) folders.push_back({place, path() + "/" + name});
+    return folders;
   }
 
   bool isMounted() const { return isMounted_.load(); }
@@ -257,6 +271,10 @@ bool Mount::isMounted() const {
 
 const std::string &Mount::path() const {
   return session_->path();
+}
+
+std::vector<ShownFolder> Mount::shownFolders() const {
+  return session_->shownFolders();
 }
 
 }  // namespace droxa

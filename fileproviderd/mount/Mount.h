@@ -1,11 +1,14 @@
 #pragma once
 
 #include <chrono>
+#include <functional>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "fileproviderd/ExtensionCalls.h"
 #include "fileproviderd/Providings.h"
+#include "fileproviderd/ShownFolder.h"
 
 namespace droxa {
 
@@ -17,6 +20,9 @@ struct MountSettings {
   std::string replica;
   std::chrono::milliseconds patience{60'000};  // of a read that waits for contents
   std::shared_ptr<Announcer> announcer;        // null: programs that watch folders aren't told
+  // Told, on a thread of the session, of the path in the replica of each folder that a program opens. May be
+  // null; must not wait.
+  std::function<void(const std::string &path)> folderOpened;
 };
 
 // The drive as a folder: a session with the kernel, from start() to stop(), or until somebody unmounts it.
@@ -35,6 +41,8 @@ class Mount {
   void stop();
   bool isMounted() const;
   const std::string &path() const;
+  // The folders that the mount is made of, the trash left out; none unless it is mounted.
+  std::vector<ShownFolder> shownFolders() const;
 
  private:
   class Session;

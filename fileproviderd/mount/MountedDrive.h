@@ -1,5 +1,6 @@
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -70,7 +71,8 @@ class MountedDrive {
   const std::shared_ptr<MountRoots> roots;
   const std::shared_ptr<Materialising> materialising;
   const std::shared_ptr<ExtensionCalls> calls;
-  KernelNews *news = nullptr;  // set before the first request
+  KernelNews *news = nullptr;                                 // set before the first request
+  std::function<void(const std::string &path)> folderOpened;  // the same; see MountSettings
 
  private:
   Descriptor openFolder(NodeId node, const SharedDescriptor &parent, int *error);

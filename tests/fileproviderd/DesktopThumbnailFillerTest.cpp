@@ -1,3 +1,4 @@
+#include <atomic>
 #include <filesystem>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -91,6 +92,33 @@ TEST_F(DesktopThumbnailFillerTest, whatIsListedHasAThumbnailInEverySizeWhereverI
   ASSERT_TRUE(image);
   EXPECT_EQ(image->width(), 256U);
   EXPECT_EQ(image->height(), 128U);
+}
+
+// A mount comes and goes while the host runs.
+TEST_F(DesktopThumbnailFillerTest, whatIsMountedIsAskedForEachTime) {
+  const auto mounted = std::make_shared<std::atomic<bool>>(false);
+  filler->setMountedFolders([mounted] {
+    return *mounted ? std::vector<ShownFolder>{{"/replica/Pictures", "/home/anna/Drive"}}
+                    : std::vector<ShownFolder>();
+  });
+  list({document("d1", "a.jpg")});
+  ASSERT_TRUE(isFilled("/mnt/drive/Pictures/a.jpg"));
+  EXPECT_EQ(lookUp("/home/anna/Drive/a.jpg", "normal"), "none");
+  *mounted = true;
+  list({document("d1", "a.jpg")});
+  EXPECT_TRUE(isFilled("/home/anna/Drive/a.jpg"));
+}
+
+TEST_F(DesktopThumbnailFillerTest, aProgramThatOpensEveryFolderIsNotFollowedEverywhere) {
+  for (int i = 0; i < 1000; ++i) filler->folderWasOpened("/replica/folder " + std::to_string(i));
+  ASSERT_TRUE(eventually([&] { return extension->asked.size() > 0; }));
+  list({document("d1", "a.jpg")});
+  ASSERT_TRUE(isFilled("/mnt/drive/Pictures/a.jpg")) << "what came after is done after";
+  std::size_t folders = 0;
+  while (extension->asked.size() > 0)
+    if (extension->asked.take().starts_with("identifier")) ++folders;
+  EXPECT_GE(folders, 1U);
+  EXPECT_LE(folders, 100U);
 }
 
 TEST_F(DesktopThumbnailFillerTest, theFilesAreForTheUserAlone) {
