@@ -55,6 +55,22 @@ std::size_t openDescriptors(pid_t process) {
   return count;
 }
 
+std::size_t fewestDescriptors(pid_t process) {
+  std::size_t fewest = openDescriptors(process);
+  (void)eventually(
+      [&] {
+        fewest = std::min(fewest, openDescriptors(process));
+        return false;
+      },
+      500ms);
+  return fewest;
+}
+
+void expectAtMost(std::size_t descriptors, pid_t process) {
+  EXPECT_TRUE(eventually([&] { return openDescriptors(process) <= descriptors; }, kPatience))
+      << "process " << process << ": " << openDescriptors(process) << " after " << descriptors;
+}
+
 long residentKilobytes(pid_t process) {
   std::ifstream status("/proc/" + std::to_string(process) + "/status");
   for (std::string line; std::getline(status, line);)

@@ -27,6 +27,9 @@ bool hasSaid(const Process &process, const std::string &text);
 
 // The open descriptors of a process, but for those of databases' files, of which readers keep more or fewer.
 std::size_t openDescriptors(pid_t process);
+// The fewest within a moment: connections that have ended are still being put away.
+std::size_t fewestDescriptors(pid_t process);
+void expectAtMost(std::size_t descriptors, pid_t process);  // before long
 long residentKilobytes(pid_t process);
 
 // Tests that need an /etc of their own: skipped, and why, where there can't be one. Nobody is entitled to
