@@ -1,3 +1,5 @@
+#include <string_view>
+
 #include "cli/Acting.h"
 #include "cli/ActionArgument.h"
 #include "cli/Actions.h"
@@ -18,6 +20,14 @@ struct Destination {
   std::string folder;               // an identifier
   std::optional<std::string> name;  // of the one item that gets a new one
 };
+
+// The trash itself, however it is written. What goes there is to be found again, so that it is trashed, not
+// moved.
+bool isTrash(std::string_view path) {
+  while (path.starts_with('/')) path.remove_prefix(1);
+  while (path.ends_with('/')) path.remove_suffix(1);
+  return path == ".Trash";
+}
 
 int refuse(CommandContext &context, const std::string &asked, const std::string &why) {
   context.err << "droxa: " << escapedText(asked) << ": " << why << std::endl;
@@ -74,6 +84,7 @@ int move(CommandContext &context, const std::string &argument, const Destination
 
 int runMv(CommandContext &context, const std::vector<std::string> &arguments, const std::string &destination,
           bool json) {
+  if (isTrash(destination)) return runTrash(context, arguments, json);
   int exitStatus = kExitSuccess;
   const auto to = destinationOf(context, destination, arguments.size() == 1, &exitStatus);
   if (!to) return exitStatus;

@@ -16,6 +16,7 @@ namespace {
 constexpr std::size_t kMostWaiting = 50'000;
 constexpr std::size_t kMostKnownWithout = 100'000;
 constexpr std::size_t kOfOneRequest = 200;
+constexpr std::chrono::minutes kBeforeAskingAgain{1};
 constexpr CGSize kLargest{1024, 1024};
 
 os_log_t log() {
@@ -75,7 +76,7 @@ void DesktopThumbnailFiller::itemsWereListed(const std::string &container, const
     waiting_ += dataless.size();
   }
   dispatch_async(queue_, [self = shared_from_this(), container, dataless] {
-    if (const NSError error = self->fill(container, dataless))
+    if (const NSError error = self->fill(container, dataless, Again::no))
       os_log_error(log(), "[ERROR] no thumbnails for the desktop of what is in %@: %@", container, error);
     const Lock lock(self->lock_);
     self->waiting_ -= dataless.size();
@@ -87,7 +88,7 @@ void DesktopThumbnailFiller::fillContainer(const std::string &container,
   dispatch_async(queue_, [self = shared_from_this(), container, completion = std::move(completion)] {
     NSFileProviderItems items;
     NSError error = self->list(container, &items);
-    if (!error) error = self->fill(container, items);
+    if (!error) error = self->fill(container, items, Again::yes);
     completion(error);
   });
 }
@@ -117,14 +118,20 @@ NSError DesktopThumbnailFiller::locate(const std::string &container, std::string
   return error;
 }
 
-NSError DesktopThumbnailFiller::fill(const std::string &container, const NSFileProviderItems &items) {
+bool DesktopThumbnailFiller::hadNone(const Wanted &document) const {
+  const auto found = without_.find(document.state());
+  return found != without_.end() && std::chrono::steady_clock::now() - found->second < kBeforeAskingAgain;
+}
+
+NSError DesktopThumbnailFiller::fill(const std::string &container, const NSFileProviderItems &items,
+                                     Again again) {
   std::string folder;
   if (const NSError error = locate(container, &folder)) return error;
   if (folder.empty()) return {};
   std::vector<Wanted> documents;
   for (const auto &item : items) {
     Wanted document = wanted(folder, item->fields());
-    if (!document.subjects.empty() && !without_.contains(document.state()))
+    if (!document.subjects.empty() && (again == Again::yes || !hadNone(document)))
       documents.push_back(std::move(document));
     if (documents.size() < kOfOneRequest) continue;
     if (const NSError error = fetch(documents)) return error;
@@ -161,29 +168,29 @@ NSError DesktopThumbnailFiller::fetch(const std::vector<Wanted> &documents) {
   const auto [thumbnails, failure] = await<std::shared_ptr<FPDThumbnails>, NSError>(
       [&](const auto &reply) { RelayedThumbnails::open(calls_, identifiers, kLargest, reply); });
   if (!thumbnails) return failure;
+  NSError notKept;
   for (;;) {
     const auto [some, isLast, error] = await<std::vector<FPDThumbnail>, bool, NSError>(
         [&, &from = *thumbnails](const auto &reply) { from.nextWithReply(reply); });
     for (const FPDThumbnail &thumbnail : some) {
       const auto found = byIdentifier.find(thumbnail.identifier);
-      if (found != byIdentifier.end()) store(*found->second, thumbnail);
+      if (found == byIdentifier.end()) continue;
+      if (NSError failed = store(*found->second, thumbnail)) notKept = failed;
     }
-    if (isLast) return error;
+    if (isLast) return error ? error : notKept;
   }
 }
 
-void DesktopThumbnailFiller::store(const Wanted &document, const FPDThumbnail &thumbnail) {
-  NSError error = thumbnail.error;
-  const auto picture = error ? std::nullopt : PNGImage::read(thumbnail.imageData, &error);
+NSError DesktopThumbnailFiller::store(const Wanted &document, const FPDThumbnail &thumbnail) {
+  const auto picture = thumbnail.error ? std::nullopt : PNGImage::read(thumbnail.imageData, nullptr);
   if (!picture) {
-    // Where there just is none, and where it is no picture, there won't be one of this state later either.
     if (without_.size() >= kMostKnownWithout) without_.clear();
-    if (!thumbnail.error) without_.insert(document.state());
-    return;
+    if (!thumbnail.error) without_[document.state()] = std::chrono::steady_clock::now();
+    return {};
   }
   for (const DesktopThumbnailSubject &subject : document.subjects)
-    if ((error = cache_.store(subject, *picture)))
-      os_log_error(log(), "[ERROR] can't keep the thumbnail of %@: %@", subject.path, error);
+    if (NSError error = cache_.store(subject, *picture)) return error;
+  return {};
 }
 
 }  // namespace droxa

@@ -1,7 +1,8 @@
 #pragma once
 
+#include <chrono>
+#include <map>
 #include <memory>
-#include <set>
 #include <string>
 #include <utility>
 #include <vector>
@@ -22,7 +23,7 @@ struct ShownFolder {
 // Puts thumbnails of documents that aren't here into the desktop's cache, so that whoever shows a folder of
 // the drive finds pictures without reading, and so fetching, the documents. What somebody lists is what
 // somebody looks at: those documents are taken, page by page, and one page after the other. What has a valid
-// thumbnail is left alone, what has none isn't asked for again while this process runs.
+// thumbnail is left alone, what has none isn't asked for again for a minute: it may be made yet.
 //
 // The pictures come from the cloud, which others may write: only PNG files are decoded, by a library that
 // does nothing else, and none that is large (PNGImage).
@@ -52,19 +53,22 @@ class DesktopThumbnailFiller final : public std::enable_shared_from_this<Desktop
     }
   };
 
-  NSError fill(const std::string &container, const NSFileProviderItems &items);
+  // Of documents that had none a moment ago, too?
+  enum class Again : bool { no, yes };
+  NSError fill(const std::string &container, const NSFileProviderItems &items, Again again);
+  bool hadNone(const Wanted &document) const;
   NSError list(const std::string &container, NSFileProviderItems *items) const;
   NSError locate(const std::string &container, std::string *path) const;
   Wanted wanted(const std::string &folder, const NSFileProviderItemFields &item);
   NSError fetch(const std::vector<Wanted> &documents);
-  void store(const Wanted &document, const FPDThumbnail &thumbnail);
+  NSError store(const Wanted &document, const FPDThumbnail &thumbnail);  // why it can't be kept
 
   const std::shared_ptr<ExtensionCalls> calls_;
   const DesktopThumbnails cache_;
   const dispatch_queue_t queue_;
 
-  // Touched on the queue alone: documents, in a state, that have no thumbnail.
-  std::set<std::pair<std::string, std::int64_t>> without_;
+  // Touched on the queue alone: documents, in a state, that had no thumbnail, and when that was.
+  std::map<std::pair<std::string, std::int64_t>, std::chrono::steady_clock::time_point> without_;
 
   Mutex lock_;  // held for no call
   std::vector<ShownFolder> folders_ GUARDED_BY(lock_);

@@ -47,22 +47,23 @@ Announcer::~Announcer() {
   }
 }
 
-void Announcer::send(char kind, const std::string &text) {
+bool Announcer::send(char kind, const std::string &text) {
   const std::string message = kind + text;
   const Lock held(lock_);
-  if (!socket_) return;
+  if (!socket_) return false;
   char answer = 0;
   pollfd waited{socket_.get(), POLLIN, 0};
   const bool isPlayed = ::send(socket_.get(), message.data(), message.size(), MSG_NOSIGNAL) > 0 &&
                         ::poll(&waited, 1, kPatienceMilliseconds) > 0 &&
                         ::recv(socket_.get(), &answer, 1, 0) == 1;
-  if (isPlayed) return;
+  if (isPlayed) return true;
   socket_ = Descriptor();
   ::kill(process_, SIGKILL);
+  return false;
 }
 
-void Announcer::play(Play play, const std::string &path) {
-  send(static_cast<char>(play), path);
+bool Announcer::play(Play play, const std::string &path) {
+  return send(static_cast<char>(play), path);
 }
 
 void Announcer::watchOver(const MountPoint &point, unsigned connection) {

@@ -26,6 +26,7 @@ class Announcer {
     removeFolder = 'r',
     changeContents = 'c',
     changeAttributes = 'a',
+    writeBack = 's',  // no change: has the kernel write what programs changed in mapped memory
   };
 
   ~Announcer();
@@ -33,8 +34,8 @@ class Announcer {
   static std::shared_ptr<Announcer> start(const std::string &program);
 
   pid_t process() const { return process_; }
-  // Waits until it was played, but not for ever: an announcer that doesn't answer is ended.
-  void play(Play play, const std::string &path);
+  // Waits until it was played, but not for ever: an announcer that doesn't answer is ended. False once it is.
+  bool play(Play play, const std::string &path);
   // The mount that is to be taken off when this process dies, and the number of its connection.
   void watchOver(const MountPoint &point, unsigned connection);
   void watchOverNothing();
@@ -43,7 +44,7 @@ class Announcer {
 
  private:
   Announcer(pid_t process, Descriptor socket) : process_(process), socket_(std::move(socket)) {}
-  void send(char kind, const std::string &text);
+  bool send(char kind, const std::string &text);
 
   const pid_t process_;
   Mutex lock_;

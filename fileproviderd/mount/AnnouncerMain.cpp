@@ -64,6 +64,11 @@ void changeContents(const char *path) {
     changeAttributes(path);
 }
 
+void writeBack(const char *folder) {
+  const Descriptor opened(::open(folder, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  if (opened) ::syncfs(opened.get());
+}
+
 void play(char kind, const std::string &path) {
   constexpr mode_t kFileMode = 0600;
   constexpr mode_t kFolderMode = 0700;
@@ -87,6 +92,8 @@ void play(char kind, const std::string &path) {
       return changeContents(path.c_str());
     case Announcer::Play::changeAttributes:
       return changeAttributes(path.c_str());
+    case Announcer::Play::writeBack:
+      return writeBack(path.c_str());
   }
 }
 

@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include "fileproviderd/mount/DocumentState.h"
+#include "fileproviderd/mount/LinkTargets.h"
 #include "fileproviderd/mount/Operations.h"
 
 namespace droxa::requests {
@@ -83,6 +84,15 @@ bool needsContents(MountedDrive &drive, NodeId node, const struct stat &wanted, 
   return file && stateOfPath(file->get()) == DocumentState::dataless;
 }
 
+std::string shownTarget(MountedDrive &drive, NodeId link, const std::string &target) {
+  const auto view = drive.nodes.view(link);
+  const auto folder = view && view->parent != 0 ? drive.shownPath(view->parent) : std::nullopt;
+  if (!folder) return target;
+  ShownFolders shown = drive.roots->folders();
+  shown[""] = drive.roots->root();
+  return shownLinkTarget(target, *folder, drive.replicaPath(view->parent), shown);
+}
+
 }  // namespace
 
 void getAttributes(fuse_req_t request, fuse_ino_t node, fuse_file_info * /*info*/) {
@@ -120,7 +130,7 @@ void readLink(fuse_req_t request, fuse_ino_t node) {
     return;
   }
   target[length] = '\0';
-  fuse_reply_readlink(request, target);
+  fuse_reply_readlink(request, shownTarget(driveOf(request), node, target).c_str());
 }
 
 void statusOfFileSystem(fuse_req_t request, fuse_ino_t /*node*/) {

@@ -10,24 +10,18 @@ FuseNotices::FuseNotices(fuse_session *session, std::shared_ptr<MountedDrive> dr
       mountPoint_(std::move(mountPoint)) {}
 
 std::string FuseNotices::mountedPath(NodeId folder, const std::string &name) const {
-  const std::vector<NodeId> chain = drive_->nodes.chain(folder);
-  if (chain.empty()) return {};
-  std::string path = mountPoint_;
-  for (std::size_t index = 1; index < chain.size(); ++index) {
-    const auto view = drive_->nodes.view(chain[index]);
-    if (!view || view->parent == 0) return {};
-    path += "/" + view->name;
-  }
-  return path + "/" + name;
+  const auto path = drive_->shownPath(folder);
+  if (!path) return {};
+  return mountPoint_ + "/" + (path->empty() ? "" : *path + "/") + name;
 }
 
 bool FuseNotices::play(Announcer::Play play, NodeId folder, const std::string &name, bool isMaking) {
   const std::string path = announcer_ ? mountedPath(folder, name) : std::string();
   if (path.empty()) return false;
   drive_->playing.begin({folder, name, isMaking});
-  announcer_->play(play, path);
+  const bool isPlayed = announcer_->play(play, path);
   drive_->playing.end();
-  return true;
+  return isPlayed;
 }
 
 void FuseNotices::playChange(Announcer::Play play, NodeId node) {

@@ -50,14 +50,6 @@ void Invalidation::contentsChanged(NodeId node) {
   changed_.notify_all();
 }
 
-bool Invalidation::waitUntilIdle(std::chrono::milliseconds longest) {
-  const auto until = std::chrono::steady_clock::now() + longest;
-  Lock held(lock_);
-  while (isWorking_ || isEverything_ || !names_.empty() || !contents_.empty())
-    if (changed_.wait_until(held, until) == std::cv_status::timeout) return false;
-  return true;
-}
-
 void Invalidation::run() {
   for (;;) {
     Name name;
@@ -66,11 +58,8 @@ void Invalidation::run() {
     bool isEverything = false;
     {
       Lock held(lock_);
-      isWorking_ = false;
-      changed_.notify_all();
       while (!isStopped_ && names_.empty() && contents_.empty() && !isEverything_) changed_.wait(held);
       if (isStopped_) return;
-      isWorking_ = true;
       contents.swap(contents_);
       isEverything = std::exchange(isEverything_, false);
       if (!names_.empty()) {

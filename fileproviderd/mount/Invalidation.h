@@ -41,8 +41,6 @@ class Invalidation final : public KernelNews {
   void seen(NodeId folder, const std::string &name, bool isNew);
   void missed();  // everything may have changed
   void contentsChanged(NodeId node) override;
-  // Until everything that was seen before is dealt with; for tests.
-  bool waitUntilIdle(std::chrono::milliseconds longest);
 
  private:
   using Name = std::pair<NodeId, std::string>;
@@ -62,7 +60,6 @@ class Invalidation final : public KernelNews {
   std::map<Name, bool> waiting_ GUARDED_BY(lock_);  // the same; whether the name is new
   std::set<NodeId> contents_ GUARDED_BY(lock_);
   bool isEverything_ GUARDED_BY(lock_) = false;
-  bool isWorking_ GUARDED_BY(lock_) = false;
   bool isStopped_ GUARDED_BY(lock_) = false;
 };
 

@@ -145,9 +145,10 @@ void Materialising::askForProgress() {
         asked.emplace_back(download.number, download.providing);
   }
   for (const auto &[number, providing] : asked)
-    providing->getProgress([weak = weak_from_this(), number](std::int64_t completed, std::int64_t) {
-      if (const auto self = weak.lock()) self->progressed(number, completed);
-    });
+    providing->getProgress(
+        [weak = weak_from_this(), download = number](std::int64_t completed, std::int64_t) {
+          if (const auto self = weak.lock()) self->progressed(download, completed);
+        });
 }
 
 void Materialising::progressed(std::uint64_t number, std::int64_t completed) {

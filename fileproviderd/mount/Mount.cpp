@@ -121,6 +121,8 @@ class Mount::Session {
   void stop() {
     if (!fuse_) return;
     drive_->materialising->stop(ENOTCONN);
+    if (settings_.announcer && isMounted_)
+      settings_.announcer->play(Announcer::Play::writeBack, point_.path());
     fuse_session_exit(fuse_);
     point_.takeOff();  // wakes the session's threads
     if (loop_.joinable()) loop_.join();

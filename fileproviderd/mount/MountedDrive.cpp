@@ -84,6 +84,18 @@ std::string MountedDrive::replicaPath(NodeId node) const {
   return path;
 }
 
+std::optional<std::string> MountedDrive::shownPath(NodeId node) const {
+  const std::vector<NodeId> chain = nodes.chain(node);
+  if (chain.empty()) return std::nullopt;
+  std::string path;
+  for (std::size_t index = 1; index < chain.size(); ++index) {
+    const auto view = nodes.view(chain[index]);
+    if (!view || view->parent == 0) return std::nullopt;
+    path += (path.empty() ? "" : "/") + view->name;
+  }
+  return path;
+}
+
 bool MountedDrive::isOwnName(NodeId parent, const std::string &name) const {
   return isHiddenName(name) || (parent == kRootNode && roots->folderNamed(name));
 }

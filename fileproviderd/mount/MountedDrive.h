@@ -40,6 +40,9 @@ class MountedDrive {
   // An absolute path in the replica; "" for what has no name any more.
   std::string replicaPath(NodeId node) const;
 
+  // The path from the mount's root, "" for the root itself; nullopt for what has no name any more.
+  std::optional<std::string> shownPath(NodeId node) const;
+
   int look(NodeId parent, const std::string &name, struct stat *status);
   int statusOf(NodeId node, struct stat *status);
   // Whether the name stands for a folder that the mount's root is made of, or mustn't be seen.

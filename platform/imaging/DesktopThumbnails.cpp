@@ -112,7 +112,9 @@ bool DesktopThumbnails::hasAll(const DesktopThumbnailSubject &subject) const {
 }
 
 NSError DesktopThumbnails::store(const DesktopThumbnailSubject &subject, const PNGImage &picture) const {
-  if (NSError error = MakeFolder(folder_)) return error;
+  const std::string cache = folder_.substr(0, folder_.rfind('/'));
+  for (const std::string &folder : {cache, folder_})
+    if (NSError error = MakeFolder(folder)) return error;
   const PNGTexts texts{{kURI, URIForPath(subject.path)},
                        {kModified, std::to_string(subject.modifiedSeconds)},
                        {kSize, std::to_string(subject.size)}};

@@ -54,6 +54,17 @@ TEST_F(MvCommand, severalNeedAFolder) {
   EXPECT_TRUE(host->requests.empty());
 }
 
+// So that what goes there can be put back.
+TEST_F(MvCommand, intoTheTrashTrashes) {
+  for (const char *trash : {".Trash", "/.Trash", ".Trash/"}) {
+    host->requests.clear();
+    EXPECT_EQ(mv({"a.txt"}, trash), 0) << err.str();
+    EXPECT_EQ(request().kind, Kind::trash) << trash;
+    EXPECT_EQ(request().identifier, "d1") << trash;
+    EXPECT_EQ(request().parentIdentifier, std::nullopt) << trash;
+  }
+}
+
 TEST_F(MvCommand, goesOnAfterOneThatFailed) {
   EXPECT_EQ(mv({"missing", "in/b.txt", "a.txt"}, "/"), 66);
   EXPECT_TRUE(said("a.txt: it is in that folder already")) << err.str();

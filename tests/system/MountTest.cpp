@@ -363,6 +363,19 @@ TEST_F(Mounted, memoryMapsAndHolesWork) {
   close(file);
 }
 
+TEST_F(Mounted, whatWasWrittenIntoMappedMemoryIsKeptWhenItIsTakenOff) {
+  start();
+  const int file = open(at("m").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0600);
+  ASSERT_EQ(ftruncate(file, 4096), 0);
+  void *map = mmap(nullptr, 4096, PROT_READ | PROT_WRITE, MAP_SHARED, file, 0);
+  ASSERT_NE(map, MAP_FAILED);
+  static_cast<char *>(map)[7] = 'z';
+  EXPECT_EQ(drive.droxa({"unmount"}).status, 0);
+  EXPECT_EQ(readFile(drive.documents() + "/m").at(7), 'z');
+  munmap(map, 4096);
+  close(file);
+}
+
 TEST_F(Mounted, gitWorksInIt) {
   start();
   const Result git = run(

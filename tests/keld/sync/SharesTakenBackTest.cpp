@@ -158,6 +158,9 @@ TEST_F(SharesTakenBackTest, aContainerThatHasVanishedDeletesNothing) {
   Once<NSError> answer("deletions");
   ben.device.keld.session()->confirmDeletions(false, answer.completion());
   EXPECT_TRUE(ben.device.knowsSoon(ben.by("anna", "project/plan.txt")));
+  ASSERT_TRUE(eventually([&] {
+    return ben.device.status(ben.by("anna", "project/plan.txt")).upload == QVUploadState::inCloud;
+  }));
   // What is deleted then is meant.
   ben.device.keld.remove(ben.by("anna", "project/plan.txt"));
   EXPECT_TRUE(anna.device.losesSoon("project/plan.txt"));
