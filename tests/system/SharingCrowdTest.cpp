@@ -20,10 +20,10 @@ constexpr bool kMemoryIsMeasured = true;
 constexpr long kMostGrowth = 8L * 1024;
 
 // Many clients, and those that burden the others.
-class SharingCrowd : public SharingTests {
+class SharingCrowd : public EntitledSharingTests {
  protected:
   void SetUp() override {
-    SharingTests::SetUp();
+    EntitledSharingTests::SetUp();
     if (IsSkipped()) return;
     entitleClients(allSharingEntitlements());
     drive.start();

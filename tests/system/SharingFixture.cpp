@@ -2,6 +2,7 @@
 
 #include <filesystem>
 #include <fstream>
+#include <sys/stat.h>
 #include <system_error>
 
 namespace droxa::testing {
@@ -79,8 +80,23 @@ long residentKilobytes(pid_t process) {
 }
 
 void SharingTests::SetUp() {
-  if (!OwnEtc::whyNot().empty()) GTEST_SKIP() << OwnEtc::whyNot();
-  OwnEtc::revokeAll();
+  if (OwnEtc::whyNot().empty()) OwnEtc::revokeAll();
+}
+
+// A program has to be as hard to change as a grant: root's, who this user is in its own namespace.
+std::string SharingTests::whyNotEntitled() {
+  if (!OwnEtc::whyNot().empty()) return OwnEtc::whyNot();
+  struct stat status {};
+  for (const std::string &program : {std::string(SHARE_CLIENT), std::string(DROXA_BIN_DIR) + "/droxa"})
+    if (stat(program.c_str(), &status) != 0 || status.st_uid != 0 ||
+        (status.st_mode & (S_IWGRP | S_IWOTH)) != 0)
+      return program + " belongs to somebody else, or others may write it";
+  return "";
+}
+
+void EntitledSharingTests::SetUp() {
+  SharingTests::SetUp();
+  if (const std::string why = whyNotEntitled(); !why.empty()) GTEST_SKIP() << why;
 }
 
 void SharingTests::entitleClients(const std::vector<std::string> &entitlements) {

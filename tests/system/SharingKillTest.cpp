@@ -59,10 +59,10 @@ class Writer {
   int tried_ = 0;
 };
 
-class SharingKill : public SharingTests {
+class SharingKill : public EntitledSharingTests {
  protected:
   void SetUp() override {
-    SharingTests::SetUp();
+    EntitledSharingTests::SetUp();
     if (IsSkipped()) return;
     entitleClients(allSharingEntitlements());
     drive.start({"--account", "anna"});
