@@ -119,11 +119,14 @@ std::vector<ItemRecord> ContentsService::documentsBelow(
 
 void ContentsService::startDownloadAtURL(const NSURL &url, std::uint64_t options, QVTransferReply reply) {
   if ((options & QVDownloadCurrentVersion) == 0) return startDownload(url, options, std::move(reply));
-  engine_->fetchNow(
-      [self = shared_from_this(), url, options, reply = std::move(reply)](const NSError &error) {
-        if (error) return reply(nullptr, error);
-        self->startDownload(url, options, reply);
-      });
+  find(url, [self = shared_from_this(), url, options, reply = std::move(reply)](const ItemRecord *item,
+                                                                                const NSError &problem) {
+    if (!item) return reply(nullptr, problem);
+    self->engineOf(*item)->fetchNow([self, url, options, reply](const NSError &error) {
+      if (error) return reply(nullptr, error);
+      self->startDownload(url, options, reply);
+    });
+  });
 }
 
 void ContentsService::startDownload(const NSURL &url, std::uint64_t options, QVTransferReply reply) {

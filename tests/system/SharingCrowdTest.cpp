@@ -20,10 +20,10 @@ constexpr bool kMemoryIsMeasured = true;
 constexpr long kMostGrowth = 8L * 1024;
 
 // Many clients, and those that burden the others.
-class SharingCrowd : public SharingTests {
+class SharingCrowd : public EntitledSharingTests {
  protected:
   void SetUp() override {
-    SharingTests::SetUp();
+    EntitledSharingTests::SetUp();
     if (IsSkipped()) return;
     entitleClients(allSharingEntitlements());
     drive.start();
@@ -56,6 +56,22 @@ class SharingCrowd : public SharingTests {
     return burden;
   }
 
+  // Neither while it lives nor when it has been killed.
+  void expectToHoldUpNobodyAndLeaveNothing(const std::vector<std::string> &words) {
+    expectOthersToBeServed();
+    const pid_t extension = drive.extensionPid();
+    const std::size_t extensions = fewestDescriptors(extension);
+    const std::size_t keldsOwn = fewestDescriptors(drive.keld().pid());
+    const auto burden = startBurden(words);
+    expectOthersToBeServed();
+    burden->signal(SIGKILL);
+    burden->wait();
+    ASSERT_EQ(drive.extensionPid(), extension) << "it was started anew";
+    expectAtMost(extensions, extension);
+    expectAtMost(keldsOwn, drive.keld().pid());
+    expectOthersToBeServed();
+  }
+
   Drive drive;
 };
 
@@ -63,23 +79,11 @@ TEST_F(SharingCrowd, aThousandClientsThatDieLeaveNothingBehind) {
   runClients(150);
   const std::vector<pid_t> all = processes();
   std::vector<Costs> before;
-  for (const pid_t process : all) {
-    // The crowd's last connections are still being ended: what it is to come down to is the least.
-    Costs costs{openDescriptors(process), 0};
-    (void)eventually(
-        [&] {
-          costs.descriptors = std::min(costs.descriptors, openDescriptors(process));
-          return false;
-        },
-        500ms);
-    costs.kilobytes = residentKilobytes(process);
-    before.push_back(costs);
-  }
+  for (const pid_t process : all) before.push_back({fewestDescriptors(process), residentKilobytes(process)});
   runClients(1000);
   ASSERT_EQ(processes(), all) << "one of them was started anew";
   for (std::size_t i = 0; i < all.size(); ++i) {
-    EXPECT_TRUE(eventually([&] { return openDescriptors(all[i]) <= before[i].descriptors; }, kPatience))
-        << "process " << i << ": " << openDescriptors(all[i]) << " after " << before[i].descriptors;
+    expectAtMost(before[i].descriptors, all[i]);
     const long grown = residentKilobytes(all[i]) - before[i].kilobytes;
     RecordProperty("grownKilobytes" + std::to_string(i), std::to_string(grown));
     if (kMemoryIsMeasured) {
@@ -101,13 +105,11 @@ TEST_F(SharingCrowd, oneThatKeepsAllEndpointsIsRefusedAtItsLimitAndOthersAreServ
 }
 
 TEST_F(SharingCrowd, oneThatNeverReadsItsRepliesHoldsUpNobody) {
-  const auto burden = startBurden({"deaf", "4000"});
-  expectOthersToBeServed();
+  expectToHoldUpNobodyAndLeaveNothing({"deaf", "4000"});
 }
 
 TEST_F(SharingCrowd, oneThatNeverReturnsFromACallbackHoldsUpNobody) {
-  const auto burden = startBurden({"mute", "64"});
-  expectOthersToBeServed();
+  expectToHoldUpNobodyAndLeaveNothing({"mute", "64"});
 }
 
 }  // namespace

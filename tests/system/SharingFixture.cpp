@@ -2,6 +2,7 @@
 
 #include <filesystem>
 #include <fstream>
+#include <sys/stat.h>
 #include <system_error>
 
 namespace droxa::testing {
@@ -55,6 +56,22 @@ std::size_t openDescriptors(pid_t process) {
   return count;
 }
 
+std::size_t fewestDescriptors(pid_t process) {
+  std::size_t fewest = openDescriptors(process);
+  (void)eventually(
+      [&] {
+        fewest = std::min(fewest, openDescriptors(process));
+        return false;
+      },
+      500ms);
+  return fewest;
+}
+
+void expectAtMost(std::size_t descriptors, pid_t process) {
+  EXPECT_TRUE(eventually([&] { return openDescriptors(process) <= descriptors; }, kPatience))
+      << "process " << process << ": " << openDescriptors(process) << " after " << descriptors;
+}
+
 long residentKilobytes(pid_t process) {
   std::ifstream status("/proc/" + std::to_string(process) + "/status");
   for (std::string line; std::getline(status, line);)
@@ -63,8 +80,23 @@ long residentKilobytes(pid_t process) {
 }
 
 void SharingTests::SetUp() {
-  if (!OwnEtc::whyNot().empty()) GTEST_SKIP() << OwnEtc::whyNot();
-  OwnEtc::revokeAll();
+  if (OwnEtc::whyNot().empty()) OwnEtc::revokeAll();
+}
+
+// A program has to be as hard to change as a grant: root's, who this user is in its own namespace.
+std::string SharingTests::whyNotEntitled() {
+  if (!OwnEtc::whyNot().empty()) return OwnEtc::whyNot();
+  struct stat status {};
+  for (const std::string &program : {std::string(SHARE_CLIENT), std::string(DROXA_BIN_DIR) + "/droxa"})
+    if (stat(program.c_str(), &status) != 0 || status.st_uid != 0 ||
+        (status.st_mode & (S_IWGRP | S_IWOTH)) != 0)
+      return program + " belongs to somebody else, or others may write it";
+  return "";
+}
+
+void EntitledSharingTests::SetUp() {
+  SharingTests::SetUp();
+  if (const std::string why = whyNotEntitled(); !why.empty()) GTEST_SKIP() << why;
 }
 
 void SharingTests::entitleClients(const std::vector<std::string> &entitlements) {

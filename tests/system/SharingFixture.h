@@ -27,14 +27,18 @@ bool hasSaid(const Process &process, const std::string &text);
 
 // The open descriptors of a process, but for those of databases' files, of which readers keep more or fewer.
 std::size_t openDescriptors(pid_t process);
+// The fewest within a moment: connections that have ended are still being put away.
+std::size_t fewestDescriptors(pid_t process);
+void expectAtMost(std::size_t descriptors, pid_t process);  // before long
 long residentKilobytes(pid_t process);
 
-// Tests that need an /etc of their own: skipped, and why, where there can't be one. Nobody is entitled to
-// anything at the start.
+// Nobody is entitled to anything at the start.
 class SharingTests : public ::testing::Test {
  protected:
   void SetUp() override;
 
+  // Why programs can't be entitled to anything here; "" when they can.
+  static std::string whyNotEntitled();
   static void entitleClients(const std::vector<std::string> &entitlements);  // the client program
   static void entitleCommand(const std::vector<std::string> &entitlements);  // droxa
 
@@ -43,6 +47,12 @@ class SharingTests : public ::testing::Test {
   static void expectRefused(Drive &drive, const std::vector<std::string> &words, const std::string &reason);
   // Writes a document into the drive, and waits until the drive shows it.
   static void makeDocument(Drive &drive, const std::string &path, const std::string &contents);
+};
+
+// Those that are about applications with entitlements: skipped, and why, where nobody can have any.
+class EntitledSharingTests : public SharingTests {
+ protected:
+  void SetUp() override;
 };
 
 }  // namespace droxa::testing

@@ -22,10 +22,10 @@ const std::map<std::string, std::string> kPrivilegeOf = {
     {kFolderSharingProxy, "isFolderSharingProxyEntitled privilege required"}};
 
 // What an application that is entitled to so much is answered to each of the twelve calls.
-class SharingPrivileges : public SharingTests {
+class SharingPrivileges : public EntitledSharingTests {
  protected:
   void SetUp() override {
-    SharingTests::SetUp();
+    EntitledSharingTests::SetUp();
     if (IsSkipped()) return;
     drive.start();
     makeDocument(drive, "letter.txt", "dear");

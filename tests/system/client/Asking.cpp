@@ -102,6 +102,8 @@ int runWrite(const ClientArguments &arguments) {
   endOnSignal();
   const auto host = connectToHost(arguments.home);
   int number = arguments.count;
+  std::printf("writing\n");
+  std::fflush(stdout);
   while (!gEnding) {
     const Service service(*host, arguments.path);
     std::optional<CKShare> share;
