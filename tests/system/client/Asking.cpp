@@ -24,11 +24,19 @@ void pauseBriefly() {
   std::this_thread::sleep_for(std::chrono::milliseconds(2));
 }
 
+void sayOnce(const char *what) {
+  static std::atomic<bool> isSaid{false};
+  if (isSaid.exchange(true)) return;
+  std::printf("%s\n", what);
+  std::fflush(stdout);
+}
+
 // Calls of all kinds through one connection until it is lost or the program is to end.
 void askThrough(const Service &service, Tally &tally, const std::shared_ptr<std::atomic<bool>> &lost) {
   for (int i = 0; !gEnding && !*lost; ++i) {
     while (tally.unanswered() >= kOutstanding && !gEnding) pauseBriefly();
     const auto answer = tally.begin();
+    sayOnce("asking");
     const auto remote = service.remote([answer, lost](const NSError &) {
       *lost = true;
       answer();
@@ -83,8 +91,6 @@ int runAsk(const ClientArguments &arguments) {
   endOnSignal();
   const auto host = connectToHost(arguments.home);
   static Tally tally;  // answers may come until the very end
-  std::printf("asking\n");
-  std::fflush(stdout);
   while (!gEnding) {
     const Service service(*host, arguments.path);
     if (service.error()) {
@@ -102,8 +108,7 @@ int runWrite(const ClientArguments &arguments) {
   endOnSignal();
   const auto host = connectToHost(arguments.home);
   int number = arguments.count;
-  std::printf("writing\n");
-  std::fflush(stdout);
+  sayOnce("writing");
   while (!gEnding) {
     const Service service(*host, arguments.path);
     std::optional<CKShare> share;
