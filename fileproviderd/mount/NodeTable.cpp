@@ -190,8 +190,9 @@ bool NodeTable::goesOver(Slot slot, const struct stat &status) {
 // True when the contents are others than the kernel was told of, by nobody's change through the mount.
 bool NodeTable::tell(Slot slot, const struct stat &status) {
   Node &node = nodes_[slot];
+  if (node.ownChanges > 0) return false;  // its end says how the file is then
   const FileStamp now = FileStamp::of(status);
-  const bool hasChanged = node.ownChanges == 0 && S_ISREG(node.type) && !node.told.hasSameContents(now);
+  const bool hasChanged = S_ISREG(node.type) && !node.told.hasSameContents(now);
   node.told = now;
   node.hasStalePages = node.hasStalePages || hasChanged;
   return hasChanged;

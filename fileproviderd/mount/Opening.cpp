@@ -1,5 +1,6 @@
 #include <cerrno>
 #include <fcntl.h>
+#include <optional>
 #include <sched.h>
 #include <utility>
 
@@ -20,10 +21,12 @@ int flagsForReplica(int flags) {
 // opened for writing, since who puts contents in place gives way to writers.
 OpenFilePointer openDocument(MountedDrive &drive, NodeId node, int flags, int *error) {
   if ((flags & O_TRUNC) != 0 || (flags & O_ACCMODE) == O_RDONLY) {
-    OwnChange change(drive, node);
+    // Only emptying it is a change: what others did meanwhile mustn't be taken for it.
+    std::optional<OwnChange> change;
+    if ((flags & O_TRUNC) != 0) change.emplace(drive, node);
     Descriptor file = drive.open(node, flags, error);
     if (!file) return nullptr;
-    if ((flags & O_TRUNC) != 0) change.setDescriptor(file.get());
+    if (change) change->setDescriptor(file.get());
     const bool isDataless = stateOfOpenDocument(file.get()) == DocumentState::dataless;
     auto opened = std::make_shared<OpenFile>(node, flags & ~O_TRUNC, std::move(file), isDataless);
     drive.openFiles.add(opened);

@@ -133,8 +133,11 @@ bool SyncEngine::prepareCloud() {
   const UUID identifier = cloud_->cloudIdentifier();
   const std::string text = identifier.description();
   if (identifier.isNull()) {
-    noteCloudProblem(
-        fetching, CKErrorMake(CKErrorCode::serviceUnavailable, cloud_->description() + " can't be reached"));
+    const NSError why = cloud_->accountStatus(call(kCallTimeout)).error;
+    noteCloudProblem(fetching, CKErrorMake(CKErrorCode::serviceUnavailable,
+                                           cloud_->description() + " can't be reached" +
+                                               (why ? ": " + why.localizedDescription() : std::string()),
+                                           why));
     return false;
   }
   // Each time: it may have been replaced while this runs.

@@ -1,4 +1,4 @@
-// The sharing operations: each is recorded with its arguments, keeps the operation that came along, and is
+// The sharing operations: each keeps the operation that came along, is recorded with its arguments, and is
 // answered with what the test put into sharing(), next to the failure that the test asked for.
 
 #include <gtest/gtest.h>
@@ -38,8 +38,8 @@ void FakeDaemon::setShared(const std::string &path, bool shared) {
 
 void FakeDaemon::startOperation_toCopySharingInfoAtURL(std::shared_ptr<QVOperationClient> op,
                                                        const NSURL &url, QVShareAndURLReply reply) {
-  const NSError error = begin("startOperation_toCopySharingInfoAtURL", list(url));
   sharing_->keepOperation(std::move(op));
+  const NSError error = begin("startOperation_toCopySharingInfoAtURL", list(url));
   const FakeSharing::Answers answers = sharing_->answers();
   replies_->give("startOperation_toCopySharingInfoAtURL",
                  [=, reply = std::move(reply)] { reply(answers.share, answers.url, error); });
@@ -49,9 +49,9 @@ void FakeDaemon::startOperation_toCopyShareURLForShare(std::shared_ptr<QVOperati
                                                        const std::optional<CKShare> &share,
                                                        const std::optional<std::string> &appName,
                                                        QVShareAndURLReply reply) {
-  const NSError error = begin("startOperation_toCopyShareURLForShare", list(share, appName));
   sharing_->keepOperation(std::move(op));
   sharing_->keepShare(share);
+  const NSError error = begin("startOperation_toCopyShareURLForShare", list(share, appName));
   const FakeSharing::Answers answers = sharing_->answers();
   replies_->give("startOperation_toCopyShareURLForShare",
                  [=, reply = std::move(reply)] { reply(answers.share, answers.url, error); });
@@ -59,9 +59,9 @@ void FakeDaemon::startOperation_toCopyShareURLForShare(std::shared_ptr<QVOperati
 
 void FakeDaemon::startOperation_toSaveSharingInfo(std::shared_ptr<QVOperationClient> op,
                                                   const std::optional<CKShare> &share, QVShareReply reply) {
-  const NSError error = begin("startOperation_toSaveSharingInfo", list(share));
   sharing_->keepOperation(std::move(op));
   sharing_->keepShare(share);
+  const NSError error = begin("startOperation_toSaveSharingInfo", list(share));
   const FakeSharing::Answers answers = sharing_->answers();
   replies_->give("startOperation_toSaveSharingInfo",
                  [=, reply = std::move(reply)] { reply(answers.share, error); });
@@ -76,17 +76,17 @@ void FakeDaemon::createSharingInfoForURL(const NSURL &url, QVShareReply reply) {
 void FakeDaemon::startOperation_toUnshareShare(std::shared_ptr<QVOperationClient> op,
                                                const std::optional<CKShare> &share, bool forceDelete,
                                                QVShareOutcomeReply reply) {
-  const NSError error = begin("startOperation_toUnshareShare", list(share, forceDelete));
   sharing_->keepOperation(std::move(op));
   sharing_->keepShare(share);
+  const NSError error = begin("startOperation_toUnshareShare", list(share, forceDelete));
   replies_->give("startOperation_toUnshareShare", [=, reply = std::move(reply)] { reply(error); });
 }
 
 void FakeDaemon::startOperation_toModifyRecordAccessAtURL(std::shared_ptr<QVOperationClient> op,
                                                           const NSURL &url, bool allowAccess,
                                                           QVRecordAccessReply reply) {
-  const NSError error = begin("startOperation_toModifyRecordAccessAtURL", list(url, allowAccess));
   sharing_->keepOperation(std::move(op));
+  const NSError error = begin("startOperation_toModifyRecordAccessAtURL", list(url, allowAccess));
   const FakeSharing::Answers answers = sharing_->answers();
   replies_->give("startOperation_toModifyRecordAccessAtURL",
                  [=, reply = std::move(reply)] { reply(answers.data, answers.first, error); });
@@ -94,8 +94,8 @@ void FakeDaemon::startOperation_toModifyRecordAccessAtURL(std::shared_ptr<QVOper
 
 void FakeDaemon::startOperation_toCopyParticipantTokenAtURL(std::shared_ptr<QVOperationClient> op,
                                                             const NSURL &url, QVParticipantTokenReply reply) {
-  const NSError error = begin("startOperation_toCopyParticipantTokenAtURL", list(url));
   sharing_->keepOperation(std::move(op));
+  const NSError error = begin("startOperation_toCopyParticipantTokenAtURL", list(url));
   const FakeSharing::Answers answers = sharing_->answers();
   replies_->give("startOperation_toCopyParticipantTokenAtURL",
                  [=, reply = std::move(reply)] { reply(answers.first, answers.second, error); });
@@ -103,8 +103,8 @@ void FakeDaemon::startOperation_toCopyParticipantTokenAtURL(std::shared_ptr<QVOp
 
 void FakeDaemon::startOperation_toPrepFolderForSharingAt(std::shared_ptr<QVOperationClient> op,
                                                          const NSURL &url, QVShareOutcomeReply reply) {
-  const NSError error = begin("startOperation_toPrepFolderForSharingAt", list(url));
   sharing_->keepOperation(std::move(op));
+  const NSError error = begin("startOperation_toPrepFolderForSharingAt", list(url));
   replies_->give("startOperation_toPrepFolderForSharingAt", [=, reply = std::move(reply)] { reply(error); });
 }
 
@@ -128,8 +128,8 @@ void FakeDaemon::startOperation_toProcessSubitemsAtURL(std::shared_ptr<QVOperati
 void FakeDaemon::startOperation_toLookupShareParticipants(std::shared_ptr<QVOperationClient> op,
                                                           const QVShareParticipants &participants,
                                                           QVParticipantsReply reply) {
-  const NSError error = begin("startOperation_toLookupShareParticipants", list(participants));
   sharing_->keepOperation(std::move(op));
+  const NSError error = begin("startOperation_toLookupShareParticipants", list(participants));
   const FakeSharing::Answers answers = sharing_->answers();
   replies_->give("startOperation_toLookupShareParticipants",
                  [=, reply = std::move(reply)] { reply(answers.participants, error); });
@@ -138,8 +138,8 @@ void FakeDaemon::startOperation_toLookupShareParticipants(std::shared_ptr<QVOper
 void FakeDaemon::startOperation_toCopyDocumentURLForRecordID(std::shared_ptr<QVOperationClient> op,
                                                              const std::optional<CKRecordID> &recordID,
                                                              bool syncIfNeeded, QVSandboxingURLReply reply) {
-  const NSError error = begin("startOperation_toCopyDocumentURLForRecordID", list(recordID, syncIfNeeded));
   sharing_->keepOperation(std::move(op));
+  const NSError error = begin("startOperation_toCopyDocumentURLForRecordID", list(recordID, syncIfNeeded));
   const FakeSharing::Answers answers = sharing_->answers();
   replies_->give("startOperation_toCopyDocumentURLForRecordID",
                  [=, reply = std::move(reply)] { reply(answers.urlWrapper, error); });

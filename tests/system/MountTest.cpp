@@ -189,7 +189,8 @@ TEST_F(Mounted, aChangeBehindItIsSeenByTheNextStat) {
   EXPECT_FALSE(fs::exists(at("b.txt")));
   writeFile(drive.documents() + "/a.txt", "another");
   writeFile(drive.documents() + "/b.txt", "b");
-  EXPECT_TRUE(eventually([&] { return readFile(at("a.txt")) == "another"; }));
+  EXPECT_TRUE(eventually([&] { return readFile(at("a.txt")) == "another"; }))
+      << '"' << readFile(at("a.txt")) << "\", " << fs::file_size(at("a.txt")) << " bytes";
   EXPECT_TRUE(eventually([&] { return fs::exists(at("b.txt")); }));
   EXPECT_EQ(namesIn(folder()), withOwn({"a.txt", "b.txt"}));
   fs::remove(drive.documents() + "/b.txt");

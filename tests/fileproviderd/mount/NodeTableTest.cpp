@@ -83,6 +83,17 @@ TEST(NodeTable, whatSomebodyElseWroteIsSeenAndWhatWasWrittenHereIsNot) {
   EXPECT_EQ(table.see(file.node, fileWith(99, 4, 9)), std::nullopt) << "another file";
 }
 
+// An own change that made no difference doesn't hide that of somebody else.
+TEST(NodeTable, whatIsSeenDuringAnOwnChangeIsSeenAgainAfterIt) {
+  NodeTable table;
+  const auto file = table.enter(kRootNode, "a", fileWith(10, 1, 1));
+  table.beginOwnChange(file.node);
+  EXPECT_EQ(table.see(file.node, fileWith(10, 7, 7)), false);
+  table.endOwnChange(file.node, nullptr);
+  EXPECT_EQ(table.see(file.node, fileWith(10, 7, 7)), true);
+  EXPECT_FALSE(table.mayKeepPages(file.node));
+}
+
 TEST(NodeTable, anInodeThatIsUsedAgainIsAnotherNode) {
   NodeTable table;
   const auto file = table.enter(kRootNode, "a", fileWith(10));

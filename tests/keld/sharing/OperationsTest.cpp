@@ -162,6 +162,8 @@ TEST_F(SharingOperations, moreThanCanWaitAreRefusedAndAThousandDeadClientsLeaveN
   sentDocument("letter");
   const auto made = create(url("letter"));
   cloud->onEveryCall(Call::modifyRecords, hanging());
+  SharingQueue &queue = device.keld.daemon().sharing().queue();
+  ASSERT_TRUE(eventually([&] { return queue.count() == 0; })) << "an answer comes before its place is free";
   const auto other = device.keld.sharedDaemon()->newSession();
   std::atomic<int> answered{0}, busy{0}, cancelled{0};
   std::vector<std::shared_ptr<RecordingOperation>> clients;
@@ -175,7 +177,6 @@ TEST_F(SharingOperations, moreThanCanWaitAreRefusedAndAThousandDeadClientsLeaveN
                                               ++answered;
                                             });
   }
-  SharingQueue &queue = device.keld.daemon().sharing().queue();
   EXPECT_EQ(queue.count(), 264U) << "8 at once, and 256 that wait";
   EXPECT_EQ(busy, 736);
   EXPECT_LE(cloud->hanging(), 8);

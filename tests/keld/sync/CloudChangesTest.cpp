@@ -102,23 +102,26 @@ TEST_F(CloudChanges, aCloudThatVanishesAndComesBackLosesNothing) {
 
 // A disk that isn't mounted yet when the daemon starts.
 TEST_F(CloudChanges, aCloudThatIsAwayAtTheStartIsFoundWhenItIsBack) {
-  dataless("far", "1");
-  sent("own", "2");
+  Device other(cloudFolder, "carl");
+  hand.put("far", "1");
+  ASSERT_TRUE(other.knowsSoon("far"));
+  other.keld.stop();
   device.keld.stop();
   const std::string away = cloudFolder + "-away";
   std::filesystem::rename(cloudFolder, away);
-  device.keld.start();
-  device.keld.waitForFirstScan();
-  device.keld.write("new", "3");
+  other.keld.start();
+  other.keld.waitForFirstScan();
+  other.keld.write("new", "3");
   ASSERT_TRUE(eventually([&] {
-    return device.transfers().cloudProblem.find("there is no cloud in " + cloudFolder) != std::string::npos;
-  })) << device.transfers().cloudProblem;
-  EXPECT_TRUE(device.keld.knows("far"));
-  EXPECT_TRUE(device.download("far").is(NSCocoaErrorDomain, 4355));
+    return other.transfers().cloudProblem.find("there is no cloud in " + cloudFolder) != std::string::npos;
+  })) << other.transfers().cloudProblem;
+  EXPECT_TRUE(other.keld.knows("far"));
+  EXPECT_TRUE(other.download("far").is(NSCocoaErrorDomain, 4355));
   EXPECT_FALSE(std::filesystem::exists(cloudFolder)) << "nothing is made in its place";
   std::filesystem::rename(away, cloudFolder);
   EXPECT_TRUE(isInCloudSoon("new"));
-  EXPECT_EQ(device.contents("far"), "1");
+  EXPECT_FALSE(other.download("far"));
+  EXPECT_EQ(other.read("far"), "1");
 }
 
 TEST_F(CloudChanges, aCloudThatLostEverythingGetsItAgain) {
