@@ -78,7 +78,8 @@ class SharingDrive : public testing::Test {
   ShareAnswer info(const NSURL &asked, const Operation &op = nullptr) {
     Once<std::optional<CKShare>, NSURL, NSError> answer("sharing info");
     session()->startOperation_toCopySharingInfoAtURL(op, asked, answer.completion());
-    return std::make_from_tuple<ShareAnswer>(answer.values());
+    const auto [share, where, error] = answer.values();
+    return {share, where, error};
   }
   ShareAnswer create(const NSURL &asked) {
     Once<std::optional<CKShare>, NSError> answer("new share");
@@ -93,7 +94,8 @@ class SharingDrive : public testing::Test {
   ShareAnswer shareURL(const std::optional<CKShare> &share) {
     Once<std::optional<CKShare>, NSURL, NSError> answer("the share's URL");
     session()->startOperation_toCopyShareURLForShare(nullptr, share, "Writer", answer.completion());
-    return std::make_from_tuple<ShareAnswer>(answer.values());
+    const auto [saved, where, error] = answer.values();
+    return {saved, where, error};
   }
   NSError unshare(const std::optional<CKShare> &share, bool forceDelete) {
     Once<NSError> answer("unshare");

@@ -71,9 +71,9 @@ TEST_F(LSBundleProxyTest, theUsersEntryDecidesAndMayHideTheOthers) {
 TEST_F(LSBundleProxyTest, whatIsNoApplicationIsNone) {
   folder.write("share/applications/link.desktop", "[Desktop Entry]\nType=Link\n");
   folder.write("share/applications/empty.desktop", "");
-  for (const std::string identifier :
-       {"link", "empty", "missing", "", ".", "../applications/link", "a/b", std::string("a\0b", 3).c_str()})
-    EXPECT_FALSE(find(identifier)) << identifier;
+  const std::vector<std::string> none{
+      "link", "empty", "missing", "", ".", "../applications/link", "a/b", std::string("a\0b", 3)};
+  for (const std::string &identifier : none) EXPECT_FALSE(find(identifier)) << identifier;
   EXPECT_FALSE(find(std::string(1000, 'a')));
 }
 
