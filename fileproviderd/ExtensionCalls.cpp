@@ -1,6 +1,7 @@
 #include "fileproviderd/ExtensionCalls.h"
 
 #include <atomic>
+#include <utility>
 
 #include "platform/fileprovider/NSFileProviderError.h"
 
@@ -28,10 +29,7 @@ class Call : public std::enable_shared_from_this<Call<Values...>> {
 
   Call(std::shared_ptr<ExtensionConnecting> connecting, Ask ask, Reply reply,
        std::function<void(const NSError &)> fail)
-      : connecting_(std::move(connecting)),
-        ask_(std::move(ask)),
-        reply_(std::move(reply)),
-        fail_(std::move(fail)) {}
+      : connecting_(std::move(connecting)), ends_{std::move(ask), std::move(reply), std::move(fail)} {}
 
   void attempt(int number) {
     auto self = this->shared_from_this();
@@ -43,31 +41,39 @@ class Call : public std::enable_shared_from_this<Call<Values...>> {
         },
         &error);
     if (!extension) {
-      fail_(error);
+      end().fail(error);
       return;
     }
-    ask_(*extension, [self, answered](const Values &...values) {
+    const Ask ask = ends_.ask;  // its end may come while this runs
+    ask(*extension, [self, answered](const Values &...values) {
       if (answered->test_and_set()) return;
       self->connecting_->noteAnswer();
-      self->reply_(values...);
+      self->end().reply(values...);
     });
   }
 
  private:
+  struct Ends {
+    Ask ask;
+    Reply reply;
+    std::function<void(const NSError &)> fail;
+  };
+
   void failed(const NSError &error, int number) {
     if (!isConnectionGone(error)) {
-      fail_(error);
+      end().fail(error);
     } else if (number < kAttempts) {
       attempt(number + 1);
     } else {
-      fail_(cutOff(error, *connecting_));
+      end().fail(cutOff(error, *connecting_));
     }
   }
+  // What the reply brings may hold the error handler, and so this, for as long as it lives: what the caller
+  // gave is let go of.
+  Ends end() { return std::exchange(ends_, {}); }
 
   const std::shared_ptr<ExtensionConnecting> connecting_;
-  const Ask ask_;
-  const Reply reply_;
-  const std::function<void(const NSError &)> fail_;
+  Ends ends_;  // touched by one at a time: who begins an attempt, then who is first to answer it
 };
 
 }  // namespace

@@ -31,22 +31,19 @@ Materialising::Ticket Materialising::newTicket() {
 }
 
 void Materialising::wait(Ticket ticket, const std::string &path, pid_t process, Continuation continuation) {
-  int refused = 0;
   std::uint64_t begun = 0;
   {
     const Lock held(lock_);
     const auto early = early_.extract(ticket);
-    if (!early.empty() && early.mapped()) refused = EINTR;
+    int refused = !early.empty() && early.mapped() ? EINTR : 0;
     if (stopped_ != 0) refused = stopped_;
-    if (refused == 0) {
-      Download &download = downloads_[path];
-      if (download.waiters++ == 0) begun = download.number = ++lastDownload_;
-      waiters_[ticket] = {path, download.number, process, Clock::now() + patience_, std::move(continuation)};
+    if (refused != 0) {
+      dispatch_async_global([continuation = std::move(continuation), refused] { continuation(refused); });
+      return;
     }
-  }
-  if (refused != 0) {
-    dispatch_async_global([continuation = std::move(continuation), refused] { continuation(refused); });
-    return;
+    Download &download = downloads_[path];
+    if (download.waiters++ == 0) begun = download.number = ++lastDownload_;
+    waiters_[ticket] = {path, download.number, process, Clock::now() + patience_, std::move(continuation)};
   }
   if (begun != 0) begin(path, begun);
   lookLater();

@@ -56,6 +56,7 @@ NSError SharingService::lookUp(SharingOperation &operation, std::vector<CKShareP
   const std::vector<CKShareParticipant> asked = std::exchange(*participants, {});
   if (asked.empty()) return NSError();
   std::vector<std::string> names;
+  names.reserve(asked.size());
   for (const CKShareParticipant &each : asked) names.push_back(lookupName(each));
   const CKShareParticipantsReply reply =
       places_.ofZone({"", CKCurrentUserDefaultName}).cloud->lookUpShareParticipants(names, operation.call());

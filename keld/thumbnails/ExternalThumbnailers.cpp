@@ -52,6 +52,7 @@ std::vector<std::string> confinement(Showing showing) {
 bool runsWell(std::vector<std::string> words) {
   const OwnedDescriptor contents(::open("/proc/self/exe", O_RDONLY | O_CLOEXEC));
   std::vector<char *> arguments;
+  arguments.reserve(words.size() + 1);
   for (std::string &word : words) arguments.push_back(word.data());
   arguments.push_back(nullptr);
   std::array<char *, 1> environment{nullptr};
