@@ -16,7 +16,7 @@ namespace {
 class DriveCloud {
  public:
   std::shared_ptr<CKCloud> open(NSError *error) {
-    const DroxaHome home = DroxaProcessHome();
+    const DroxaHome &home = DroxaProcessHome();
     NSError unreadable;
     const auto remembered = QVHomeCloudRead(home, &unreadable);
     if (unreadable) {
