@@ -2,6 +2,7 @@
 
 #include <atomic>
 #include <cerrno>
+#include <csignal>
 #include <cstring>
 #include <fcntl.h>
 #include <future>
@@ -129,8 +130,8 @@ class Mount::Session {
     if (settings_.announcer && isMounted_)
       settings_.announcer->play(Announcer::Play::writeBack, point_.path());
     fuse_session_exit(fuse_);
-    point_.takeOff();  // wakes the session's threads
-    if (loop_.joinable()) loop_.join();
+    point_.takeOff();
+    endLoop();
     drive_->watch.stop();
     invalidation_->stop();
     if (settings_.announcer) settings_.announcer->watchOverNothing();
@@ -187,9 +188,23 @@ class Mount::Session {
       settings_.announcer->watchOver(point_, point_.connection());
     }
     invalidation_->start();
+    struct sigaction nothing {};
+    nothing.sa_handler = [](int) {};
+    ::sigaction(SIGUSR2, &nothing, nullptr);
     isMounted_ = true;
     loop_ = std::thread([this] { loop(); });
     return {};
+  }
+
+  // Taking the folder off wakes the session's threads only where the connection could be aborted, or nobody
+  // has a file open. The loop looks whether it is to end whenever its wait is interrupted; it may have been
+  // about to wait, so it is told until it has ended.
+  void endLoop() {
+    while (isMounted_) {
+      ::pthread_kill(loop_.native_handle(), SIGUSR2);
+      std::this_thread::sleep_for(std::chrono::milliseconds(1));
+    }
+    if (loop_.joinable()) loop_.join();
   }
 
   bool awaitPending() {
@@ -232,6 +247,10 @@ class Mount::Session {
 
   // Until the session ends, here or because somebody unmounts the folder.
   void loop() {
+    sigset_t interrupting;  // which the threads of the pool, one of which began this one, don't take
+    sigemptyset(&interrupting);
+    sigaddset(&interrupting, SIGUSR2);
+    ::pthread_sigmask(SIG_UNBLOCK, &interrupting, nullptr);
     fuse_loop_config *config = fuse_loop_cfg_create();
     fuse_loop_cfg_set_clone_fd(config, 1);
     fuse_loop_cfg_set_max_threads(config, kMostThreads);

@@ -88,7 +88,7 @@ TEST_F(SharingItemsTest, whatToProcessHasToBeAFolderAndAKnownProcess) {
 
 TEST_F(SharingItemsTest, aDocumentIsFoundByItsRecordAndOpenWithItsContents) {
   sentDocument("letter", "dear all");
-  ASSERT_FALSE(device.evict("letter"));
+  ASSERT_TRUE(eventually([&] { return !device.evict("letter"); }));
   const auto [wrapper, error] = document(recordOf("letter"), false);
   ASSERT_TRUE(wrapper) << error.description();
   EXPECT_EQ(wrapper->url(), url("letter"));
@@ -132,7 +132,7 @@ TEST_F(SharingItemsTest, aRecordThatNobodyKnowsIsUnknown) {
 
 TEST_F(SharingItemsTest, contentsThatCantBeFetchedAreTold) {
   sentDocument("letter", "dear all");
-  ASSERT_FALSE(device.evict("letter"));
+  ASSERT_TRUE(eventually([&] { return !device.evict("letter"); }));
   cloud->onEveryCall(Call::readAsset, failing(CKErrorCode::assetNotAvailable));
   const auto [wrapper, error] = document(recordOf("letter"), false);
   EXPECT_FALSE(wrapper);
